@@ -1,0 +1,92 @@
+#include "io/io_method.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <new>
+#include <string_view>
+
+namespace
+{
+
+// What a method that leaves an operation out does when it is asked for it.
+template <typename Operation>
+struct refusal;
+template <typename Result, typename... Arguments>
+struct refusal<Result (*)(Arguments...)> {
+    static Result operation(Arguments... /*unused*/)
+    {
+        errno = ENOSYS;
+        return static_cast<Result>(-1);
+    }
+};
+
+template <typename Operation>
+Operation given_or_refusal(Operation operation)
+{
+    return operation != nullptr ? operation : &refusal<Operation>::operation;
+}
+
+std::unique_ptr<char[]> copy_of(std::string_view text)
+{
+    std::unique_ptr<char[]> copy(new (std::nothrow) char[text.size() + 1]);
+    if (copy) copy[text.copy(copy.get(), text.size())] = '\0';
+    return copy;
+}
+
+}  // namespace
+
+std::int32_t img_register_io_method(const char *name, std::int32_t (*init_op)(const char *name),
+                                    img_io_open_fn open, img_io_close_fn close, img_io_read_fn read,
+                                    img_io_write_fn write, img_io_seek_fn seek,
+                                    img_io_unlink_fn unlink, img_io_value_fn get_value)
+{
+    if (img_find_io_method(name) != -1 || img_io_method_count == IMG_MAX_IO_METHODS) return -1;
+    const auto slot = static_cast<std::size_t>(img_io_method_count++);
+    img_io_method_table[slot] = {
+        .name = name,
+        .enabled = init_op == nullptr || init_op(name) == 0 ? 1 : 0,
+        .open = given_or_refusal(open),
+        .close = given_or_refusal(close),
+        .read = given_or_refusal(read),
+        .write = given_or_refusal(write),
+        .seek = given_or_refusal(seek),
+        .unlink = given_or_refusal(unlink),
+        .get_value = given_or_refusal(get_value),
+    };
+    return 0;
+}
+
+std::int32_t img_find_io_method(const char *name)
+{
+    const auto *const end = img_io_method_table.begin() + img_io_method_count;
+    const auto *const found =
+        std::find_if(img_io_method_table.cbegin(), end, [name](const img_io_method &method) {
+            return method.enabled != 0 && std::string_view(method.name) == name;
+        });
+    return found == end ? -1 : static_cast<std::int32_t>(found - img_io_method_table.cbegin());
+}
+
+const img_io_method *img_lookup_io_method(const char *name)
+{
+    const std::int32_t slot = img_find_io_method(name);
+    return slot == -1 ? nullptr : &img_io_method_table[static_cast<std::size_t>(slot)];
+}
+
+std::int32_t img_split_name(const char *name, std::unique_ptr<char[]> *filename_out,
+                            const img_io_method **io_method_out)
+{
+    std::string_view filename(name);
+    const char *method_name = "";
+    if (const auto start = filename.find_first_not_of('@'); start != std::string_view::npos) {
+        filename.remove_prefix(start);
+        if (const auto at = filename.find('@'); at != std::string_view::npos) {
+            method_name = filename.data() + at + 1;
+            filename = filename.substr(0, at);
+        }
+    }
+    auto copy = copy_of(filename);
+    if (!copy) return -1;
+    *filename_out = std::move(copy);
+    *io_method_out = img_lookup_io_method(method_name);
+    return 0;
+}
