@@ -1,0 +1,197 @@
+// The links of a chain: adding, removing and resetting them.
+#include "api/img_desc.h"
+#include "api/report.h"
+#include "chain/chain.h"
+
+#include <algorithm>
+#include <new>
+
+namespace
+{
+
+constexpr std::int32_t MAX_BITS = 30;  // so that a table's size fits 31 bits
+
+std::array<img_chain, IMG_MAX_HANDLES> img_chains{};
+
+bool is_slot(std::int32_t link)
+{
+    return link >= 0 && link < IMG_CHAIN_LINKS;
+}
+
+bool is_width(std::int32_t bits)
+{
+    return bits >= 0 && bits <= MAX_BITS;
+}
+
+img_chain_link &link_of(img_handle handle, std::int32_t link)
+{
+    return img_chain_of(handle).links[static_cast<std::size_t>(link)];
+}
+
+img_chain_lut lut_record(std::int32_t bits_in, std::int32_t bits_out, std::uint16_t *lut,
+                         std::int32_t owned)
+{
+    return {.bits_in = static_cast<std::uint8_t>(bits_in),
+            .bits_out = static_cast<std::uint8_t>(bits_out),
+            .size = std::int32_t{1} << bits_in,
+            .lut = lut,
+            .owned = owned};
+}
+
+// Frees a table; a link that would fill it has nothing to fill any more.
+void free_table(img_chain &chain, std::uint16_t *table)
+{
+    for (img_chain_link &link : chain.links)
+        if (link.kind == IMG_CHAIN_LUT_FCN && link.lut_fcn.lut == table) link.lut_fcn.lut = nullptr;
+    delete[] table;
+}
+
+void free_what_is_owned(img_chain &chain, img_chain_link &link)
+{
+    if (link.kind == IMG_CHAIN_LUT && link.lut_def.owned != 0) free_table(chain, link.lut_def.lut);
+    if (link.owns_arg != 0) {
+        auto *const record = static_cast<img_chain_lut *>(link.arg);
+        if (record->owned != 0) free_table(chain, record->lut);
+        delete record;
+    }
+    link.arg = nullptr;
+    link.owns_arg = 0;
+    link.kind = IMG_CHAIN_EMPTY;
+}
+
+// Settles a chain whose links have changed: a preparation for the old ones does not fit them.
+void links_changed(img_handle handle)
+{
+    img_chain &chain = img_chain_of(handle);
+    img_chain_update_out_bits(handle);
+    chain.identity = std::ranges::all_of(
+        chain.links, [](const img_chain_link &link) { return link.kind == IMG_CHAIN_EMPTY; });
+    chain.prepared = 0;
+}
+
+}  // namespace
+
+img_chain &img_chain_of(img_handle handle)
+{
+    return img_chains[static_cast<std::size_t>(handle)];
+}
+
+void img_chain_init(img_handle handle)
+{
+    img_chain &chain = img_chain_of(handle);
+    img_chain_release(handle);
+    for (img_chain_link &link : chain.links) free_what_is_owned(chain, link);
+    chain.identity = 1;
+    chain.prepared = 0;
+    chain.has_lut_link = 0;
+    chain.lut_bits = 0;
+    chain.work_buffer = nullptr;
+    chain.work_def = nullptr;
+    chain.final_buffer = nullptr;
+    chain.final_def = nullptr;
+    chain.out_bits = img_query_nbits(handle);
+}
+
+std::int32_t img_chain_add_remap_link(img_handle handle, std::int32_t link, std::int32_t out_bits,
+                                      void *arg, img_chain_process_fn process_fn,
+                                      img_chain_input_def_fn input_def_fn)
+{
+    if (img_validate_img_handle(handle) != 0 || !is_slot(link) || process_fn == nullptr) return -1;
+    img_chain_link &slot = link_of(handle, link);
+    slot.kind = IMG_CHAIN_REMAP_FCN;
+    slot.arg = arg;
+    slot.owns_arg = 0;
+    slot.remap = {.out_bits = out_bits, .process_fn = process_fn, .input_def_fn = input_def_fn};
+    links_changed(handle);
+    return 0;
+}
+
+std::int32_t img_chain_add_lut_link(img_handle handle, std::int32_t link, std::int32_t bits_in,
+                                    std::int32_t bits_out, std::int32_t remap, std::uint16_t *lut,
+                                    std::int32_t owned)
+{
+    if (img_validate_img_handle(handle) != 0 || !is_slot(link) || !is_width(bits_in) ||
+        !is_width(bits_out) || lut == nullptr)
+        return -1;
+    img_chain_link &slot = link_of(handle, link);
+    if (remap == 0) {
+        slot.kind = IMG_CHAIN_LUT;
+        slot.arg = nullptr;
+        slot.owns_arg = 0;
+        slot.lut_def = lut_record(bits_in, bits_out, lut, owned);
+        links_changed(handle);
+        return 0;
+    }
+    auto *const record =
+        new (std::nothrow) img_chain_lut(lut_record(bits_in, bits_out, lut, owned));
+    if (record == nullptr) return -1;
+    img_chain_add_remap_link(handle, link, bits_out, record, img_chain_lut_remap,
+                             img_chain_lut_input_definition);
+    slot.owns_arg = 1;
+    return 0;
+}
+
+std::int32_t img_chain_add_lut_create_link(img_handle handle, std::int32_t link, void *arg,
+                                           img_chain_create_fn create_fn, std::int32_t target,
+                                           std::int32_t bits_in, std::int32_t bits_out,
+                                           std::int32_t remap, std::uint16_t *lut,
+                                           std::int32_t owned)
+{
+    if (img_validate_img_handle(handle) != 0 || !is_slot(link) || target <= link ||
+        !is_slot(target) || create_fn == nullptr || !is_width(bits_in) || !is_width(bits_out))
+        return -1;
+    std::unique_ptr<std::uint16_t[]> made;
+    if (lut == nullptr) {
+        made.reset(new (std::nothrow) std::uint16_t[std::size_t{1} << bits_in]{});
+        if (!made) return img_fail("img_chain_add_lut_create_link: error mallocing lut!!!\n");
+        lut = made.get();
+        owned = 1;
+    }
+    if (img_chain_add_lut_link(handle, target, bits_in, bits_out, remap, lut, owned) != 0)
+        return -1;
+    made.release();  // the target link owns it now
+    img_chain_link &slot = link_of(handle, link);
+    slot.kind = IMG_CHAIN_LUT_FCN;
+    slot.arg = arg;
+    slot.owns_arg = 0;
+    slot.lut_fcn = {.create_fn = create_fn, .lut = lut, .target = target, .bits_in = bits_in};
+    links_changed(handle);
+    return 0;
+}
+
+std::int32_t img_chain_remove_link(img_handle handle, std::int32_t link)
+{
+    if (img_validate_img_handle(handle) != 0 || !is_slot(link)) return -1;
+    img_chain &chain = img_chain_of(handle);
+    img_chain_link &slot = link_of(handle, link);
+    const std::int32_t target = slot.kind == IMG_CHAIN_LUT_FCN ? slot.lut_fcn.target : -1;
+    free_what_is_owned(chain, slot);
+    links_changed(handle);
+    if (target != -1) img_chain_remove_link(handle, target);
+    return 0;
+}
+
+void img_chain_update_out_bits(img_handle handle)
+{
+    img_chain &chain = img_chain_of(handle);
+    const auto states_width = [](const img_chain_link &link) {
+        return link.kind == IMG_CHAIN_REMAP_FCN && link.remap.out_bits > 0;
+    };
+    const auto last = std::find_if(chain.links.rbegin(), chain.links.rend(), states_width);
+    chain.out_bits = last != chain.links.rend() ? last->remap.out_bits : img_query_nbits(handle);
+}
+
+std::int32_t img_chain_out_bits(img_handle handle)
+{
+    return img_chain_of(handle).out_bits;
+}
+
+std::int32_t img_chain_out_nbytes(img_handle handle)
+{
+    return img_chain_nbytes(img_chain_out_bits(handle));
+}
+
+std::int32_t img_chain_nbytes(std::int32_t nbits)
+{
+    return ((nbits - 1) >> 3) + 1;
+}

@@ -1,0 +1,119 @@
+// The linear contrast stretch: a histogram, its cuts, and the table that spreads what is between.
+#include "api/report.h"
+#include "chain/chain.h"
+
+#include <algorithm>
+#include <cstring>
+#include <memory>
+#include <new>
+
+namespace
+{
+
+constexpr std::int32_t MAX_BITS = 16;
+
+bool is_stretch_width(std::int32_t bits)
+{
+    return bits >= 1 && bits <= MAX_BITS;
+}
+
+// Counts every fourth sample of each line; one that has no counter is left out.
+template <typename Sample>
+void count_samples(const std::uint8_t *buffer, const img_buffer_def &def, std::uint32_t *histogram)
+{
+    const std::uint32_t size = 1U << def.nbits;
+    const auto line_length = static_cast<std::size_t>(def.stride) * sizeof(Sample);
+    for (std::int32_t line = 0; line < def.nlines; ++line) {
+        const std::uint8_t *const row = buffer + static_cast<std::size_t>(line) * line_length;
+        for (std::int64_t samp = 0; samp < def.nsamps; samp += 4) {
+            Sample value;
+            std::memcpy(&value, row + static_cast<std::size_t>(samp) * sizeof value, sizeof value);
+            if (value < size) ++histogram[value];
+        }
+    }
+}
+
+struct cut {
+    std::size_t low, high;  // first and last value of the stretch
+};
+
+// Leaves out the lowest half percent and the highest percent of the samples between two bins,
+// which themselves leave out the ends of the range of values.
+cut find_cut(const std::uint32_t *histogram, std::size_t size)
+{
+    const auto rounded = [size](double share) {
+        return static_cast<std::size_t>((static_cast<double>(size) * share * 10.0 + 0.5) / 10.0);
+    };
+    const std::size_t first = rounded(0.005);
+    const std::size_t end = rounded(0.99);
+    std::uint32_t total = 0;
+    for (std::size_t bin = first; bin < end; ++bin) total += histogram[bin];
+
+    // The first bin counts twice: as the start of the count and as the first one added to it.
+    std::uint32_t count = histogram[first];
+    const auto advance_to = [&](std::size_t bin, double share) {
+        const auto wanted = static_cast<std::uint32_t>(total * share);
+        while (count < wanted && bin < size) count += histogram[bin++];
+        return bin;
+    };
+    const std::size_t low = advance_to(first, 0.005);
+    return {low, advance_to(low, 0.99)};
+}
+
+}  // namespace
+
+std::int32_t img_chain_create_16to8_lut(void * /*arg*/, const std::uint8_t *buffer,
+                                        const img_buffer_def *def, std::uint16_t *lut)
+{
+    return img_chain_create_stretch_lut_from_buffer(buffer, def, lut, 8);
+}
+
+std::int32_t img_chain_create_stretch_lut_from_buffer(const std::uint8_t *buffer,
+                                                      const img_buffer_def *def, std::uint16_t *lut,
+                                                      std::int32_t bits_out)
+{
+    const std::int32_t bits_in = def->nbits;
+    if (bits_in > MAX_BITS)
+        return img_fail("img_chain_create_16to8_lut:image resolution overflow\n");
+    const bool countable = is_stretch_width(bits_in);
+    const std::size_t size = countable ? std::size_t{1} << bits_in : 0;
+    const img_chain_lut descriptor{.bits_in = static_cast<std::uint8_t>(bits_in),
+                                   .bits_out = static_cast<std::uint8_t>(bits_out),
+                                   .size = static_cast<std::int32_t>(size),
+                                   .lut = lut,
+                                   .owned = 0};
+    const std::unique_ptr<std::uint32_t[]> histogram(new (std::nothrow) std::uint32_t[size]{});
+    if (!histogram) return img_fail_errno("img_chain_create_stretch_lut_from_buffer:calloc");
+    if (countable && def->nbytes == 2)
+        count_samples<std::uint16_t>(buffer, *def, histogram.get());
+    else if (countable)
+        count_samples<std::uint8_t>(buffer, *def, histogram.get());
+    if (def->fill < size) histogram[def->fill] = 0;
+    img_chain_compute_stretch_lut(histogram.get(), bits_in, &descriptor, lut);
+    return 0;
+}
+
+std::int32_t img_chain_compute_stretch_lut(const std::uint32_t *histogram, std::int32_t bits_in,
+                                           const img_chain_lut *descriptor, std::uint16_t *lut)
+{
+    const std::int32_t bits_out = descriptor != nullptr ? descriptor->bits_out : bits_in;
+    if (!is_stretch_width(bits_in) || !is_stretch_width(bits_out) || histogram == nullptr)
+        return img_fail("img_chain_compute_stretch_lut: Invalid arguments\n");
+    if (descriptor != nullptr && descriptor->bits_in != bits_in)
+        return img_fail("img_chain_compute_stretch_lut: histogram doesnt match lut bits_in\n");
+
+    const std::size_t size = std::size_t{1} << bits_in;
+    const auto [low, high] = find_cut(histogram, size);
+    const double gain =
+        high != low ? static_cast<double>(size) / static_cast<double>(high - low) : 1.0;
+    const std::int64_t top = (std::int64_t{1} << bits_out) - 1;
+    for (std::size_t i = 0; i < size; ++i) {
+        const double above_low = static_cast<double>(i) - static_cast<double>(low);
+        const auto stretched = static_cast<std::int64_t>(above_low * gain);
+        const std::int64_t value = bits_out <= bits_in
+                                       ? stretched >> (bits_in - bits_out)
+                                       : stretched * (top + 1) / static_cast<std::int64_t>(size);
+        lut[i] = static_cast<std::uint16_t>(std::clamp<std::int64_t>(value, 0, top));
+    }
+    return 0;
+}
