@@ -1,0 +1,100 @@
+// Whole tiles for the host and for the tiled regions: through the image's cache, if it has one.
+#include "access/tile_cache.h"
+#include "api/img.h"
+#include "api/img_desc.h"
+#include "api/types.h"
+#include "std/std.h"
+
+namespace
+{
+
+bool is_untiled(const img_desc *desc)
+{
+    return desc->tile_nsamps == 0 || desc->tile_nlines == 0;
+}
+
+// Tiles in one band of a tiled image.
+std::int64_t tile_count(const img_desc *desc)
+{
+    return std::int64_t{img_whole_tiles(desc->nsamps, desc->tile_nsamps)} *
+           img_whole_tiles(desc->nlines, desc->tile_nlines);
+}
+
+bool is_a_run_of_tiles(const img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,
+                       std::int32_t band)
+{
+    return band >= 0 && band < desc->nbands && first_tile >= 0 &&
+           std::int64_t{first_tile} + ntiles <= tile_count(desc);
+}
+
+// Makes the image's cache at its first use. A budget that is too small is not tried again.
+void make_cache(img_desc *desc)
+{
+    if (desc->cache_pending == 0 || desc->cache_mb <= 0) return;
+    desc->tile_cache = img_tile_cache_create(static_cast<std::int32_t>(img_std_plane_size(desc)),
+                                             static_cast<std::int32_t>(tile_count(desc)),
+                                             desc->nbands, desc->cache_mb);
+    img_tile_cache_set_write_back(desc->tile_cache, img_std_write_tile, desc);
+    desc->cache_pending = 0;
+}
+
+std::int32_t load_through_cache(img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,
+                                std::int32_t band, std::uint8_t *buffer)
+{
+    img_tile_cache *const cache = desc->tile_cache;
+    const img_read_tiles_fn read_tiles = img_type_of(desc).read_tiles;
+    for (std::int32_t tile = first_tile; tile < first_tile + ntiles; ++tile) {
+        if (img_tile_cache_get(cache, tile, band, buffer) != 0) {
+            const std::int32_t result = read_tiles(desc, tile, 1, band, buffer);
+            if (result != 0) return result;
+            img_tile_cache_put(cache, tile, band, buffer, 0);
+        }
+        buffer += img_tile_cache_tile_bytes(cache);
+    }
+    return 0;
+}
+
+std::int32_t dump_through_cache(img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,
+                                std::int32_t band, const std::uint8_t *buffer)
+{
+    img_tile_cache *const cache = desc->tile_cache;
+    for (std::int32_t tile = first_tile; tile < first_tile + ntiles; ++tile) {
+        const std::int32_t result = img_tile_cache_put(cache, tile, band, buffer, 1);
+        if (result != 0) return result;
+        buffer += img_tile_cache_tile_bytes(cache);
+    }
+    return 0;
+}
+
+}  // namespace
+
+std::int32_t img_load_tiles(img_handle handle, std::int32_t first_tile, std::int32_t ntiles,
+                            std::int32_t band, void *buffer)
+{
+    img_desc *const desc = img_find_image(handle);
+    if (desc == nullptr || desc->mem_image || img_access_mode(desc) == IMG_OPEN_WRITE_ONLY ||
+        img_type_of(desc).read_tiles == nullptr)
+        return -1;
+    if (is_untiled(desc) || ntiles < 1) return 0;
+    if (buffer == nullptr || !is_a_run_of_tiles(desc, first_tile, ntiles, band)) return -1;
+    make_cache(desc);
+    auto *const planes = static_cast<std::uint8_t *>(buffer);
+    if (desc->tile_cache != nullptr)
+        return load_through_cache(desc, first_tile, ntiles, band, planes);
+    return img_type_of(desc).read_tiles(desc, first_tile, ntiles, band, planes);
+}
+
+std::int32_t img_dump_tiles(img_handle handle, std::int32_t first_tile, std::int32_t ntiles,
+                            std::int32_t band, const void *buffer)
+{
+    img_desc *const desc = img_find_image(handle);
+    if (desc == nullptr || img_access_mode(desc) == IMG_OPEN_READ_ONLY ||
+        img_type_of(desc).write_tiles == nullptr)
+        return -1;
+    if (is_untiled(desc) || ntiles < 1) return 0;
+    if (buffer == nullptr || !is_a_run_of_tiles(desc, first_tile, ntiles, band)) return -1;
+    const auto *const planes = static_cast<const std::uint8_t *>(buffer);
+    if (desc->tile_cache != nullptr)
+        return dump_through_cache(desc, first_tile, ntiles, band, planes);
+    return img_type_of(desc).write_tiles(desc, first_tile, ntiles, band, planes);
+}

@@ -1,0 +1,345 @@
+// The driver's state of one image: making it, the file organisation, and the bytes of the file.
+#include "api/img_desc.h"
+#include "api/report.h"
+#include "io/io_method.h"
+#include "std/std.h"
+
+#include <cerrno>
+#include <limits>
+#include <new>
+
+namespace
+{
+
+constexpr std::int32_t FILE_MODE = 0666;
+enum : std::int32_t { FROM_START = 0, FROM_CURRENT = 1, FROM_END = 2 };
+constexpr std::int64_t MAX_OFFSET = std::numeric_limits<std::int32_t>::max();
+
+// --- Sizes: every one is either within 0..MAX_OFFSET or -1, which means that it does not fit ---
+
+std::int64_t fitting(std::int64_t size)
+{
+    return size >= 0 && size <= MAX_OFFSET ? size : -1;
+}
+
+std::int64_t product(std::int64_t a, std::int64_t b)
+{
+    return a < 0 || b < 0 ? -1 : fitting(a * b);
+}
+
+template <typename... More>
+std::int64_t product(std::int64_t a, std::int64_t b, More... more)
+{
+    return product(product(a, b), more...);
+}
+
+std::int64_t sum(std::int64_t a, std::int64_t b)
+{
+    return a < 0 || b < 0 ? -1 : fitting(a + b);
+}
+
+const img_type_hooks &hooks_of(const img_desc *desc)
+{
+    return img_type_hooks_table[static_cast<std::size_t>(desc->type)];
+}
+
+bool within_the_drivers_limits(const img_desc *desc)
+{
+    return desc->nlines >= 0 && desc->nsamps >= 0 && desc->tile_nlines >= 0 &&
+           desc->tile_nsamps >= 0 && desc->nbands >= 0 && (desc->nbytes == 1 || desc->nbytes == 2);
+}
+
+bool is_tiled(const img_desc *desc)
+{
+    return desc->tile_nsamps != 0 && desc->tile_nlines != 0;
+}
+
+bool gets_virtual_tiles(const img_desc *desc)
+{
+    return img_cache_mb != 0 && img_default_tile_nsamps > 0 && img_default_tile_nlines > 0 &&
+           desc->layout == IMG_LAYOUT_BSQ && img_type_of(desc).read_tiles == img_std_read_tiles;
+}
+
+// Fills in the tile counts and the tile size. Returns false when they do not fit.
+bool set_up_tiles(const img_desc *desc, img_std_file *file)
+{
+    const std::int64_t planes = desc->layout == IMG_LAYOUT_TILED_BIP ? desc->nbands : 1;
+    const std::int64_t tile_size =
+        product(desc->tile_nlines, desc->tile_nsamps, desc->nbytes, planes);
+    file->tiles_across = img_whole_tiles(desc->nsamps, desc->tile_nsamps);
+    file->tiles_down = img_whole_tiles(desc->nlines, desc->tile_nlines);
+    if (tile_size == -1 || product(file->tiles_across, file->tiles_down) == -1) return false;
+    file->tile_size = static_cast<std::int32_t>(tile_size);
+    return true;
+}
+
+// Returns the end of the bytes that whole-tile transfers of stored tiles may touch.
+std::int64_t tiles_end(const img_desc *desc, const img_std_file *file)
+{
+    if (desc->nbands == 0 || desc->virtual_tiled != 0) return file->data_offset;
+    const std::int64_t tiles = product(file->tiles_across, file->tiles_down, file->tile_size);
+    std::int64_t data;
+    switch (desc->layout) {
+    case IMG_LAYOUT_TILED:
+        data = product(tiles, desc->nbands);
+        break;
+    case IMG_LAYOUT_TILED_BIP:
+        data = tiles;
+        break;
+    default:
+        data = sum(product(desc->nbands - 1, file->band_size), tiles);
+        break;
+    }
+    return sum(file->data_offset, data);
+}
+
+// Fills in the stored size of a line and of a band plane. Returns false when they do not fit.
+bool set_up_planes(img_desc *desc, img_std_file *file)
+{
+    const img_type_hooks &hooks = hooks_of(desc);
+    file->padded_nsamps =
+        hooks.padded_nsamps_fn != nullptr ? hooks.padded_nsamps_fn(desc) : desc->nsamps;
+    file->padded_nlines =
+        hooks.padded_nlines_fn != nullptr ? hooks.padded_nlines_fn(desc) : desc->nlines;
+    const std::int64_t band_size = product(file->padded_nlines, file->padded_nsamps, desc->nbytes);
+    if (band_size == -1) return false;
+    file->band_size = static_cast<std::int32_t>(band_size);
+    return sum(file->data_offset, product(desc->nbands, band_size)) != -1;
+}
+
+// Chooses the layout, where that is left to the type, and sets up stored or virtual tiles.
+bool set_up_layout(img_desc *desc, img_std_file *file)
+{
+    const bool tiled = is_tiled(desc);
+    if (desc->layout == IMG_LAYOUT_DEFAULT)
+        desc->layout = tiled ? hooks_of(desc).tiled_layout : hooks_of(desc).untiled_layout;
+    if (!tiled && gets_virtual_tiles(desc)) {
+        desc->virtual_tiled = 1;
+        desc->tile_nsamps = img_default_tile_nsamps;
+        desc->tile_nlines = img_default_tile_nlines;
+        desc->layout = IMG_LAYOUT_BAND_TILED;
+    }
+    const bool interleaved = desc->layout == IMG_LAYOUT_TILED_BIP;
+    const bool in_tiles =
+        interleaved || desc->layout == IMG_LAYOUT_TILED || desc->layout == IMG_LAYOUT_BAND_TILED;
+    if (in_tiles && !is_tiled(desc)) return false;
+    if (interleaved && desc->nbands > static_cast<std::int32_t>(desc->band_map.size()))
+        return false;
+    return !is_tiled(desc) || set_up_tiles(desc, file);
+}
+
+std::int32_t seek(const img_desc *desc, std::int64_t offset, std::int32_t whence)
+{
+    if (fitting(offset) == -1) {
+        errno = EOVERFLOW;
+        return -1;
+    }
+    return desc->io_method->seek(desc->std_file->data_fd, static_cast<std::int32_t>(offset),
+                                 whence);
+}
+
+std::int32_t seek_to(const img_desc *desc, std::int64_t offset)
+{
+    const std::int32_t at = seek(desc, offset, FROM_START);
+    if (at == offset) return 0;
+    if (at != -1) errno = EIO;  // the method stands elsewhere than it was told to
+    return -1;
+}
+
+// Makes the state of an image whose files are open on `fd`, or in memory for -1.
+std::int32_t make_state(img_desc *desc, std::int32_t fd)
+{
+    desc->std_file = new (std::nothrow) img_std_file{
+        .hdr_fd = fd,
+        .data_fd = fd,
+        .veof = 0,
+        .veof_max = 0,
+        .data_offset = 0,
+        .band_size = 0,
+        .tiles_across = 0,
+        .tiles_down = 0,
+        .tile_size = 0,
+        .padded_nsamps = 0,
+        .padded_nlines = 0,
+        .read_error = 0,
+        .companion_name = nullptr,
+    };
+    return desc->std_file != nullptr ? 0 : -1;
+}
+
+void free_state(img_desc *desc)
+{
+    delete[] desc->std_file->companion_name;
+    delete desc->std_file;
+    desc->std_file = nullptr;
+}
+
+std::int32_t close_descriptors(const img_desc *desc)
+{
+    const img_std_file *const file = desc->std_file;
+    if (file->hdr_fd != file->data_fd && file->hdr_fd != -1) desc->io_method->close(file->hdr_fd);
+    return file->data_fd != -1 ? desc->io_method->close(file->data_fd) : 0;
+}
+
+// Opens the file with the record's flags and makes the state.
+std::int32_t open_file(img_desc *desc)
+{
+    if (desc->io_method == nullptr) return -1;
+    const std::int32_t fd = desc->io_method->open(desc->filename.get(), desc->oflags, FILE_MODE);
+    if (fd < 0) return -1;
+    if (make_state(desc, fd) == 0) return 0;
+    desc->io_method->close(fd);
+    return -1;
+}
+
+// Grows a file that is shorter than its data to its full size, with zero bytes. What cannot be
+// completed, a file opened read-only for one, stays as it is: there is nobody to tell.
+void complete(img_desc *desc)
+{
+    const img_std_file *const file = desc->std_file;
+    const std::int32_t expected = desc->nbands * file->band_size + file->data_offset;
+    const std::int32_t length = seek(desc, 0, FROM_END);
+    if (length != -1 && length < expected) img_std_extend(desc, expected - length);
+}
+
+// Tells a read that failed, or stopped although the file goes on, from one that met its end.
+void note_bytes_not_read(img_desc *desc, std::int64_t offset, std::int32_t got)
+{
+    img_std_file *const file = desc->std_file;
+    if (got == -1) {
+        file->read_error = errno != 0 ? errno : EIO;
+    } else if (const std::int32_t end = seek(desc, 0, FROM_END); end == -1 || end > offset + got) {
+        file->read_error = EIO;
+    }
+}
+
+}  // namespace
+
+std::int32_t img_std_open(img_desc *desc)
+{
+    if (open_file(desc) == -1) return -1;
+    const img_type_hooks &hooks = hooks_of(desc);
+    if (hooks.probe(desc) != 0 && hooks.read_header(desc) != -1 && img_std_setup(desc) != -1)
+        return 0;
+    img_std_fail_close(desc);
+    return -1;
+}
+
+std::int32_t img_std_create(img_desc *desc)
+{
+    if (open_file(desc) == -1) return -1;
+    if (hooks_of(desc).write_header(desc) != -1 && img_std_setup(desc) != -1) return 0;
+    img_std_fail_close(desc);
+    return -1;
+}
+
+std::int32_t img_std_create_mem(img_desc *desc)
+{
+    if (make_state(desc, -1) == -1) return -1;
+    img_std_file *const file = desc->std_file;
+    if (img_std_setup(desc) == 0) {
+        const std::int64_t size =
+            file->tile_size != 0
+                ? product(file->tiles_down, file->tiles_across, desc->nbands, file->tile_size)
+                : product(file->padded_nsamps, desc->nlines, desc->nbytes, desc->nbands);
+        if (size != -1)
+            desc->mem_image.reset(new (std::nothrow)
+                                      std::uint8_t[static_cast<std::size_t>(size)]{});
+        file->veof = file->veof_max = static_cast<std::int32_t>(size) - 1;
+    }
+    if (desc->mem_image) return 0;
+    img_std_close(desc);
+    return -1;
+}
+
+std::int32_t img_std_close(img_desc *desc)
+{
+    std::int32_t result = 0;
+    if (desc->std_file == nullptr) return result;
+    desc->mem_image.reset();
+    if (desc->std_file->data_fd != -1) {
+        complete(desc);
+        result = close_descriptors(desc);
+    }
+    free_state(desc);
+    return result;
+}
+
+void img_std_fail_close(img_desc *desc)
+{
+    if (desc->std_file == nullptr) return;
+    close_descriptors(desc);
+    free_state(desc);
+}
+
+std::int32_t img_std_delete(img_desc *desc)
+{
+    const std::unique_ptr<char[]> companion(desc->std_file->companion_name);
+    desc->std_file->companion_name = nullptr;
+    img_std_fail_close(desc);
+    if (desc->io_method == nullptr) return -1;  // an in-memory image may have none
+    if (companion) desc->io_method->unlink(companion.get());
+    return desc->io_method->unlink(desc->filename.get());
+}
+
+std::int32_t img_std_setup(img_desc *desc)
+{
+    img_std_file *const file = desc->std_file;
+    if (!within_the_drivers_limits(desc) || !set_up_planes(desc, file) ||
+        !set_up_layout(desc, file) || tiles_end(desc, file) == -1)
+        return -1;
+    if (file->data_fd == -1) return 0;
+    if (img_std_update_veof(desc) == -1) return -1;
+    file->veof_max = file->veof;
+    return seek_to(desc, 0);
+}
+
+std::int32_t img_std_extend(img_desc *desc, std::int32_t count)
+{
+    if (desc->mem_image) return 0;
+    if (seek(desc, 0, FROM_END) == -1 || seek(desc, count - 1, FROM_CURRENT) == -1) return -1;
+    const std::int32_t written =
+        desc->io_method->write(desc->std_file->data_fd, img_zero_sample.data(), 1);
+    if (written == 0) errno = ENOSPC;
+    return written == 1 ? 0 : -1;
+}
+
+std::int32_t img_std_seek_to_write(img_desc *desc, std::int64_t offset)
+{
+    if (offset <= desc->std_file->veof) return seek_to(desc, offset);
+    // The file may have grown since it was last looked at: what is missing counts from its end.
+    const std::int32_t end = seek(desc, 0, FROM_END);
+    if (end == -1) return -1;
+    if (offset <= end) return seek_to(desc, offset);
+    if (img_std_extend(desc, static_cast<std::int32_t>(offset - end)) == -1) return -1;
+    desc->std_file->veof = static_cast<std::int32_t>(offset);
+    return 0;
+}
+
+std::int32_t img_std_update_veof(img_desc *desc)
+{
+    const std::int32_t end = seek(desc, 0, FROM_END);
+    if (end == -1) return -1;
+    desc->std_file->veof = end;
+    return 0;
+}
+
+std::int32_t img_std_read_at(img_desc *desc, std::int64_t offset, void *buffer, std::int32_t count)
+{
+    std::int32_t got = seek_to(desc, offset);
+    if (got == 0)
+        got = desc->io_method->read(desc->std_file->data_fd, buffer,
+                                    static_cast<std::uint32_t>(count));
+    if (got != count && img_std_report_errors == 0) note_bytes_not_read(desc, offset, got);
+    return got;
+}
+
+std::int32_t img_std_write_at(img_desc *desc, std::int64_t offset, const void *buffer,
+                              std::int32_t count)
+{
+    if (img_std_seek_to_write(desc, offset) == -1) return -1;
+    const std::int32_t written =
+        desc->io_method->write(desc->std_file->data_fd, buffer, static_cast<std::uint32_t>(count));
+    if (written != count) return written;
+    return img_std_update_veof(desc) == 0 ? written : -1;
+}

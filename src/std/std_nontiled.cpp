@@ -1,0 +1,224 @@
+// Regions of untiled images, line by line.
+#include "api/img_desc.h"
+#include "api/report.h"
+#include "io/io_method.h"
+#include "std/std.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <new>
+
+namespace
+{
+
+std::size_t bytes_of(const img_desc *desc, std::int32_t nsamps)
+{
+    return static_cast<std::size_t>(nsamps) * static_cast<std::size_t>(desc->nbytes);
+}
+
+// Byte of the caller's buffer at which row `row` begins.
+std::size_t row_start(const img_desc *desc, std::int32_t row, std::int32_t stride)
+{
+    return static_cast<std::size_t>(row) * bytes_of(desc, stride);
+}
+
+// Offset of the region's line `line` in the band-sequential and in the interleaved layout. Any
+// layout that has no transfer of its own is taken for band sequential.
+std::int64_t line_offset(const img_desc *desc, std::int64_t line, std::int32_t samp,
+                         std::int32_t band)
+{
+    const img_std_file *const file = desc->std_file;
+    return file->data_offset + std::int64_t{band} * file->band_size +
+           (line * file->padded_nsamps + samp) * desc->nbytes;
+}
+
+std::int64_t pixel_line_offset(const img_desc *desc, std::int64_t line, std::int32_t samp)
+{
+    const img_std_file *const file = desc->std_file;
+    return file->data_offset + (line * file->padded_nsamps + samp) * desc->nbands * desc->nbytes;
+}
+
+void copy_row(const img_desc *desc, const std::uint8_t *from, std::uint8_t *to, std::int32_t nsamps,
+              bool exchange)
+{
+    const std::size_t step = bytes_of(desc, 1);
+    img_std_copy_samples(from, step, to, step, static_cast<std::size_t>(nsamps), desc->nbytes,
+                         exchange);
+}
+
+// One row of working memory; null when memory is short.
+std::unique_ptr<std::uint8_t[]> new_row(std::int32_t row_length)
+{
+    return std::unique_ptr<std::uint8_t[]>(new (std::nothrow)
+                                               std::uint8_t[static_cast<std::size_t>(row_length)]);
+}
+
+// Writes this band's samples of one line of pixels into the file, from offset `at` on, and steps
+// over those of the other bands.
+std::int32_t write_interleaved_line(img_desc *desc, std::int64_t at, std::int32_t nsamps,
+                                    const std::uint8_t *from)
+{
+    if (img_std_seek_to_write(desc, at) == -1)
+        return img_fail_errno("img_std_write_nontiled_interleaved:write");
+    const img_io_method *const method = desc->io_method;
+    const std::int32_t fd = desc->std_file->data_fd;
+    const std::int32_t other_bands = (desc->nbands - 1) * desc->nbytes;
+    for (std::int32_t i = 0; i < nsamps; ++i) {
+        if (i > 0 && method->seek(fd, other_bands, 1) == -1)
+            return img_fail_errno("img_std_write_nontiled_interleaved:write");
+        std::array<std::uint8_t, 2> sample;
+        copy_row(desc, from + row_start(desc, i, 1), sample.data(), 1,
+                 img_std_exchanges_bytes(desc));
+        const std::int32_t written =
+            method->write(fd, sample.data(), static_cast<std::uint32_t>(desc->nbytes));
+        if (written == -1) return img_fail_errno("img_std_write_nontiled_interleaved:write");
+        if (written != desc->nbytes)
+            return img_fail("img_std_write_nontiled_inter: %d of %d bytes written!!\n", written,
+                            desc->nbytes);
+    }
+    if (img_std_update_veof(desc) == -1)
+        return img_fail_errno("img_std_write_nontiled_interleaved:write");
+    return 0;
+}
+
+}  // namespace
+
+bool img_std_exchanges_bytes(const img_desc *desc)
+{
+    return desc->nbytes == 2 && desc->swap != 0;
+}
+
+std::int32_t img_std_read_lines(img_desc *desc, std::int32_t line, std::int32_t samp,
+                                std::int32_t nlines, std::int32_t nsamps, std::int32_t band,
+                                std::uint8_t *buffer, std::int32_t stride, bool exchange)
+{
+    const std::int32_t row_length = desc->nbytes * nsamps;
+    for (std::int32_t i = 0; i < nlines; ++i) {
+        const std::int64_t offset = line_offset(desc, std::int64_t{line} + i, samp, band);
+        std::uint8_t *const row = buffer + row_start(desc, i, stride);
+        if (desc->mem_image) {
+            if (offset + row_length - 1 > desc->std_file->veof)
+                return img_fail("img_read_nontiled: read beyond virtual eof!!\n");
+            copy_row(desc, desc->mem_image.get() + offset, row, nsamps, exchange);
+            continue;
+        }
+        const std::int32_t got = img_std_read_at(desc, offset, row, row_length);
+        if (got == -1) return img_fail_errno("img_read_nontiled:read");
+        if (got != row_length)
+            return img_fail("img_read_nontiled: %d of %d bytes read!!\n", got, row_length);
+        if (exchange) copy_row(desc, row, row, nsamps, exchange);
+    }
+    return 0;
+}
+
+std::int32_t img_read_nontiled(img_desc *desc, std::int32_t line, std::int32_t samp,
+                               std::int32_t nlines, std::int32_t nsamps, std::int32_t band,
+                               std::uint8_t *buffer, std::int32_t stride)
+{
+    return img_std_read_lines(desc, line, samp, nlines, nsamps, band, buffer, stride,
+                              img_std_exchanges_bytes(desc));
+}
+
+std::int32_t img_std_read_nontiled_interleaved(img_desc *desc, std::int32_t line, std::int32_t samp,
+                                               std::int32_t nlines, std::int32_t nsamps,
+                                               std::int32_t band, std::uint8_t *buffer,
+                                               std::int32_t stride)
+{
+    const std::size_t pixel_length = bytes_of(desc, desc->nbands);
+    const std::int32_t row_length = desc->nbands * desc->nbytes * nsamps;
+    std::unique_ptr<std::uint8_t[]> row;  // an in-memory image is read where it lies
+    if (!desc->mem_image && !(row = new_row(row_length)))
+        return img_fail_errno("img_std_read_nontiled_interleaved:malloc");
+
+    for (std::int32_t i = 0; i < nlines; ++i) {
+        const std::int64_t offset = pixel_line_offset(desc, std::int64_t{line} + i, samp);
+        const std::uint8_t *pixels = row.get();
+        if (desc->mem_image) {
+            if (offset + row_length - 1 > desc->std_file->veof_max)
+                return img_fail("img_std_read_nontiled_interleaved: read beyond virtual eof!!\n");
+            pixels = desc->mem_image.get() + offset;
+        } else {
+            const std::int32_t got = img_std_read_at(desc, offset, row.get(), row_length);
+            if (got == -1) return img_fail_errno("img_std_read_nontiled_interleaved:read");
+            if (got != row_length)
+                return img_fail("img_std_read_nontiled_interleaved: %d of %d bytes read!!\n", got,
+                                row_length);
+        }
+        img_std_copy_samples(pixels + bytes_of(desc, band), pixel_length,
+                             buffer + row_start(desc, i, stride), bytes_of(desc, 1),
+                             static_cast<std::size_t>(nsamps), desc->nbytes,
+                             img_std_exchanges_bytes(desc));
+    }
+    return 0;
+}
+
+std::int32_t img_std_write_lines(img_desc *desc, std::int32_t line, std::int32_t samp,
+                                 std::int32_t nlines, std::int32_t nsamps, std::int32_t band,
+                                 const std::uint8_t *buffer, std::int32_t stride, bool exchange)
+{
+    const std::int32_t row_length = desc->nbytes * nsamps;
+    std::unique_ptr<std::uint8_t[]> exchanged;  // the caller's rows are not to be modified
+    if (exchange && !desc->mem_image && !(exchanged = new_row(row_length)))
+        return img_fail_errno("img_std_write_nontiled:malloc");
+
+    img_std_file *const file = desc->std_file;
+    for (std::int32_t i = 0; i < nlines; ++i) {
+        const std::int64_t offset = line_offset(desc, std::int64_t{line} + i, samp, band);
+        const std::uint8_t *row = buffer + row_start(desc, i, stride);
+        if (desc->mem_image) {
+            const std::int64_t last = offset + row_length - 1;
+            if (last > file->veof_max)
+                return img_fail("img_write_nontiled: Write past virtual eof!!\n");
+            copy_row(desc, row, desc->mem_image.get() + offset, nsamps, exchange);
+            file->veof = std::max(file->veof, static_cast<std::int32_t>(last));
+            continue;
+        }
+        if (exchange) {
+            copy_row(desc, row, exchanged.get(), nsamps, exchange);
+            row = exchanged.get();
+        }
+        const std::int32_t written = img_std_write_at(desc, offset, row, row_length);
+        if (written == -1) return img_fail_errno("img_std_write_nontiled:write");
+        if (written != row_length)
+            return img_fail("img_std_write_nontiled: %d of %d bytes written!!\n", written,
+                            row_length);
+    }
+    return 0;
+}
+
+std::int32_t img_std_write_nontiled(img_desc *desc, std::int32_t line, std::int32_t samp,
+                                    std::int32_t nlines, std::int32_t nsamps, std::int32_t band,
+                                    const std::uint8_t *buffer, std::int32_t stride,
+                                    const std::uint8_t * /*fill*/)
+{
+    return img_std_write_lines(desc, line, samp, nlines, nsamps, band, buffer, stride,
+                               img_std_exchanges_bytes(desc));
+}
+
+std::int32_t img_std_write_nontiled_interleaved(img_desc *desc, std::int32_t line,
+                                                std::int32_t samp, std::int32_t nlines,
+                                                std::int32_t nsamps, std::int32_t band,
+                                                const std::uint8_t *buffer, std::int32_t stride,
+                                                const std::uint8_t * /*fill*/)
+{
+    img_std_file *const file = desc->std_file;
+    const std::size_t pixel_length = bytes_of(desc, desc->nbands);
+    const std::int32_t row_length = desc->nbands * desc->nbytes * nsamps;
+    for (std::int32_t i = 0; i < nlines; ++i) {
+        const std::int64_t offset = pixel_line_offset(desc, std::int64_t{line} + i, samp);
+        const std::int64_t at = offset + std::int64_t{band} * desc->nbytes;
+        const std::uint8_t *const row = buffer + row_start(desc, i, stride);
+        if (desc->mem_image) {
+            const std::int64_t last = offset + row_length - 1;
+            if (last > file->veof_max)
+                return img_fail("img_std_write_nontiled_interleaved: Write past virtual eof!!\n");
+            img_std_copy_samples(row, bytes_of(desc, 1), desc->mem_image.get() + at, pixel_length,
+                                 static_cast<std::size_t>(nsamps), desc->nbytes,
+                                 img_std_exchanges_bytes(desc));
+            file->veof = std::max(file->veof, static_cast<std::int32_t>(last));
+        } else if (write_interleaved_line(desc, at, nsamps, row) == -1) {
+            return -1;
+        }
+    }
+    return 0;
+}

@@ -1,0 +1,366 @@
+// Whole tiles of one band, in the file's byte order.
+#include "access/tile_cache.h"
+#include "api/img_desc.h"
+#include "api/report.h"
+#include "std/std.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <new>
+#include <utility>
+
+namespace
+{
+
+using tile_buffer = std::unique_ptr<std::uint8_t[]>;
+
+// Sets the image's cache aside, so that reads go to the file alone, and puts it back.
+class without_cache
+{
+public:
+    explicit without_cache(img_desc *desc)
+        : m_desc(desc), m_cache(std::exchange(desc->tile_cache, nullptr))
+    {
+    }
+    ~without_cache()
+    {
+        m_desc->tile_cache = m_cache;
+    }
+    without_cache(const without_cache &) = delete;
+    without_cache &operator=(const without_cache &) = delete;
+
+private:
+    img_desc *m_desc;
+    img_tile_cache *m_cache;
+};
+
+bool is_interleaved(const img_desc *desc)
+{
+    return desc->layout == IMG_LAYOUT_TILED_BIP && desc->nbands > 1;
+}
+
+// Tiles of layout 2 with several bands: a run of one band is not contiguous.
+bool has_planes_between(const img_desc *desc)
+{
+    return desc->layout == IMG_LAYOUT_TILED && desc->nbands > 1;
+}
+
+// Offset of the first byte of a tile of `band`, or of the whole tile when it is interleaved.
+std::int64_t tile_offset(const img_desc *desc, std::int64_t tile, std::int32_t band)
+{
+    const img_std_file *const file = desc->std_file;
+    const std::int64_t data = file->data_offset;
+    if (is_interleaved(desc)) return data + tile * file->tile_size;
+    if (has_planes_between(desc)) return data + (tile * desc->nbands + band) * file->tile_size;
+    return data + std::int64_t{band} * file->band_size + tile * file->tile_size;
+}
+
+std::int32_t run_bytes(const img_desc *desc, std::int32_t ntiles)
+{
+    return ntiles * desc->std_file->tile_size;
+}
+
+tile_buffer new_tiles(std::size_t length)
+{
+    return tile_buffer(new (std::nothrow) std::uint8_t[length]{});
+}
+
+// Reads `length` bytes of tiles. Returns how many came; fewer than `length` is a failure that
+// has been reported, -1 that none came at all.
+std::int32_t read_bytes(img_desc *desc, std::int64_t offset, std::uint8_t *buffer,
+                        std::int32_t length)
+{
+    if (desc->mem_image) {
+        if (offset + length - 1 > desc->std_file->veof) {
+            if (img_std_report_errors != 0)
+                img_fail("img_std_read_tiles: read beyond virtual eof!!\n");
+            return -1;
+        }
+        std::memcpy(buffer, desc->mem_image.get() + offset, static_cast<std::size_t>(length));
+        return length;
+    }
+    const std::int32_t got = img_std_read_at(desc, offset, buffer, length);
+    if (got != length && img_std_report_errors != 0) {
+        if (got == -1)
+            img_fail_errno("img_std_read_tiles:read");
+        else
+            img_fail("img_std_read_tiles: %d of %d bytes read!!\n", got, length);
+    }
+    return got;
+}
+
+// Writes `length` bytes of tiles. `per_tile` says that they are one tile of several that are
+// written one by one, whose short write is reported in two lines.
+std::int32_t write_bytes(img_desc *desc, std::int64_t offset, const std::uint8_t *buffer,
+                         std::int32_t length, bool per_tile)
+{
+    img_std_file *const file = desc->std_file;
+    if (desc->mem_image) {
+        const std::int64_t last = offset + length - 1;
+        if (last > file->veof_max)
+            return img_fail("img_std_write_tiles: write past virtual eof!!\n");
+        std::memcpy(desc->mem_image.get() + offset, buffer, static_cast<std::size_t>(length));
+        file->veof = std::max(file->veof, static_cast<std::int32_t>(last));
+        return 0;
+    }
+    const std::int32_t written = img_std_write_at(desc, offset, buffer, length);
+    if (written == length) return 0;
+    if (written == -1) return img_fail_errno("img_std_write_tiles:write");
+    if (!per_tile)
+        return img_fail("img_std_write_tiles: %d of %d bytes written!!\n", written, length);
+    img_fail("img_std_write_tiles:%d of %d bytes written!!\n", written, length);
+    return img_fail_errno("img_std_write_tiles:partial write");
+}
+
+// Copies the samples at position `position` of the first `length` bytes of interleaved pixels to
+// a plane: all of those that are there whole.
+void split_position(const std::uint8_t *pixels, std::size_t length, std::size_t position,
+                    std::size_t nbands, std::int32_t nbytes, std::uint8_t *plane)
+{
+    const auto width = static_cast<std::size_t>(nbytes);
+    const std::size_t pixel = nbands * width;
+    const std::size_t sample_end = (position + 1) * width;
+    if (length < sample_end) return;
+    img_std_copy_samples(pixels + position * width, pixel, plane, width,
+                         (length - sample_end) / pixel + 1, nbytes, false);
+}
+
+void split_bytes(const std::uint8_t *tile, std::size_t length, std::int32_t nbytes,
+                 std::int32_t nbands, const std::array<std::int32_t, 3> &band_map,
+                 const std::array<std::uint8_t *, 3> &planes)
+{
+    for (std::size_t position = 0; position < static_cast<std::size_t>(nbands); ++position) {
+        std::uint8_t *const plane = planes[static_cast<std::size_t>(band_map[position])];
+        if (plane != nullptr)
+            split_position(tile, length, position, static_cast<std::size_t>(nbands), nbytes, plane);
+    }
+}
+
+// Splits one whole interleaved tile: `band` to `plane`, the others to the cache, if there is one.
+// A tile that the cache holds already may be newer than the file's and stays.
+void split_tile_into_cache(const img_desc *desc, const std::uint8_t *pixels, std::int32_t tile,
+                           std::int32_t band, std::uint8_t *plane)
+{
+    std::array<tile_buffer, 3> others;
+    std::array<std::uint8_t *, 3> planes{};
+    for (std::int32_t each = 0; each < desc->nbands; ++each) {
+        const auto at = static_cast<std::size_t>(each);
+        if (each != band && desc->tile_cache != nullptr &&
+            img_tile_cache_has(desc->tile_cache, tile, each) == 0)
+            others[at] = new_tiles(img_std_plane_size(desc));  // none: it is not cached
+        planes[at] = each == band ? plane : others[at].get();
+    }
+    img_std_split_tile(pixels, desc->tile_nsamps, desc->tile_nlines, desc->nbytes, desc->nbands,
+                       desc->band_map, planes);
+    for (std::int32_t each = 0; each < desc->nbands; ++each)
+        if (const auto &other = others[static_cast<std::size_t>(each)]; other)
+            img_tile_cache_put(desc->tile_cache, tile, each, other.get(), 0);
+}
+
+std::int32_t read_interleaved(img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,
+                              std::int32_t band, std::uint8_t *buffer)
+{
+    const std::int32_t length = run_bytes(desc, ntiles);
+    const tile_buffer run = new_tiles(static_cast<std::size_t>(length));
+    if (!run) return -1;
+    const std::int32_t got =
+        read_bytes(desc, tile_offset(desc, first_tile, band), run.get(), length);
+
+    const auto tile_size = static_cast<std::size_t>(desc->std_file->tile_size);
+    auto left = static_cast<std::size_t>(std::clamp(got, 0, length));
+    const std::uint8_t *pixels = run.get();
+    for (std::int32_t tile = first_tile; left >= tile_size && tile < first_tile + ntiles; ++tile) {
+        split_tile_into_cache(desc, pixels, tile, band, buffer);
+        pixels += tile_size;
+        left -= tile_size;
+        buffer += img_std_plane_size(desc);
+    }
+    if (got == length) return 0;
+    std::array<std::uint8_t *, 3> planes{};  // the tile in which the file ends
+    planes[static_cast<std::size_t>(band)] = buffer;
+    split_bytes(pixels, left, desc->nbytes, desc->nbands, desc->band_map, planes);
+    return -1;
+}
+
+// Builds one interleaved tile of the caller's plane and of what the file holds of the others.
+// Returns 0, or -1: memory is short, or the file holds more of them than could be read.
+std::int32_t merge_with_other_bands(img_desc *desc, std::int32_t tile, std::int32_t band,
+                                    const std::uint8_t *plane, std::uint8_t *pixels)
+{
+    std::array<tile_buffer, 3> others;
+    std::array<const std::uint8_t *, 3> planes{};
+    const without_cache from_the_file(desc);
+    const img_std_pre_read pre_read(desc);
+    for (std::int32_t each = 0; each < desc->nbands; ++each) {
+        if (each == band) continue;
+        auto &other = others[static_cast<std::size_t>(each)];
+        other = new_tiles(img_std_plane_size(desc));  // 0 where the file holds nothing yet
+        if (!other) return -1;
+        img_std_read_tiles(desc, tile, 1, each, other.get());
+        planes[static_cast<std::size_t>(each)] = other.get();
+    }
+    if (pre_read.result() == -1) return -1;
+    planes[static_cast<std::size_t>(band)] = plane;
+    img_std_merge_tile(desc->nbands, desc->band_map, planes, desc->tile_nsamps, desc->tile_nlines,
+                       desc->nbytes, pixels);
+    return 0;
+}
+
+std::int32_t write_interleaved(img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,
+                               std::int32_t band, const std::uint8_t *buffer)
+{
+    const std::int32_t length = run_bytes(desc, ntiles);
+    const tile_buffer run = new_tiles(static_cast<std::size_t>(length));
+    if (!run) return -1;
+    for (std::int32_t i = 0; i < ntiles; ++i) {
+        const auto at = static_cast<std::size_t>(i);
+        const auto tile_size = static_cast<std::size_t>(desc->std_file->tile_size);
+        if (merge_with_other_bands(desc, first_tile + i, band,
+                                   buffer + at * img_std_plane_size(desc),
+                                   run.get() + at * tile_size) == -1)
+            return -1;
+    }
+    return write_bytes(desc, tile_offset(desc, first_tile, band), run.get(), length, false);
+}
+
+// The region of an untiled image that one virtual tile shows.
+struct virtual_tile {
+    std::int32_t line, samp, nlines, nsamps;
+};
+
+virtual_tile virtual_tile_at(const img_desc *desc, std::int32_t tile)
+{
+    const std::int32_t line = desc->tile_nlines * (tile / desc->std_file->tiles_across);
+    const std::int32_t samp = desc->tile_nsamps * (tile % desc->std_file->tiles_across);
+    return {line, samp, std::min(desc->tile_nlines, desc->nlines - line),
+            std::min(desc->tile_nsamps, desc->nsamps - samp)};
+}
+
+}  // namespace
+
+img_std_pre_read::img_std_pre_read(img_desc *desc)
+    : m_file(desc->std_file), m_outer_report_errors(std::exchange(img_std_report_errors, 0)),
+      m_outer_read_error(std::exchange(m_file->read_error, 0))
+{
+}
+
+img_std_pre_read::~img_std_pre_read()
+{
+    img_std_report_errors = m_outer_report_errors;
+    m_file->read_error = m_outer_read_error;
+}
+
+std::int32_t img_std_pre_read::result() const
+{
+    if (m_file->read_error == 0) return 0;
+    errno = m_file->read_error;
+    return img_fail_errno("img_std_read_tiles:read");
+}
+
+std::size_t img_std_plane_size(const img_desc *desc)
+{
+    return static_cast<std::size_t>(desc->tile_nlines) *
+           static_cast<std::size_t>(desc->tile_nsamps) * static_cast<std::size_t>(desc->nbytes);
+}
+
+std::int32_t img_std_read_tiles(img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,
+                                std::int32_t band, std::uint8_t *buffer)
+{
+    if (ntiles < 1 || desc->std_file->tile_size == 0) return 0;
+    if (desc->virtual_tiled != 0)
+        return img_std_read_virtual_tiles(desc, first_tile, ntiles, band, buffer);
+    if (is_interleaved(desc)) return read_interleaved(desc, first_tile, ntiles, band, buffer);
+
+    const std::int32_t pieces = has_planes_between(desc) ? ntiles : 1;
+    const std::int32_t length = run_bytes(desc, ntiles / pieces);
+    for (std::int32_t i = 0; i < pieces; ++i) {
+        if (read_bytes(desc, tile_offset(desc, std::int64_t{first_tile} + i, band), buffer,
+                       length) != length)
+            return -1;
+        buffer += length;
+    }
+    return 0;
+}
+
+std::int32_t img_std_write_tiles(img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,
+                                 std::int32_t band, const std::uint8_t *buffer)
+{
+    if (ntiles < 1 || desc->std_file->tile_size == 0) return 0;
+    if (desc->virtual_tiled != 0)
+        return img_std_write_virtual_tiles(desc, first_tile, ntiles, band, buffer);
+    if (is_interleaved(desc)) return write_interleaved(desc, first_tile, ntiles, band, buffer);
+
+    const bool tile_by_tile = has_planes_between(desc);
+    const std::int32_t pieces = tile_by_tile ? ntiles : 1;
+    const std::int32_t length = run_bytes(desc, ntiles / pieces);
+    for (std::int32_t i = 0; i < pieces; ++i) {
+        if (write_bytes(desc, tile_offset(desc, std::int64_t{first_tile} + i, band), buffer, length,
+                        tile_by_tile) == -1)
+            return -1;
+        buffer += length;
+    }
+    return 0;
+}
+
+std::int32_t img_std_read_virtual_tiles(img_desc *desc, std::int32_t first_tile,
+                                        std::int32_t ntiles, std::int32_t band,
+                                        std::uint8_t *buffer)
+{
+    for (std::int32_t tile = first_tile; tile < first_tile + ntiles; ++tile) {
+        const virtual_tile part = virtual_tile_at(desc, tile);
+        const std::int32_t result =
+            img_std_read_lines(desc, part.line, part.samp, part.nlines, part.nsamps, band, buffer,
+                               desc->tile_nsamps, false);
+        if (result != 0) return result;
+        buffer += img_std_plane_size(desc);
+    }
+    return 0;
+}
+
+std::int32_t img_std_write_virtual_tiles(img_desc *desc, std::int32_t first_tile,
+                                         std::int32_t ntiles, std::int32_t band,
+                                         const std::uint8_t *buffer)
+{
+    for (std::int32_t tile = first_tile; tile < first_tile + ntiles; ++tile) {
+        const virtual_tile part = virtual_tile_at(desc, tile);
+        const std::int32_t result =
+            img_std_write_lines(desc, part.line, part.samp, part.nlines, part.nsamps, band, buffer,
+                                desc->tile_nsamps, false);
+        if (result != 0) return result;
+        buffer += img_std_plane_size(desc);
+    }
+    return 0;
+}
+
+std::int32_t img_std_write_tile(void *desc, std::int32_t band, std::int32_t tile,
+                                const std::uint8_t *buffer)
+{
+    auto *const image = static_cast<img_desc *>(desc);
+    return img_type_of(image).write_tiles(image, tile, 1, band, buffer);
+}
+
+void img_std_split_tile(const std::uint8_t *tile, std::int32_t tile_nsamps,
+                        std::int32_t tile_nlines, std::int32_t nbytes, std::int32_t nbands,
+                        const std::array<std::int32_t, 3> &band_map,
+                        const std::array<std::uint8_t *, 3> &planes)
+{
+    const std::size_t pixels =
+        static_cast<std::size_t>(tile_nsamps) * static_cast<std::size_t>(tile_nlines);
+    split_bytes(tile, pixels * static_cast<std::size_t>(nbands * nbytes), nbytes, nbands, band_map,
+                planes);
+}
+
+void img_std_merge_tile(std::int32_t nbands, const std::array<std::int32_t, 3> &band_map,
+                        const std::array<const std::uint8_t *, 3> &planes, std::int32_t tile_nsamps,
+                        std::int32_t tile_nlines, std::int32_t nbytes, std::uint8_t *tile)
+{
+    const auto width = static_cast<std::size_t>(nbytes);
+    const auto bands = static_cast<std::size_t>(nbands);
+    const std::size_t pixels =
+        static_cast<std::size_t>(tile_nsamps) * static_cast<std::size_t>(tile_nlines);
+    for (std::size_t position = 0; position < bands; ++position)
+        if (const auto *plane = planes[static_cast<std::size_t>(band_map[position])]; plane)
+            img_std_copy_samples(plane, width, tile + position * width, bands * width, pixels,
+                                 nbytes, false);
+}

@@ -1,0 +1,98 @@
+// Between a file image and an in-memory image, and single samples of the latter.
+#include "api/img_desc.h"
+#include "api/report.h"
+#include "io/io_method.h"
+#include "std/std.h"
+
+#include <cstring>
+#include <limits>
+
+namespace
+{
+
+// Bytes of one band of an in-memory image, as img_std_create_mem lays them out.
+std::int64_t band_bytes(const img_desc *desc)
+{
+    const img_std_file *const file = desc->std_file;
+    if (file->tile_size != 0)
+        return std::int64_t{file->tiles_down} * file->tiles_across * file->tile_size;
+    return std::int64_t{file->padded_nsamps} * desc->nlines * desc->nbytes;
+}
+
+bool is_whole_image_per_pixel_or_tile(const img_desc *desc)
+{
+    return desc->layout == IMG_LAYOUT_BIP || desc->layout == IMG_LAYOUT_TILED ||
+           desc->layout == IMG_LAYOUT_TILED_BIP;
+}
+
+// Returns 0 when the images fit each other at this place, else -1 after a message.
+std::int32_t check_fit(const img_desc *desc, const img_desc *mem_desc, std::int32_t line0,
+                       std::int32_t samp0)
+{
+    if (desc->nsamps != mem_desc->nsamps)
+        return img_fail("Only images with same # samps currently supported!\n");
+    if (desc->nbands != mem_desc->nbands)
+        return img_fail("Only images with same # bands currently supported!\n");
+    if (desc->std_file->tile_size == 0) return 0;
+    if (desc->tile_nsamps != mem_desc->tile_nsamps || desc->tile_nlines != mem_desc->tile_nlines)
+        return img_fail("Only images with same tile sizes currently supported!\n");
+    if (line0 % desc->tile_nlines != 0 || samp0 % desc->tile_nsamps != 0)
+        return img_fail("Tiled images must be loaded/dumped on tile boundaries!!\n");
+    return 0;
+}
+
+// Moves `size` bytes between the file at `offset` and `data`. Returns the bytes moved, or -1.
+std::int32_t transfer(std::int32_t writing, const img_desc *desc, std::int32_t offset,
+                      std::uint8_t *data, std::int32_t size)
+{
+    const img_io_method *const method = desc->io_method;
+    const std::int32_t fd = desc->std_file->data_fd;
+    const auto count = static_cast<std::uint32_t>(size);
+    if (method->seek(fd, offset, 0) != offset) return -1;
+    return writing != 0 ? method->write(fd, data, count) : method->read(fd, data, count);
+}
+
+}  // namespace
+
+std::int32_t img_std_io_virtual(std::int32_t writing, img_desc *desc, img_desc *mem_desc,
+                                std::int32_t line0, std::int32_t samp0)
+{
+    if (!mem_desc->mem_image || desc->std_file->data_fd == -1) return -1;
+    if (check_fit(desc, mem_desc, line0, samp0) == -1) return -1;
+    const bool at_once = is_whole_image_per_pixel_or_tile(desc);
+    const std::int32_t transfers = at_once ? 1 : desc->nbands;
+    const std::int64_t size = band_bytes(mem_desc) * (at_once ? mem_desc->nbands : 1);
+    for (std::int32_t band = 0; band < transfers; ++band) {
+        const std::int32_t offset = img_std_sample_offset(desc, line0, samp0, band);
+        if (offset == -1 || offset + size > std::numeric_limits<std::int32_t>::max()) return -1;
+        const auto count = static_cast<std::int32_t>(size);
+        const std::int32_t moved =
+            transfer(writing, desc, offset, mem_desc->mem_image.get() + band * size, count);
+        if (moved == -1) return img_fail_errno("img_std_io_virtual:write");
+        if (moved != count && at_once)
+            return img_fail("img_std_io_virtual:Only %d of %d bytes ioed!!\n", moved, count);
+        if (moved != count)
+            return img_fail("img_std_io_virtual: %d of %d bytes ioed!!\n", moved, count);
+    }
+    return 0;
+}
+
+std::int32_t img_std_pix_io_virtual(std::int32_t writing, img_desc *desc, std::int32_t line,
+                                    std::int32_t samp, std::int32_t band, std::uint8_t *value)
+{
+    if (!desc->mem_image) return -1;
+    const std::int32_t offset = img_std_sample_offset(desc, line, samp, band);
+    if (offset == -1) return -1;
+    if (offset > desc->std_file->veof_max)
+        return img_fail("img_std_pix_io_virtual:Pixel out of range.\n");
+    // The last sample may begin within the image and end beyond it.
+    const std::int64_t room = std::int64_t{desc->std_file->veof_max} - offset + 1;
+    if (room < desc->nbytes) return -1;
+    std::uint8_t *const sample = desc->mem_image.get() + offset;
+    const auto width = static_cast<std::size_t>(desc->nbytes);
+    if (writing != 0)
+        std::memcpy(sample, value, width);
+    else
+        std::memcpy(value, sample, width);
+    return 0;
+}
