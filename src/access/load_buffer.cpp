@@ -10,8 +10,7 @@
 #include <cstring>
 #include <new>
 
-namespace
-{
+namespace {
 
 // Returns the image when the host may read this window of it, else null after a message.
 img_desc *readable_image(img_handle handle, std::int32_t nsamps, std::int32_t band,

@@ -7,8 +7,7 @@
 #include <new>
 #include <utility>
 
-namespace
-{
+namespace {
 
 using entry = img_tile_cache_entry;
 

@@ -5,8 +5,7 @@
 #include "api/types.h"
 #include "std/std.h"
 
-namespace
-{
+namespace {
 
 bool is_untiled(const img_desc *desc)
 {

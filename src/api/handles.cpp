@@ -8,11 +8,9 @@
 #include <cerrno>
 #include <cstring>
 #include <new>
-#include <numeric>
 #include <utility>
 
-namespace
-{
+namespace {
 
 constexpr int NO_FREE_HANDLE = 24;  // error number, of the same value on every system
 
@@ -56,33 +54,6 @@ img_desc *new_record(img_handle handle, std::int32_t oflags)
 }
 
 }  // namespace
-
-img_id_pool *img_pool_create(std::int32_t low, std::int32_t high)
-{
-    const std::int32_t count = high - low;
-    auto ids = std::unique_ptr<std::int32_t[]>(new (std::nothrow)
-                                                   std::int32_t[static_cast<std::size_t>(count)]);
-    if (!ids) return nullptr;
-    std::iota(ids.get(), ids.get() + count, low);
-    return new (std::nothrow) img_id_pool{.count = count, .next = 0, .ids = std::move(ids)};
-}
-
-std::int32_t img_pool_take(img_id_pool *pool)
-{
-    if (pool == nullptr || !pool->ids || pool->next >= pool->count) return -1;
-    return pool->ids[static_cast<std::size_t>(pool->next++)];
-}
-
-void img_pool_give_back(img_id_pool *pool, std::int32_t id)
-{
-    if (pool == nullptr || !pool->ids || pool->next <= 0) return;
-    pool->ids[static_cast<std::size_t>(--pool->next)] = id;
-}
-
-void img_pool_free(img_id_pool *pool)
-{
-    delete pool;
-}
 
 img_desc *img_find_image(img_handle handle)
 {

@@ -1,7 +1,8 @@
-// The record of one open image, the table of open images and the pool of their handles.
+// The record of one open image, and the table of open images.
 #ifndef IMG_DESC_H
 #define IMG_DESC_H
 
+#include "api/id_pool.h"
 #include "api/img.h"
 
 #include <array>
@@ -57,21 +58,6 @@ inline std::int32_t img_access_mode(const img_desc *desc)
 {
     return desc->oflags & 3;
 }
-
-// Pool of the ids low..high-1, lowest first; an id given back is the next one handed out.
-struct img_id_pool {
-    std::int32_t count;                   // ids in the pool
-    std::int32_t next;                    // ids taken; the free ones are ids[next..count-1]
-    std::unique_ptr<std::int32_t[]> ids;  // null is a pool without ids
-};
-
-// Returns a new pool, to be freed with img_pool_free; null when memory is short.
-img_id_pool *img_pool_create(std::int32_t low, std::int32_t high);
-// Returns an id, or -1 when there is no pool or no free id.
-std::int32_t img_pool_take(img_id_pool *pool);
-// Puts `id` back; does nothing when there is no pool or no id is taken.
-void img_pool_give_back(img_id_pool *pool, std::int32_t id);
-void img_pool_free(img_id_pool *pool);
 
 inline img_id_pool *img_handle_pool = nullptr;  // made at start-up, gone after img_mgr_cleanup
 inline std::array<img_desc *, IMG_MAX_HANDLES> img_open_images{};  // by handle; null: not open

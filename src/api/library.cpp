@@ -8,8 +8,7 @@
 
 #include <utility>
 
-namespace
-{
+namespace {
 
 using type_registration = std::int32_t (*)(std::int32_t slot, img_type_desc *slot_record);
 

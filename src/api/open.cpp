@@ -7,8 +7,7 @@
 #include <cerrno>
 #include <new>
 
-namespace
-{
+namespace {
 
 constexpr int INVALID_ARGUMENT = 22;  // error number, of the same value on every system
 constexpr std::int32_t CREATE_FLAGS = IMG_OPEN_READ_WRITE | IMG_OPEN_CREATE | IMG_OPEN_TRUNCATE;

@@ -10,10 +10,13 @@
 
 #include "api/img.h"
 
+#include <algorithm>
 #include <array>
 #include <cstdint>
+#include <memory>
 
 inline constexpr std::int32_t IMG_CHAIN_LINKS = 10;
+inline constexpr std::int32_t IMG_CHAIN_MAX_BITS = 30;  // so that a table's size fits 31 bits
 
 // A window of samples in memory. Row i starts at sample i * stride. Two-byte samples are in host
 // order; a width of b bits takes ((b - 1) >> 3) + 1 bytes.
@@ -152,9 +155,18 @@ std::uint8_t *img_chain_prepare_operations(img_handle handle, std::uint8_t *buff
 // Passes what was read through the links into the caller's buffer. Returns 0; -1 after a message,
 // quietly without a preparation or memory for a link's output.
 std::int32_t img_apply_img_chain(img_handle handle);
-// Frees the chain's own buffer, if it has one, after a failed read.
+// Frees the chain's own buffer, if it has one, after a failed read, and forgets it.
 void img_chain_release(img_handle handle);
+// Returns memory for `nlines` x `stride` samples; null when it cannot be had.
+std::unique_ptr<std::uint8_t[]> img_chain_new_buffer(std::int32_t nlines, std::int32_t stride,
+                                                     std::int32_t nbytes);
 
+// Returns the entry of `sample` in a table of `size` entries, the last one for what is beyond it.
+inline std::uint16_t img_chain_entry(const std::uint16_t *table, std::int32_t size,
+                                     std::uint32_t sample)
+{
+    return table[std::min(sample, static_cast<std::uint32_t>(size) - 1)];
+}
 // Replaces every sample of the window by its entry, in one-byte samples by the entry's low byte.
 void img_chain_apply_lut(std::uint8_t *buffer, const img_buffer_def *def, const img_chain_lut *lut);
 // Re-expresses the table of `src` for the widths of `dst`, whose size may not exceed the room in

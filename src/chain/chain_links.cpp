@@ -6,10 +6,7 @@
 #include <algorithm>
 #include <new>
 
-namespace
-{
-
-constexpr std::int32_t MAX_BITS = 30;  // so that a table's size fits 31 bits
+namespace {
 
 std::array<img_chain, IMG_MAX_HANDLES> img_chains{};
 
@@ -20,7 +17,7 @@ bool is_slot(std::int32_t link)
 
 bool is_width(std::int32_t bits)
 {
-    return bits >= 0 && bits <= MAX_BITS;
+    return bits >= 0 && bits <= IMG_CHAIN_MAX_BITS;
 }
 
 img_chain_link &link_of(img_handle handle, std::int32_t link)
@@ -194,4 +191,11 @@ std::int32_t img_chain_out_nbytes(img_handle handle)
 std::int32_t img_chain_nbytes(std::int32_t nbits)
 {
     return ((nbits - 1) >> 3) + 1;
+}
+
+void img_chain_release(img_handle handle)
+{
+    img_chain &chain = img_chain_of(handle);
+    if (chain.work_buffer != chain.final_buffer) delete[] chain.work_buffer;
+    chain.work_buffer = nullptr;
 }

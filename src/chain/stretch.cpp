@@ -7,8 +7,7 @@
 #include <memory>
 #include <new>
 
-namespace
-{
+namespace {
 
 constexpr std::int32_t MAX_BITS = 16;
 

@@ -5,8 +5,7 @@
 
 #include <new>
 
-namespace
-{
+namespace {
 
 // Gives the record a trailer of zeros and returns it; empty when memory is short.
 std::span<std::uint8_t> new_trailer(img_desc *desc)

@@ -8,8 +8,7 @@
 #include <algorithm>
 #include <string_view>
 
-namespace
-{
+namespace {
 
 constexpr std::string_view SIGNATURE = "VITec";
 constexpr std::int32_t SMALLEST_TILE = 8;

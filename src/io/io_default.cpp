@@ -2,8 +2,7 @@
 #include "io/io_method.h"
 #include "io/platform.h"
 
-namespace
-{
+namespace {
 
 double no_value()
 {

@@ -5,8 +5,7 @@
 #include <new>
 #include <string_view>
 
-namespace
-{
+namespace {
 
 // What a method that leaves an operation out does when it is asked for it.
 template <typename Operation>

@@ -13,8 +13,7 @@
 
 static_assert(sizeof(off_t) >= 8, "lengths beyond 31 bits must be seen to be refused");
 
-namespace
-{
+namespace {
 
 constexpr std::int32_t ACCESS_MODE = 3;  // the bits of the open flags that hold the access mode
 

@@ -190,8 +190,7 @@ void img_std_merge_tile(std::int32_t nbands, const std::array<std::int32_t, 3> &
 // The scope of reads of tiles that are to be overlaid and stored again. While it lasts,
 // img_std_read_tiles prints nothing, and a read that does not get bytes that the file holds is
 // told apart from one that meets the end of the data. Scopes may lie within each other.
-class img_std_pre_read
-{
+class img_std_pre_read {
 public:
     explicit img_std_pre_read(img_desc *desc);
     ~img_std_pre_read();

@@ -8,8 +8,7 @@
 #include <limits>
 #include <new>
 
-namespace
-{
+namespace {
 
 constexpr std::int32_t FILE_MODE = 0666;
 enum : std::int32_t { FROM_START = 0, FROM_CURRENT = 1, FROM_END = 2 };

@@ -8,8 +8,7 @@
 #include <cerrno>
 #include <new>
 
-namespace
-{
+namespace {
 
 std::size_t bytes_of(const img_desc *desc, std::int32_t nsamps)
 {

@@ -4,8 +4,7 @@
 
 #include <limits>
 
-namespace
-{
+namespace {
 
 std::int64_t untiled_offset(const img_desc *desc, std::int64_t line, std::int64_t samp,
                             std::int64_t band)

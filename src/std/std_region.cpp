@@ -2,8 +2,7 @@
 #include "api/img_desc.h"
 #include "std/std.h"
 
-namespace
-{
+namespace {
 
 enum class organisation { lines, interleaved_lines, tiles };
 

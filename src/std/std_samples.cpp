@@ -3,8 +3,7 @@
 
 #include <cstring>
 
-namespace
-{
+namespace {
 
 template <std::size_t Nbytes>
 void copy_spaced(const std::uint8_t *from, std::size_t from_step, std::uint8_t *to,

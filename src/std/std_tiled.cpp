@@ -6,12 +6,10 @@
 
 #include <new>
 
-namespace
-{
+namespace {
 
 // How a stretch of lines, or of samples, falls into tiles.
-class tile_span
-{
+class tile_span {
 public:
     struct part {
         std::int32_t first;  // first line or sample in the tile
@@ -22,14 +20,8 @@ public:
         : m_begin(begin), m_last(begin + extent - 1), m_tile_extent(tile_extent)
     {
     }
-    std::int32_t first_tile() const
-    {
-        return m_begin / m_tile_extent;
-    }
-    std::int32_t ntiles() const
-    {
-        return m_last / m_tile_extent - first_tile() + 1;
-    }
+    std::int32_t first_tile() const { return m_begin / m_tile_extent; }
+    std::int32_t ntiles() const { return m_last / m_tile_extent - first_tile() + 1; }
     // What the stretch covers of its `index`th tile.
     part in_tile(std::int32_t index) const
     {
@@ -45,8 +37,7 @@ private:
 
 // A region of a tiled image together with the run buffer, which holds the region's part of one
 // row of tiles at a time.
-class tiled_region
-{
+class tiled_region {
 public:
     tiled_region(img_desc *desc, std::int32_t line, std::int32_t samp, std::int32_t nlines,
                  std::int32_t nsamps, std::int32_t stride)
@@ -55,22 +46,13 @@ public:
           m_run(new (std::nothrow) std::uint8_t[run_length()])
     {
     }
-    std::uint8_t *run() const
-    {
-        return m_run.get();
-    }  // null: memory is short
+    std::uint8_t *run() const { return m_run.get(); }  // null: memory is short
     std::size_t run_length() const
     {
         return static_cast<std::size_t>(ntiles()) * img_std_plane_size(m_desc);
     }
-    std::int32_t tile_rows() const
-    {
-        return m_lines.ntiles();
-    }
-    std::int32_t ntiles() const
-    {
-        return m_samps.ntiles();
-    }
+    std::int32_t tile_rows() const { return m_lines.ntiles(); }
+    std::int32_t ntiles() const { return m_samps.ntiles(); }
     std::int32_t first_tile(std::int32_t tile_row) const
     {
         return (m_lines.first_tile() + tile_row) * m_desc->std_file->tiles_across +
@@ -95,10 +77,7 @@ public:
     }
 
 private:
-    std::size_t nbytes() const
-    {
-        return static_cast<std::size_t>(m_desc->nbytes);
-    }
+    std::size_t nbytes() const { return static_cast<std::size_t>(m_desc->nbytes); }
     std::size_t run_byte(std::int32_t tile, std::int32_t line, std::int32_t samp) const
     {
         const std::int32_t sample = line * m_desc->tile_nsamps + samp;

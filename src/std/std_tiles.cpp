@@ -10,23 +10,18 @@
 #include <new>
 #include <utility>
 
-namespace
-{
+namespace {
 
 using tile_buffer = std::unique_ptr<std::uint8_t[]>;
 
 // Sets the image's cache aside, so that reads go to the file alone, and puts it back.
-class without_cache
-{
+class without_cache {
 public:
     explicit without_cache(img_desc *desc)
         : m_desc(desc), m_cache(std::exchange(desc->tile_cache, nullptr))
     {
     }
-    ~without_cache()
-    {
-        m_desc->tile_cache = m_cache;
-    }
+    ~without_cache() { m_desc->tile_cache = m_cache; }
     without_cache(const without_cache &) = delete;
     without_cache &operator=(const without_cache &) = delete;
 

@@ -7,8 +7,7 @@
 #include <cstring>
 #include <limits>
 
-namespace
-{
+namespace {
 
 // Bytes of one band of an in-memory image, as img_std_create_mem lays them out.
 std::int64_t band_bytes(const img_desc *desc)

@@ -1,0 +1,32 @@
+#include "api/id_pool.h"
+
+#include <new>
+#include <numeric>
+#include <utility>
+
+img_id_pool *img_pool_create(std::int32_t low, std::int32_t high)
+{
+    const std::int32_t count = high - low;
+    auto ids = std::unique_ptr<std::int32_t[]>(new (std::nothrow)
+                                                   std::int32_t[static_cast<std::size_t>(count)]);
+    if (!ids) return nullptr;
+    std::iota(ids.get(), ids.get() + count, low);
+    return new (std::nothrow) img_id_pool{.count = count, .next = 0, .ids = std::move(ids)};
+}
+
+std::int32_t img_pool_take(img_id_pool *pool)
+{
+    if (pool == nullptr || !pool->ids || pool->next >= pool->count) return -1;
+    return pool->ids[static_cast<std::size_t>(pool->next++)];
+}
+
+void img_pool_give_back(img_id_pool *pool, std::int32_t id)
+{
+    if (pool == nullptr || !pool->ids || pool->next <= 0) return;
+    pool->ids[static_cast<std::size_t>(--pool->next)] = id;
+}
+
+void img_pool_free(img_id_pool *pool)
+{
+    delete pool;
+}

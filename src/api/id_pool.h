@@ -1,0 +1,23 @@
+// A pool of small integers: the handles of open images are drawn from one.
+#ifndef IMG_ID_POOL_H
+#define IMG_ID_POOL_H
+
+#include <cstdint>
+#include <memory>
+
+// Pool of the ids low..high-1, lowest first; an id given back is the next one handed out.
+struct img_id_pool {
+    std::int32_t count;                   // ids in the pool
+    std::int32_t next;                    // ids taken; the free ones are ids[next..count-1]
+    std::unique_ptr<std::int32_t[]> ids;  // null is a pool without ids
+};
+
+// Returns a new pool, to be freed with img_pool_free; null when memory is short.
+img_id_pool *img_pool_create(std::int32_t low, std::int32_t high);
+// Returns an id, or -1 when there is no pool or no free id.
+std::int32_t img_pool_take(img_id_pool *pool);
+// Puts `id` back; does nothing when there is no pool or no id is taken.
+void img_pool_give_back(img_id_pool *pool, std::int32_t id);
+void img_pool_free(img_id_pool *pool);
+
+#endif

@@ -1,0 +1,117 @@
+// Lookup tables at work: over a buffer, from one buffer to another, and for other widths.
+#include "chain/chain.h"
+
+#include <algorithm>
+#include <cstring>
+#include <memory>
+#include <new>
+
+namespace {
+
+template <typename Sample>
+Sample load_sample(const std::uint8_t *at)
+{
+    Sample sample;
+    std::memcpy(&sample, at, sizeof sample);
+    return sample;
+}
+
+template <typename Sample>
+void store_sample(std::uint8_t *at, std::uint16_t value)
+{
+    const auto sample = static_cast<Sample>(value);
+    std::memcpy(at, &sample, sizeof sample);
+}
+
+// Passes every sample of a window through `map`, from one buffer to another or in place.
+template <typename In, typename Out, typename Map>
+void map_window(const std::uint8_t *from, const img_buffer_def &from_def, std::uint8_t *to,
+                const img_buffer_def &to_def, Map map)
+{
+    for (std::int32_t line = 0; line < from_def.nlines; ++line) {
+        const auto row = static_cast<std::size_t>(line);
+        const auto *in = from + row * static_cast<std::size_t>(from_def.stride) * sizeof(In);
+        auto *out = to + row * static_cast<std::size_t>(to_def.stride) * sizeof(Out);
+        for (std::int32_t samp = 0; samp < from_def.nsamps; ++samp) {
+            store_sample<Out>(out, map(load_sample<In>(in)));
+            in += sizeof(In);
+            out += sizeof(Out);
+        }
+    }
+}
+
+}  // namespace
+
+void img_chain_apply_lut(std::uint8_t *buffer, const img_buffer_def *def, const img_chain_lut *lut)
+{
+    const auto map = [table = lut->lut, size = lut->size](std::uint32_t sample) {
+        return img_chain_entry(table, size, sample);
+    };
+    if (def->nbytes == 1)
+        map_window<std::uint8_t, std::uint8_t>(buffer, *def, buffer, *def, map);
+    else
+        map_window<std::uint16_t, std::uint16_t>(buffer, *def, buffer, *def, map);
+}
+
+void img_chain_convert_lut(const std::uint16_t *src_table, const img_chain_lut *src,
+                           std::uint16_t *dst_table, const img_chain_lut *dst)
+{
+    const std::int32_t in_shift = dst->bits_in - src->bits_in;
+    const std::int32_t out_shift = dst->bits_out - src->bits_out;
+    if (in_shift == 0 && out_shift == 0) {
+        if (src_table != dst_table) std::copy_n(src_table, dst->size, dst_table);
+        return;
+    }
+    // Chains only widen; a narrower index or value takes the high bits of the wider one.
+    for (std::int32_t i = 0; i < dst->size; ++i) {
+        const std::int32_t from = in_shift >= 0 ? i >> in_shift : i << -in_shift;
+        const std::int64_t value = src_table[from];
+        dst_table[i] =
+            static_cast<std::uint16_t>(out_shift >= 0 ? value << out_shift : value >> -out_shift);
+    }
+}
+
+std::int32_t img_chain_lut_input_definition(void *record, const img_buffer_def *out_def,
+                                            img_buffer_def *in_def)
+{
+    const auto &lut = *static_cast<const img_chain_lut *>(record);
+    if (out_def->nbits != lut.bits_out) return -1;
+    *in_def = *out_def;
+    in_def->nbits = lut.bits_in;
+    in_def->nbytes = img_chain_nbytes(lut.bits_in);
+    return lut.bits_in != out_def->nbits ? 1 : 0;
+}
+
+std::int32_t img_chain_lut_remap(void *record, const std::uint8_t *in_buffer,
+                                 const img_buffer_def *in_def, std::uint8_t *out_buffer,
+                                 const img_buffer_def *out_def, std::int32_t pending,
+                                 const std::uint16_t *lut)
+{
+    const auto &own = *static_cast<const img_chain_lut *>(record);
+    if (in_def->nbits < 0 || in_def->nbits > IMG_CHAIN_MAX_BITS) return -1;
+    const std::int32_t size = std::int32_t{1} << in_def->nbits;
+    const std::uint16_t *table = own.lut;
+    std::unique_ptr<std::uint16_t[]> converted;
+    if (in_def->nbits != own.bits_in) {
+        converted.reset(new (std::nothrow) std::uint16_t[static_cast<std::size_t>(size)]);
+        if (!converted) return -1;
+        img_chain_lut widths = own;
+        widths.bits_in = static_cast<std::uint8_t>(in_def->nbits);
+        widths.size = size;
+        img_chain_convert_lut(own.lut, &own, converted.get(), &widths);
+        table = converted.get();
+    }
+    const auto map = [=](std::uint32_t sample) {
+        return img_chain_entry(table, size,
+                               pending != 0 ? img_chain_entry(lut, size, sample) : sample);
+    };
+    if (in_def->nbytes == 1 && out_def->nbytes == 2)
+        map_window<std::uint8_t, std::uint16_t>(in_buffer, *in_def, out_buffer, *out_def, map);
+    else if (in_def->nbytes == 2 && out_def->nbytes == 1)
+        map_window<std::uint16_t, std::uint8_t>(in_buffer, *in_def, out_buffer, *out_def, map);
+    else if (in_def->nbytes != 1)
+        map_window<std::uint16_t, std::uint16_t>(in_buffer, *in_def, out_buffer, *out_def, map);
+    else
+        map_window<std::uint8_t, std::uint8_t>(in_buffer, *in_def, out_buffer, *out_def, map);
+    return 0;
+}
