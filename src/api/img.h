@@ -138,8 +138,8 @@ IMG_EXPORT int32_t img_query_num_bands(img_handle handle);
  * above, and when the file cannot be read or ends before the window does: lines before the one
  * that failed, and of a one-byte image the bytes that came of that one, are in `buffer` (tiled
  * images: the rows of tiles before). Of a two-byte image the rows of `buffer` are left as they
- * were. Returns -1 quietly when memory for the stretch's working copy is short or `buffer` is
- * null. */
+ * were. Returns -1 quietly when `buffer` is null or would have to hold 2^31 bytes or more, and
+ * when memory for the stretch's working copy is short. */
 IMG_EXPORT int32_t img_load_buffer(img_handle handle, int32_t line, int32_t samp, int32_t nlines,
                                    int32_t nsamps, int32_t band, void *buffer, int32_t stride,
                                    const uint8_t *fill);

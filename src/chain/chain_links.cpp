@@ -61,8 +61,9 @@ void links_changed(img_handle handle)
 {
     img_chain &chain = img_chain_of(handle);
     img_chain_update_out_bits(handle);
-    chain.identity = std::ranges::all_of(
+    const bool empty = std::ranges::all_of(
         chain.links, [](const img_chain_link &link) { return link.kind == IMG_CHAIN_EMPTY; });
+    chain.identity = empty ? 1 : 0;
     chain.prepared = 0;
 }
 
@@ -119,11 +120,13 @@ std::int32_t img_chain_add_lut_link(img_handle handle, std::int32_t link, std::i
         links_changed(handle);
         return 0;
     }
-    auto *const record =
-        new (std::nothrow) img_chain_lut(lut_record(bits_in, bits_out, lut, owned));
-    if (record == nullptr) return -1;
-    img_chain_add_remap_link(handle, link, bits_out, record, img_chain_lut_remap,
-                             img_chain_lut_input_definition);
+    std::unique_ptr<img_chain_lut> record(
+        new (std::nothrow) img_chain_lut(lut_record(bits_in, bits_out, lut, owned)));
+    if (!record) return -1;
+    if (img_chain_add_remap_link(handle, link, bits_out, record.get(), img_chain_lut_remap,
+                                 img_chain_lut_input_definition) != 0)
+        return -1;
+    static_cast<void>(record.release());  // the link owns it now
     slot.owns_arg = 1;
     return 0;
 }
@@ -146,7 +149,7 @@ std::int32_t img_chain_add_lut_create_link(img_handle handle, std::int32_t link,
     }
     if (img_chain_add_lut_link(handle, target, bits_in, bits_out, remap, lut, owned) != 0)
         return -1;
-    made.release();  // the target link owns it now
+    static_cast<void>(made.release());  // the target link owns it now
     img_chain_link &slot = link_of(handle, link);
     slot.kind = IMG_CHAIN_LUT_FCN;
     slot.arg = arg;
@@ -160,11 +163,12 @@ std::int32_t img_chain_remove_link(img_handle handle, std::int32_t link)
 {
     if (img_validate_img_handle(handle) != 0 || !is_slot(link)) return -1;
     img_chain &chain = img_chain_of(handle);
-    img_chain_link &slot = link_of(handle, link);
-    const std::int32_t target = slot.kind == IMG_CHAIN_LUT_FCN ? slot.lut_fcn.target : -1;
-    free_what_is_owned(chain, slot);
+    while (link != -1) {
+        img_chain_link &slot = link_of(handle, link);
+        link = slot.kind == IMG_CHAIN_LUT_FCN ? slot.lut_fcn.target : -1;
+        free_what_is_owned(chain, slot);
+    }
     links_changed(handle);
-    if (target != -1) img_chain_remove_link(handle, target);
     return 0;
 }
 

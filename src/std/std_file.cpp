@@ -112,8 +112,8 @@ bool set_up_layout(img_desc *desc, img_std_file *file)
     const bool tiled = is_tiled(desc);
     if (desc->layout == IMG_LAYOUT_DEFAULT)
         desc->layout = tiled ? hooks_of(desc).tiled_layout : hooks_of(desc).untiled_layout;
-    if (!tiled && gets_virtual_tiles(desc)) {
-        desc->virtual_tiled = 1;
+    desc->virtual_tiled = !tiled && gets_virtual_tiles(desc) ? 1 : 0;
+    if (desc->virtual_tiled != 0) {
         desc->tile_nsamps = img_default_tile_nsamps;
         desc->tile_nlines = img_default_tile_nlines;
         desc->layout = IMG_LAYOUT_BAND_TILED;
