@@ -24,6 +24,10 @@ struct img_window {
 std::int32_t img_window_test(img_handle handle, std::int32_t line, std::int32_t samp,
                              std::int32_t nlines, std::int32_t nsamps);
 
+// True when `samples` take less than 2^31 bytes, as all of any image does. A host that asks for
+// more is mistaken, and filling or reading that much would run over the end of its buffer.
+bool img_fits_a_buffer(std::int64_t samples, std::int32_t nbytes);
+
 // Reduces a window that is not outside to its part inside the image, which an empty image may
 // leave without samples. Returns the samples that come before that part in a buffer whose rows
 // are `stride` samples apart.

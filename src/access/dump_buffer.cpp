@@ -27,6 +27,10 @@ std::int32_t img_dump_buffer(img_handle handle, std::int32_t line, std::int32_t 
         if (place == IMG_WINDOW_OUTSIDE) return 0;
         if (place == IMG_WINDOW_PARTIAL) skipped = img_clip_window(desc, &window, stride);
     }
+    // Rows that are not read need not be there.
+    const std::int64_t samples = static_cast<std::int64_t>(skipped) +
+                                 (std::int64_t{window.nlines} - 1) * stride + window.nsamps;
+    if (!img_fits_a_buffer(samples, desc->nbytes)) return -1;
     return img_type_of(desc).write(desc, window.line, window.samp, window.nlines, window.nsamps,
                                    band,
                                    static_cast<const std::uint8_t *>(buffer) +

@@ -33,15 +33,6 @@ img_desc *readable_image(img_handle handle, std::int32_t nsamps, std::int32_t ba
     return nullptr;
 }
 
-// No buffer of a host is so large that the window would take 2^31 bytes or more in it: the
-// arguments are wrong, and filling what is outside the image would run over all that follows the
-// buffer.
-bool fits_a_buffer(img_handle handle, std::int32_t nlines, std::int32_t nsamps, std::int32_t stride)
-{
-    const std::int64_t samples = (std::int64_t{nlines} - 1) * stride + nsamps;
-    return samples <= INT32_MAX && samples * img_chain_out_nbytes(handle) <= INT32_MAX;
-}
-
 std::int32_t read_window(img_desc *desc, const img_window &window, std::int32_t band,
                          std::uint8_t *buffer, std::int32_t stride)
 {
@@ -92,7 +83,8 @@ std::int32_t img_load_buffer(img_handle handle, std::int32_t line, std::int32_t 
     img_desc *const desc = readable_image(handle, nsamps, band, stride);
     if (desc == nullptr) return -1;
     if (nlines < 1 || nsamps < 1) return 0;
-    if (buffer == nullptr || !fits_a_buffer(handle, nlines, nsamps, stride)) return -1;
+    const std::int64_t samples = (std::int64_t{nlines} - 1) * stride + nsamps;
+    if (buffer == nullptr || !img_fits_a_buffer(samples, img_chain_out_nbytes(handle))) return -1;
 
     const img_buffer_def def{
         .nlines = nlines,
@@ -102,7 +94,7 @@ std::int32_t img_load_buffer(img_handle handle, std::int32_t line, std::int32_t 
         .stride = stride,
         .nbytes = img_chain_out_nbytes(handle),
         .nbits = img_chain_out_bits(handle),
-        .fill = fill != nullptr ? *fill : img_zero_sample[0],
+        .fill = static_cast<std::uint16_t>(fill != nullptr ? *fill : 0),
     };
     img_buffer_def work_def;
     std::uint8_t *const work =
@@ -127,6 +119,11 @@ std::int32_t img_window_test(img_handle handle, std::int32_t line, std::int32_t 
     if (line < 0 || samp < 0 || line_end > desc->nlines || samp_end > desc->nsamps)
         return IMG_WINDOW_PARTIAL;
     return IMG_WINDOW_INSIDE;
+}
+
+bool img_fits_a_buffer(std::int64_t samples, std::int32_t nbytes)
+{
+    return samples <= INT32_MAX && samples * nbytes <= INT32_MAX;
 }
 
 std::size_t img_clip_window(const img_desc *desc, img_window *window, std::int32_t stride)

@@ -92,12 +92,11 @@ img_tile_cache *img_tile_cache_create(std::int32_t tile_bytes, std::int32_t ncol
 {
     if (tile_bytes < 1 || ncols < 0 || nrows < 0) return nullptr;
     const std::int64_t room = (std::int64_t{budget_mb} << 20) / tile_bytes;
-    if (room < 1) return nullptr;
     const std::int64_t cells = std::int64_t{ncols} * nrows;
+    if (room < 1 || cells > INT32_MAX) return nullptr;
     std::unique_ptr<entry *[]> grid(new (std::nothrow) entry *[static_cast<std::size_t>(cells)] {});
     if (!grid) return nullptr;
-    const auto capacity =
-        static_cast<std::int32_t>(std::min({cells, room, std::int64_t{INT32_MAX}}));
+    const auto capacity = static_cast<std::int32_t>(std::min(cells, room));
     return new (std::nothrow) img_tile_cache{.nrows = nrows,
                                              .ncols = ncols,
                                              .tile_bytes = tile_bytes,

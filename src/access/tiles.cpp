@@ -7,11 +7,6 @@
 
 namespace {
 
-bool is_untiled(const img_desc *desc)
-{
-    return desc->tile_nsamps == 0 || desc->tile_nlines == 0;
-}
-
 // Tiles in one band of a tiled image.
 std::int64_t tile_count(const img_desc *desc)
 {
@@ -74,7 +69,7 @@ std::int32_t img_load_tiles(img_handle handle, std::int32_t first_tile, std::int
     if (desc == nullptr || desc->mem_image || img_access_mode(desc) == IMG_OPEN_WRITE_ONLY ||
         img_type_of(desc).read_tiles == nullptr)
         return -1;
-    if (is_untiled(desc) || ntiles < 1) return 0;
+    if (!img_is_tiled(desc) || ntiles < 1) return 0;
     if (buffer == nullptr || !is_a_run_of_tiles(desc, first_tile, ntiles, band)) return -1;
     make_cache(desc);
     auto *const planes = static_cast<std::uint8_t *>(buffer);
@@ -90,7 +85,7 @@ std::int32_t img_dump_tiles(img_handle handle, std::int32_t first_tile, std::int
     if (desc == nullptr || img_access_mode(desc) == IMG_OPEN_READ_ONLY ||
         img_type_of(desc).write_tiles == nullptr)
         return -1;
-    if (is_untiled(desc) || ntiles < 1) return 0;
+    if (!img_is_tiled(desc) || ntiles < 1) return 0;
     if (buffer == nullptr || !is_a_run_of_tiles(desc, first_tile, ntiles, band)) return -1;
     const auto *const planes = static_cast<const std::uint8_t *>(buffer);
     if (desc->tile_cache != nullptr)

@@ -53,16 +53,18 @@ img_desc *new_record(img_handle handle, std::int32_t oflags)
     };
 }
 
+// Significant bits of samples of which only the bytes are known. Any number of bytes may come from
+// a header or a host; the set-up refuses it afterwards.
+std::int32_t default_nbits(std::int32_t nbytes)
+{
+    return nbytes == 2 ? 12 : static_cast<std::int32_t>(8U * static_cast<std::uint32_t>(nbytes));
+}
+
 }  // namespace
 
 img_desc *img_find_image(img_handle handle)
 {
     return handle >= 0 && handle < IMG_MAX_HANDLES ? table_slot(handle) : nullptr;
-}
-
-const img_type_desc &img_type_of(const img_desc *desc)
-{
-    return img_type_table[static_cast<std::size_t>(desc->type)];
 }
 
 img_handle img_alloc_image(const char *name, std::int32_t flags)
@@ -88,7 +90,7 @@ img_handle img_alloc_image(const char *name, std::int32_t flags)
 void img_release_image(img_handle handle, std::int32_t flush)
 {
     if (img_desc *const desc = img_find_image(handle); desc != nullptr) {
-        if (desc->tile_cache != nullptr) img_tile_cache_destroy(desc->tile_cache, flush);
+        img_tile_cache_destroy(std::exchange(desc->tile_cache, nullptr), flush);
         if (img_type_of(desc).close != nullptr) img_type_of(desc).close(desc);
         delete desc;
         table_slot(handle) = nullptr;
@@ -144,12 +146,6 @@ std::int32_t img_query_num_bands(img_handle handle)
     return desc->merge_bands != 0 ? 1 : desc->nbands;
 }
 
-std::int32_t img_default_nbits(std::int32_t nbytes)
-{
-    // Any byte count may come from a header or a host; the set-up refuses it afterwards.
-    return nbytes == 2 ? 12 : static_cast<std::int32_t>(8U * static_cast<std::uint32_t>(nbytes));
-}
-
 void img_set_image_params(img_desc *desc, std::int32_t nlines, std::int32_t nsamps,
                           std::int32_t tile_nsamps, std::int32_t tile_nlines, std::int32_t nbands,
                           std::int32_t nbytes, std::int32_t nbits, std::int32_t layout,
@@ -163,7 +159,7 @@ void img_set_image_params(img_desc *desc, std::int32_t nlines, std::int32_t nsam
     desc->tile_nlines = tile_nlines;
     desc->nbands = nbands;
     desc->nbytes = nbytes;
-    desc->nbits = nbits != -1 ? nbits : img_default_nbits(nbytes);
+    desc->nbits = nbits != -1 ? nbits : default_nbits(nbytes);
     desc->layout = layout;
     desc->lut_size = lut_size;
     desc->lut = {std::move(lut0), std::move(lut1), std::move(lut2)};

@@ -8,15 +8,17 @@
  * tile plane is one band of one tile: its lines one after the other, without padding.
  *
  * Results. Every function returns 0 or more on success and -1 on failure, unless said otherwise.
- * "After a message" means that one line on the standard error stream says what failed; "quietly"
- * means that nothing is printed. Nothing is undone: what was moved before a failure stays moved.
+ * "After a message" means that one line or more on the standard error stream say what failed;
+ * "quietly" means that nothing is printed. Nothing is undone: what was moved before a failure
+ * stays moved.
  *
- * Handles. An image is named by a small integer, 0..59, the lowest that was never used or the one
- * given back last. Any other number, and a closed handle, are refused as said at each function.
+ * Handles. An image is named by a small integer, 0..59: of those that were given back and are
+ * free the one given back last, else the lowest that was never used. Any other number, and a
+ * closed handle, are refused as said at each function.
  *
- * Limits. A file ends below 2^31 bytes; samples take one byte or two; two-byte samples have 12
- * significant bits. Images beyond that are refused when they are opened or created. Zero lines,
- * samples or bands make a valid, empty image.
+ * Limits. A file ends below 2^31 bytes, and so does its last tile, stored whole; a sample takes
+ * one byte or two. Images beyond that are refused when they are opened or created. Zero lines,
+ * samples or bands make a valid, empty image. Of two-byte samples 12 bits count.
  *
  * Threads. The library's tables are shared and unguarded: one thread calls it at a time. */
 #ifndef IMG_H
@@ -54,15 +56,16 @@ enum {
 
 /* Opens an existing image file and recognises its type.
  *
- * `name` is a file name; null counts as the empty name. An "@" ends the file name and begins the
- * name of an access method ("scene.img@tape"); without one, or with nothing after it, the file is
- * an ordinary one: a regular file or a block device. Leading "@" are dropped. `flags` are the
- * IMG_OPEN_ flags; other bits are refused.
+ * `name` is a file name; null counts as the empty name. Leading "@" are dropped; a further "@" ends
+ * the file name and begins the name of an access method, of which this version has none but "",
+ * ordinary files: regular files and block devices. So a file with an "@" within its name cannot be
+ * opened. `flags` are the IMG_OPEN_ flags; other bits are refused. Creating and truncating happen
+ * before anything is recognised: they leave an empty file, and the open fails.
  *
  * Returns a handle, to be given back with img_closefile. Returns -1 quietly with errno 22 when
  * the file cannot be opened, is of no known type, is cut short within its header, or describes an
  * image beyond the limits above; -1 with errno 24 after a message when 60 images are open or
- * after img_mgr_cleanup; -1 after a message when memory is short. */
+ * after img_mgr_cleanup; -1 when memory is short, after a message or as a file of no known type. */
 IMG_EXPORT img_handle img_openfile(const char *name, int32_t flags);
 
 /* Creates an image file, replacing a file of that name, and leaves it open for reading and writing.
@@ -72,16 +75,19 @@ IMG_EXPORT img_handle img_openfile(const char *name, int32_t flags);
  * tile width in samples and its height in lines; 0 and 0 make an untiled image. `nbytes` is the
  * bytes of a sample, 1 or 2.
  *   VITec: 0 to 3 bands; tile sizes 0 or powers of two from 8 to 32768; 1 or 2 bytes. A size is
- *   tested in its lower sixteen bits, so that 0x10008, too, passes for a power of two.
+ *   tested in its lower sixteen bits, so that 0x10008, too, passes for a power of two. With one of
+ *   the two 0 the image is untiled, but is still stored in multiples of the other.
  *   Helava: any number of bands; 1 byte. Tile sizes are not stored in the file and hold only
- *   until it is closed; they split the pixels, in file order, into pieces of that many samples.
+ *   until it is closed. They do not change where samples lie: a "tile" is a piece of that many
+ *   samples in file order, and one at the end of a band reaches into what follows it, the next
+ *   band or the trailer.
  * The header is written at once, in big-endian order. Samples that are never written read as an
  * error while the file ends before them, as 0 once it has grown past them or has been closed.
  *
  * Returns a handle. Returns -1 after a message: the name is empty or null; the type does not exist
  * or cannot be written; the geometry cannot be stored; the file cannot be created, or its header
  * not be written; 60 images are open or img_mgr_cleanup was called (errno 24); memory is short.
- * A file that was begun before the failure stays. */
+ * The file is emptied before the geometry is looked at, and what was written of it stays. */
 IMG_EXPORT img_handle img_createfile(const char *name, int32_t nlines, int32_t nsamps,
                                      int32_t nbands, int32_t type, int32_t tile_nsamps,
                                      int32_t tile_nlines, int32_t nbytes);
@@ -135,11 +141,12 @@ IMG_EXPORT int32_t img_query_num_bands(img_handle handle);
  *
  * Requires `nsamps` <= `stride`, 0 <= `band` < bands, an image not opened write-only.
  * Returns 0. Returns -1 after a message for a handle that names no image, for what is required
- * above, and when the file cannot be read or ends before the window does: lines before the one
- * that failed, and of a one-byte image the bytes that came of that one, are in `buffer` (tiled
- * images: the rows of tiles before). Of a two-byte image the rows of `buffer` are left as they
- * were. Returns -1 quietly when `buffer` is null or would have to hold 2^31 bytes or more, and
- * when memory for the stretch's working copy is short. */
+ * above, when memory is short, and when the file cannot be read or ends before the window does:
+ * of a one-byte image the lines before the one that failed and the bytes that came of that one
+ * are in `buffer` (tiled: the rows of tiles before), and the rest of a window that leaves the
+ * image holds the fill; of a two-byte image `buffer` is left as it was. Returns -1 quietly when
+ * `buffer` is null or would have to hold 2^31 bytes or more, and when memory for the working copy
+ * of a two-byte window is short. */
 IMG_EXPORT int32_t img_load_buffer(img_handle handle, int32_t line, int32_t samp, int32_t nlines,
                                    int32_t nsamps, int32_t band, void *buffer, int32_t stride,
                                    const uint8_t *fill);
@@ -156,9 +163,10 @@ IMG_EXPORT int32_t img_load_buffer(img_handle handle, int32_t line, int32_t samp
  * last, only `nsamps` <= `stride` * bytes per sample is tested: the rows of a two-byte window may
  * overlap in `buffer`.
  * Returns 0. Returns -1 quietly for a handle that names no image, an image opened read-only, and
- * a null `buffer`; -1 after a message for an unfit `nsamps` or `band`, when the file cannot be
- * written, or when a tile that the window shares cannot be read back. What was written before
- * the failure stays; stored samples outside the window are never lost. */
+ * a `buffer` that is null or of which 2^31 bytes or more would be spanned; -1 after a message for
+ * an unfit `nsamps` or `band`, when memory is short, when the file cannot be written, or when a
+ * tile that the window shares cannot be read back. What was written before the failure stays;
+ * stored samples outside the window are never lost. */
 IMG_EXPORT int32_t img_dump_buffer(img_handle handle, int32_t line, int32_t samp, int32_t nlines,
                                    int32_t nsamps, int32_t band, const void *buffer, int32_t stride,
                                    const void *fill);
@@ -172,8 +180,8 @@ IMG_EXPORT int32_t img_dump_buffer(img_handle handle, int32_t line, int32_t samp
  *
  * Returns 0. Returns -1 quietly for a handle that names no image, an image opened write-only, a
  * run that leaves the image's tiles, a band out of range, and a null `buffer`; -1 after a message
- * when the file cannot be read or ends before the run does: what the file holds of the run is in
- * `buffer` then, and the rest is as it was. */
+ * when the file cannot be read or ends before the run does: what was read until then is in
+ * `buffer`, and the rest is as it was. */
 IMG_EXPORT int32_t img_load_tiles(img_handle handle, int32_t first_tile, int32_t ntiles,
                                   int32_t band, void *buffer);
 

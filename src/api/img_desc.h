@@ -53,6 +53,11 @@ struct img_desc {
     img_merge_fn merge_fn;                   // null: it is not merged after all
 };
 
+inline bool img_is_tiled(const img_desc *desc)
+{
+    return desc->tile_nsamps != 0 && desc->tile_nlines != 0;
+}
+
 // IMG_OPEN_READ_ONLY, IMG_OPEN_WRITE_ONLY or IMG_OPEN_READ_WRITE, as the image was opened.
 inline std::int32_t img_access_mode(const img_desc *desc)
 {
@@ -80,11 +85,8 @@ std::int32_t img_validate_img_handle(img_handle handle);
 // Returns the significant bits per sample, or -1 quietly for a handle that names no image.
 std::int32_t img_query_nbits(img_handle handle);
 
-// Returns the significant bits of samples of which only the bytes are known: 12 for two bytes,
-// else 8 x `nbytes`.
-std::int32_t img_default_nbits(std::int32_t nbytes);
-
-// Fills in the geometry of an image that is being opened. `nbits` -1: the default. The three LUTs
+// Fills in the geometry of an image that is being opened. `nbits` -1: 12 for two-byte samples,
+// else 8 x `nbytes`. The three LUTs
 // of `lut_size` bytes pass to the record; null and 0: none.
 void img_set_image_params(img_desc *desc, std::int32_t nlines, std::int32_t nsamps,
                           std::int32_t tile_nsamps, std::int32_t tile_nlines, std::int32_t nbands,

@@ -53,11 +53,16 @@ std::int32_t img_mgr_cleanup()
     return 0;
 }
 
+const img_type_desc &img_type_of(const img_desc *desc)
+{
+    return img_type_table[static_cast<std::size_t>(desc->type)];
+}
+
 std::int32_t img_std_fill_type(std::int32_t slot, const char *name, const char *extension,
                                std::int32_t tiled_layout, std::int32_t untiled_layout,
                                img_image_fn probe, img_image_fn read_header,
                                img_image_fn write_header, img_image_fn padded_nlines_fn,
-                               img_image_fn padded_nsamps_fn, std::int32_t (*type_op)(),
+                               img_image_fn padded_nsamps_fn, img_type_op_fn type_op,
                                img_type_desc *slot_record)
 {
     img_type_hooks_table[static_cast<std::size_t>(slot)] = {

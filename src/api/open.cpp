@@ -70,7 +70,7 @@ std::int32_t open_as_some_type(img_desc *desc)
 {
     for (std::int32_t slot = 0; slot < IMG_MAX_TYPES; ++slot) {
         const img_type_desc &type = img_type_table[static_cast<std::size_t>(slot)];
-        if (type.enabled == 0) continue;
+        if (type.enabled == 0 || type.open == nullptr) continue;
         desc->type = slot;
         if (type.open(desc) != -1) return 0;
     }
@@ -112,7 +112,7 @@ img_handle img_createfile(const char *name, std::int32_t nlines, std::int32_t ns
     img_set_image_params(desc, nlines, nsamps, tile_nsamps, tile_nlines, nbands, nbytes, -1,
                          IMG_LAYOUT_DEFAULT, 0, nullptr, nullptr, nullptr);
     if (img_init_luts(desc) == -1) return release_for_want_of_memory(handle);
-    if (slot.create(desc) == -1) {
+    if (slot.create == nullptr || slot.create(desc) == -1) {
         img_release_image(handle, 0);
         return img_fail("img_createfile: could not create %s!\n", name);
     }

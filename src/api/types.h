@@ -41,6 +41,8 @@ using img_write_tiles_fn = std::int32_t (*)(img_desc *desc, std::int32_t first_t
                                             const std::uint8_t *buffer);
 // Anything done to an image as a whole.
 using img_image_fn = std::int32_t (*)(img_desc *desc);
+// What a type adds of its own; the library does not call it.
+using img_type_op_fn = std::int32_t (*)();
 
 // One image type. Operations return 0 or more for success and -1 for failure; an empty slot
 // means that the type does not offer the operation, and callers test for it.
@@ -61,7 +63,7 @@ struct img_type_desc {
     std::int32_t (*pix_io_virtual)(std::int32_t writing, img_desc *desc, std::int32_t line,
                                    std::int32_t samp, std::int32_t band, std::uint8_t *value);
     img_image_fn delete_image;  // closes the image and removes its files
-    std::int32_t (*type_op)();  // the type's own
+    img_type_op_fn type_op;
     std::array<void *, 3> spare;
 };
 
@@ -88,7 +90,7 @@ std::int32_t img_std_fill_type(std::int32_t slot, const char *name, const char *
                                std::int32_t tiled_layout, std::int32_t untiled_layout,
                                img_image_fn probe, img_image_fn read_header,
                                img_image_fn write_header, img_image_fn padded_nlines_fn,
-                               img_image_fn padded_nsamps_fn, std::int32_t (*type_op)(),
+                               img_image_fn padded_nsamps_fn, img_type_op_fn type_op,
                                img_type_desc *slot_record);
 
 // Fills the tables and makes the handle pool, once per process. Does nothing afterwards.

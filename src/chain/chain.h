@@ -111,9 +111,11 @@ struct img_chain {
 // Returns the chain of a handle within 0..59.
 img_chain &img_chain_of(img_handle handle);
 
-// --- Structure. 0 on success; -1 for a handle that names no image, after its message, and
-// quietly for a slot outside 0..9 or a missing function; then nothing is changed. A change ends
-// a preparation. Adding into a slot overwrites it and frees nothing: remove its link first. -------
+// --- Structure ---
+//
+// 0 on success; -1 for a handle that names no image, after its message, and quietly for a slot
+// outside 0..9 or a missing function; then nothing is changed. A change ends a preparation.
+// Adding into a slot overwrites it and frees nothing: remove its link first.
 
 // Frees what the links own and empties all slots.
 void img_chain_init(img_handle handle);
@@ -122,7 +124,7 @@ std::int32_t img_chain_add_remap_link(img_handle handle, std::int32_t link, std:
                                       img_chain_input_def_fn input_def_fn);
 // Adds a LUT of 1 << `bits_in` entries: as a link of its own (`remap` 0) or as a remap link that
 // applies it. `owned` 1: the link frees `lut`, which is from new[]. Also -1, quietly, for a width
-// outside 0..30, a null `lut`, and when memory is short.
+// outside 1..30, a null `lut`, and when memory is short.
 std::int32_t img_chain_add_lut_link(img_handle handle, std::int32_t link, std::int32_t bits_in,
                                     std::int32_t bits_out, std::int32_t remap, std::uint16_t *lut,
                                     std::int32_t owned);
@@ -144,8 +146,7 @@ std::int32_t img_chain_out_nbytes(img_handle handle);
 // Bytes that a sample of `nbits` takes.
 std::int32_t img_chain_nbytes(std::int32_t nbits);
 
-// --- One load
-// -------------------------------------------------------------------------------------
+// --- One load ---
 
 // Returns the buffer into which the image type must read the window that `work_def` then
 // describes: `buffer` itself or the chain's own. Null on failure, after a message unless memory
@@ -181,8 +182,7 @@ std::int32_t img_chain_lut_remap(void *record, const std::uint8_t *in_buffer,
                                  const img_buffer_def *out_def, std::int32_t pending,
                                  const std::uint16_t *lut);
 
-// --- Stretch
-// --------------------------------------------------------------------------------------
+// --- Stretch ---
 
 // The callback of the mapdown: a stretch to 8 bits; ignores `arg`.
 std::int32_t img_chain_create_16to8_lut(void *arg, const std::uint8_t *buffer,

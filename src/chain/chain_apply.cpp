@@ -119,9 +119,7 @@ public:
             output = fresh.get();
         }
         if (run(link, output) == -1) return -1;
-        // Only a remap carries the data to its output. Another link leaves it where it is, which
-        // is its output, unless no link of the chain says that it needs other input.
-        if (link.kind != IMG_CHAIN_REMAP_FCN && output != m_current) return 0;
+        if (link.kind != IMG_CHAIN_REMAP_FCN) return 0;  // the data stays where it is
         if (link.release_input == IMG_CHAIN_FREE_INPUT) {
             if (m_current == m_chain.work_buffer) img_chain_release(m_handle);
             m_temporary.reset();
@@ -202,7 +200,7 @@ std::int32_t img_apply_img_chain(img_handle handle)
 {
     img_chain &chain = img_chain_of(handle);
     if (chain.identity != 0) return 0;
-    if (chain.prepared == 0) return -1;
+    if (chain.prepared == 0 || chain.work_buffer == nullptr) return -1;
     application passage(handle);
     if (!passage.allocate()) {
         img_fail_errno("img_apply_img_chain:malloc LUT");
@@ -210,8 +208,10 @@ std::int32_t img_apply_img_chain(img_handle handle)
     }
     for (const img_chain_link &link : chain.links) {
         if (link.kind == IMG_CHAIN_EMPTY) continue;
-        if (!is_known(link.kind))
-            return img_fail("img_apply_img_chain: Invalid Image Chain Process type\n");
+        if (!is_known(link.kind)) {
+            img_fail("img_apply_img_chain: Invalid Image Chain Process type\n");
+            return fail_application(handle);
+        }
         if (passage.pass(link) == -1) return fail_application(handle);
     }
     if (passage.finish() == -1) return fail_application(handle);

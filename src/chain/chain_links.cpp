@@ -17,7 +17,7 @@ bool is_slot(std::int32_t link)
 
 bool is_width(std::int32_t bits)
 {
-    return bits >= 0 && bits <= IMG_CHAIN_MAX_BITS;
+    return bits >= 1 && bits <= IMG_CHAIN_MAX_BITS;
 }
 
 img_chain_link &link_of(img_handle handle, std::int32_t link)
@@ -56,15 +56,11 @@ void free_what_is_owned(img_chain &chain, img_chain_link &link)
     link.kind = IMG_CHAIN_EMPTY;
 }
 
-// Settles a chain whose links have changed: a preparation for the old ones does not fit them.
-void links_changed(img_handle handle)
+// A preparation for the links of before does not fit those of now.
+void link_added(img_handle handle)
 {
-    img_chain &chain = img_chain_of(handle);
-    img_chain_update_out_bits(handle);
-    const bool empty = std::ranges::all_of(
-        chain.links, [](const img_chain_link &link) { return link.kind == IMG_CHAIN_EMPTY; });
-    chain.identity = empty ? 1 : 0;
-    chain.prepared = 0;
+    img_chain_of(handle).identity = 0;
+    img_chain_of(handle).prepared = 0;
 }
 
 }  // namespace
@@ -100,7 +96,8 @@ std::int32_t img_chain_add_remap_link(img_handle handle, std::int32_t link, std:
     slot.arg = arg;
     slot.owns_arg = 0;
     slot.remap = {.out_bits = out_bits, .process_fn = process_fn, .input_def_fn = input_def_fn};
-    links_changed(handle);
+    img_chain_update_out_bits(handle);
+    link_added(handle);
     return 0;
 }
 
@@ -117,7 +114,7 @@ std::int32_t img_chain_add_lut_link(img_handle handle, std::int32_t link, std::i
         slot.arg = nullptr;
         slot.owns_arg = 0;
         slot.lut_def = lut_record(bits_in, bits_out, lut, owned);
-        links_changed(handle);
+        link_added(handle);
         return 0;
     }
     std::unique_ptr<img_chain_lut> record(
@@ -155,7 +152,8 @@ std::int32_t img_chain_add_lut_create_link(img_handle handle, std::int32_t link,
     slot.arg = arg;
     slot.owns_arg = 0;
     slot.lut_fcn = {.create_fn = create_fn, .lut = lut, .target = target, .bits_in = bits_in};
-    links_changed(handle);
+    if (remap != 0) img_chain_update_out_bits(handle);
+    link_added(handle);
     return 0;
 }
 
@@ -168,7 +166,11 @@ std::int32_t img_chain_remove_link(img_handle handle, std::int32_t link)
         link = slot.kind == IMG_CHAIN_LUT_FCN ? slot.lut_fcn.target : -1;
         free_what_is_owned(chain, slot);
     }
-    links_changed(handle);
+    img_chain_update_out_bits(handle);
+    const bool empty = std::ranges::all_of(
+        chain.links, [](const img_chain_link &each) { return each.kind == IMG_CHAIN_EMPTY; });
+    chain.identity = empty ? 1 : 0;
+    chain.prepared = 0;
     return 0;
 }
 

@@ -49,17 +49,22 @@ std::int32_t prepare_link(img_chain &chain, img_chain_link &link, img_buffer_def
 bool take_work_buffer(img_chain &chain, img_buffer_def *def)
 {
     def->stride = def->nsamps;
+    if (def->nbytes > chain.final_def->nbytes) def->fill = chain.final_def->fill;
     chain.work_buffer = img_chain_new_buffer(def->nlines, def->nsamps, def->nbytes).release();
-    if (chain.work_buffer == nullptr) return false;
+    return chain.work_buffer != nullptr;
+}
 
-    // The links before the first that changes the definition work in place on this buffer.
+// Links before the first that changes the definition work in place on what the image type reads.
+void describe_links_in_place(img_chain &chain, const img_buffer_def &def)
+{
     const auto first_change =
         std::ranges::find_if(chain.links, [](const auto &link) { return link.changes_def != 0; });
-    if (first_change != chain.links.end())
-        std::for_each(chain.links.begin(), first_change,
-                      [def](img_chain_link &link) { link.out_def.stride = def->stride; });
-    if (def->nbytes > chain.final_def->nbytes) def->fill = chain.final_def->fill;
-    return true;
+    if (first_change == chain.links.end()) return;
+    std::for_each(chain.links.begin(), first_change, [&def](img_chain_link &link) {
+        link.out_def.stride = def.stride;
+        link.out_def.nbytes = def.nbytes;
+        link.out_def.nbits = def.nbits;
+    });
 }
 
 // Settles who frees what, now that it is known whether the first buffer is a temporary one.
@@ -87,6 +92,8 @@ std::uint8_t *img_chain_prepare_operations(img_handle handle, std::uint8_t *buff
                                            const img_buffer_def *def, img_buffer_def *work_def)
 {
     img_chain &chain = img_chain_of(handle);
+    const img_desc *const desc = img_find_image(handle);
+    if (desc == nullptr) return nullptr;
     if (chain.identity != 0) {
         *work_def = *def;
         return buffer;
@@ -107,8 +114,8 @@ std::uint8_t *img_chain_prepare_operations(img_handle handle, std::uint8_t *buff
     std::int32_t placement = IMG_CHAIN_OUT_FINAL;
     for (auto link = chain.links.rbegin(); link != chain.links.rend(); ++link)
         if (prepare_link(chain, *link, &needed, &placement) == -1) return not_prepared(chain);
-    needed.nbits = img_query_nbits(handle);
-    needed.nbytes = img_find_image(handle)->nbytes;
+    needed.nbits = desc->nbits;
+    needed.nbytes = desc->nbytes;
     chain.lut_bits = std::max(chain.lut_bits, needed.nbits);
 
     const bool direct = agree(needed, *def);
@@ -116,6 +123,7 @@ std::uint8_t *img_chain_prepare_operations(img_handle handle, std::uint8_t *buff
         chain.work_buffer = buffer;
     else if (!take_work_buffer(chain, &needed))
         return not_prepared(chain);
+    describe_links_in_place(chain, needed);
     *work_def = needed;
     chain.work_def = work_def;
     settle_buffers(chain, !direct);

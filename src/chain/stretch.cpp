@@ -18,9 +18,9 @@ bool is_stretch_width(std::int32_t bits)
 
 // Counts every fourth sample of each line; one that has no counter is left out.
 template <typename Sample>
-void count_samples(const std::uint8_t *buffer, const img_buffer_def &def, std::uint32_t *histogram)
+void count_samples(const std::uint8_t *buffer, const img_buffer_def &def, std::uint32_t *histogram,
+                   std::size_t size)
 {
-    const std::uint32_t size = 1U << def.nbits;
     const auto line_length = static_cast<std::size_t>(def.stride) * sizeof(Sample);
     for (std::int32_t line = 0; line < def.nlines; ++line) {
         const std::uint8_t *const row = buffer + static_cast<std::size_t>(line) * line_length;
@@ -74,8 +74,7 @@ std::int32_t img_chain_create_stretch_lut_from_buffer(const std::uint8_t *buffer
     const std::int32_t bits_in = def->nbits;
     if (bits_in > MAX_BITS)
         return img_fail("img_chain_create_16to8_lut:image resolution overflow\n");
-    const bool countable = is_stretch_width(bits_in);
-    const std::size_t size = countable ? std::size_t{1} << bits_in : 0;
+    const std::size_t size = is_stretch_width(bits_in) ? std::size_t{1} << bits_in : 1;
     const img_chain_lut descriptor{.bits_in = static_cast<std::uint8_t>(bits_in),
                                    .bits_out = static_cast<std::uint8_t>(bits_out),
                                    .size = static_cast<std::int32_t>(size),
@@ -83,10 +82,10 @@ std::int32_t img_chain_create_stretch_lut_from_buffer(const std::uint8_t *buffer
                                    .owned = 0};
     const std::unique_ptr<std::uint32_t[]> histogram(new (std::nothrow) std::uint32_t[size]{});
     if (!histogram) return img_fail_errno("img_chain_create_stretch_lut_from_buffer:calloc");
-    if (countable && def->nbytes == 2)
-        count_samples<std::uint16_t>(buffer, *def, histogram.get());
-    else if (countable)
-        count_samples<std::uint8_t>(buffer, *def, histogram.get());
+    if (def->nbytes == 2)
+        count_samples<std::uint16_t>(buffer, *def, histogram.get(), size);
+    else
+        count_samples<std::uint8_t>(buffer, *def, histogram.get(), size);
     if (def->fill < size) histogram[def->fill] = 0;
     img_chain_compute_stretch_lut(histogram.get(), bits_in, &descriptor, lut);
     return 0;
@@ -95,11 +94,12 @@ std::int32_t img_chain_create_stretch_lut_from_buffer(const std::uint8_t *buffer
 std::int32_t img_chain_compute_stretch_lut(const std::uint32_t *histogram, std::int32_t bits_in,
                                            const img_chain_lut *descriptor, std::uint16_t *lut)
 {
-    const std::int32_t bits_out = descriptor != nullptr ? descriptor->bits_out : bits_in;
-    if (!is_stretch_width(bits_in) || !is_stretch_width(bits_out) || histogram == nullptr)
+    if (!is_stretch_width(bits_in) || histogram == nullptr)
         return img_fail("img_chain_compute_stretch_lut: Invalid arguments\n");
     if (descriptor != nullptr && descriptor->bits_in != bits_in)
         return img_fail("img_chain_compute_stretch_lut: histogram doesnt match lut bits_in\n");
+    const std::int32_t bits_out = descriptor != nullptr ? descriptor->bits_out : bits_in;
+    if (bits_out > MAX_BITS) return img_fail("img_chain_compute_stretch_lut: Invalid arguments\n");
 
     const std::size_t size = std::size_t{1} << bits_in;
     const auto [low, high] = find_cut(histogram, size);

@@ -88,16 +88,17 @@ std::int32_t img_vitec_read_header(img_desc *desc)
     if (desc->swap != 0) img_swap_words(file_block.bytes, 0, IMG_VITEC_FILE_WORDS_END);
 
     const std::int64_t link = img_get_int(file_block.bytes, IMG_VITEC_AT_IMAGE_BLOCK_LINK);
-    const std::int32_t start = img_header_seek(desc, link + 4, 0);
     img_vitec_image_block block;
-    if (start == -1 || img_header_read(desc, block.bytes) == -1) return -1;
+    if (img_header_seek(desc, link + 4, IMG_SEEK_START) == -1 ||
+        img_header_read(desc, block.bytes) == -1)
+        return -1;
     if (desc->swap != 0) img_vitec_swap_image_block(&block);
     if (img_get_word(block.bytes, IMG_VITEC_AT_VERSION) != IMG_VITEC_VERSION) return -1;
     take_geometry(desc, block);
 
     const std::int64_t header_length = img_get_int(block.bytes, IMG_VITEC_AT_HEADER_LENGTH);
     desc->std_file->data_offset =
-        img_header_seek(desc, header_length - std::int64_t{sizeof block.bytes}, 1);
+        img_header_seek(desc, header_length - std::int64_t{sizeof block.bytes}, IMG_SEEK_CURRENT);
     return desc->std_file->data_offset != -1 ? 0 : -1;
 }
 
@@ -116,7 +117,7 @@ std::int32_t img_vitec_write_header(img_desc *desc)
     if (img_header_write(desc, block.bytes) == -1 || img_header_write(desc, reserved) == -1)
         return -1;
     desc->swap = IMG_WRITES_SWAPPED ? 1 : 0;
-    desc->std_file->data_offset = img_header_seek(desc, 0, 1);
+    desc->std_file->data_offset = img_header_seek(desc, 0, IMG_SEEK_CURRENT);
     return desc->std_file->data_offset != -1 ? 0 : -1;
 }
 

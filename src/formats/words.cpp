@@ -34,8 +34,9 @@ std::int32_t img_probe_magic(img_desc *desc, std::uint32_t magic, std::uint32_t 
                              std::int32_t offset)
 {
     std::array<std::uint8_t, 4> block;
-    if (img_header_seek(desc, offset, 0) != offset || img_header_read(desc, block) == -1 ||
-        img_header_seek(desc, offset, 0) != offset)
+    if (img_header_seek(desc, offset, IMG_SEEK_START) != offset ||
+        img_header_read(desc, block) == -1 ||
+        img_header_seek(desc, offset, IMG_SEEK_START) != offset)
         return 0;
     const std::uint32_t word = img_get_word(block, 0);
     if (word != magic && word != swapped_magic) return 0;

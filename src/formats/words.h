@@ -3,6 +3,7 @@
 #define IMG_WORDS_H
 
 #include "api/img_desc.h"
+#include "io/io_method.h"
 
 #include <bit>
 #include <cstdint>
@@ -42,7 +43,7 @@ inline void img_swap_words(std::span<std::uint8_t> block, std::size_t first, std
         img_put_word(block, at, img_swap32(&block[at]));
 }
 
-// Moves the header descriptor; whence 0 start, 1 current, 2 end. Returns the new position, or -1
+// Moves the header descriptor; `whence` is an IMG_SEEK_ code. Returns the new position, or -1
 // also for an offset that does not fit 31 bits and its sign.
 std::int32_t img_header_seek(const img_desc *desc, std::int64_t offset, std::int32_t whence);
 // Move the whole block at the header descriptor's position. Return 0, or -1 when less was moved.
@@ -50,8 +51,8 @@ std::int32_t img_header_read(const img_desc *desc, std::span<std::uint8_t> block
 std::int32_t img_header_write(const img_desc *desc, std::span<const std::uint8_t> block);
 
 // Returns 1 and sets the image's `swap` when the word at `offset` of the file is `magic`, in the
-// host's byte order or, `swapped_magic`, in the other; else 0, also when it cannot be read. The
-// header descriptor is left at `offset`.
+// host's byte order or, `swapped_magic`, in the other; then the header descriptor stands at
+// `offset`. Else 0, also when the word cannot be read.
 std::int32_t img_probe_magic(img_desc *desc, std::uint32_t magic, std::uint32_t swapped_magic,
                              std::int32_t offset);
 

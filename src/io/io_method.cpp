@@ -4,6 +4,7 @@
 #include <cerrno>
 #include <new>
 #include <string_view>
+#include <utility>
 
 namespace {
 

@@ -8,6 +8,12 @@
 
 inline constexpr std::int32_t IMG_MAX_IO_METHODS = 100;
 
+enum : std::int32_t {  // from where a seek counts
+    IMG_SEEK_START = 0,
+    IMG_SEEK_CURRENT = 1,
+    IMG_SEEK_END = 2
+};
+
 using img_io_open_fn = std::int32_t (*)(const char *filename, std::int32_t oflags,
                                         std::int32_t mode);
 using img_io_close_fn = std::int32_t (*)(std::int32_t fd);
@@ -24,11 +30,11 @@ struct img_io_method {
     std::int32_t enabled;  // 1: it can be found; 0: its initialisation failed
     img_io_open_fn open;   // flags as for img_openfile, mode as in POSIX; a descriptor >= 0
     img_io_close_fn close;
-    img_io_read_fn read;        // bytes read; fewer than asked: the end of the file
-    img_io_write_fn write;      // bytes written; fewer than asked is a failure to the caller
-    img_io_seek_fn seek;        // whence 0 start, 1 current, 2 end; the position from the start. A
-                                // write after a seek past the end fills the gap with zero bytes
-    img_io_unlink_fn unlink;    // removes a file by name
+    img_io_read_fn read;      // bytes read; fewer than asked: the file ends, or an error stopped it
+    img_io_write_fn write;    // bytes written; fewer than asked is a failure to the caller
+    img_io_seek_fn seek;      // whence as above; the new position from the start. A
+                              // write after a seek past the end fills the gap with zero bytes
+    img_io_unlink_fn unlink;  // removes a file by name
     img_io_value_fn get_value;  // never called by the library
 };
 

@@ -25,6 +25,7 @@ struct img_std_file {
     std::int32_t tile_size;      // one tile plane, in layout 4 the whole tile; 0: untiled
     std::int32_t padded_nsamps;  // samples of a stored line
     std::int32_t padded_nlines;  // stored lines of a band plane
+    std::int32_t pre_reads;      // img_std_pre_read scopes that are open
     std::int32_t read_error;     // why a pre-read did not get bytes that are there; 0: it did
     char *companion_name;        // owned, from new[]; null: the image has no second file
 };
@@ -35,7 +36,7 @@ inline std::int32_t img_std_report_errors = 1;
 // The fill of transfers that have none of their own.
 inline constexpr std::array<std::uint8_t, 16> img_zero_sample{};
 
-// --- Opening and closing: the operations of a type slot. 0 or -1, quietly. -----------------------
+// --- Opening and closing: operations of a type slot. 0 or -1, quietly. ---
 
 // Opens the file, asks the type whether it is of its kind and reads the header. -1, with nothing
 // left open: not of this type, cut short, outside what the driver supports, or not to be opened.
@@ -48,16 +49,19 @@ std::int32_t img_std_create_mem(img_desc *desc);
 // Completes a file that is too short with zero bytes and closes it; frees the state. Returns the
 // result of closing the data descriptor, 0 when there is none.
 std::int32_t img_std_close(img_desc *desc);
-// Closes the descriptors as they are and frees the state.
-void img_std_fail_close(img_desc *desc);
 // Closes the descriptors, frees the state and removes the image's files. Returns the result of
 // removing the one that bears the image's name.
 std::int32_t img_std_delete(img_desc *desc);
+
+// --- What they are made of ---
+
 // Computes the file organisation from the geometry and the type's hooks. -1: an image outside
 // what the driver supports.
 std::int32_t img_std_setup(img_desc *desc);
+// Closes the descriptors as they are and frees the state.
+void img_std_fail_close(img_desc *desc);
 
-// --- Bytes of the data file ----------------------------------------------------------------------
+// --- Bytes of the data file ---
 
 // Appends `count` >= 1 zero bytes to the data file and leaves its descriptor at the new end; does
 // nothing for an in-memory image. Returns 0, or -1 with errno set.
@@ -73,10 +77,16 @@ std::int32_t img_std_read_at(img_desc *desc, std::int64_t offset, void *buffer, 
 std::int32_t img_std_write_at(img_desc *desc, std::int64_t offset, const void *buffer,
                               std::int32_t count);
 
-// --- Samples ------------------------------------------------------------------------------------
+// --- Samples ---
 
-// Returns the byte offset of a sample from the start of the file or of mem_image; 0 in a layout
-// that has no addressing; -1 for a negative position and for an offset beyond 31 bits.
+// Byte offsets from the start of the file or of mem_image: of a sample in a plane of lines, of a
+// pixel in lines of pixels, and of a tile of `band`, which in layout 4 is the tile of all bands.
+std::int64_t img_std_line_offset(const img_desc *desc, std::int64_t line, std::int32_t samp,
+                                 std::int32_t band);
+std::int64_t img_std_pixel_offset(const img_desc *desc, std::int64_t line, std::int32_t samp);
+std::int64_t img_std_tile_offset(const img_desc *desc, std::int64_t tile, std::int32_t band);
+// Returns the byte offset of a sample in the image's layout; 0 in a layout that has no addressing;
+// -1 for a negative position, one beyond the last tile, and an offset beyond 31 bits.
 std::int32_t img_std_sample_offset(const img_desc *desc, std::int32_t line, std::int32_t samp,
                                    std::int32_t band);
 // True when two-byte samples change their byte order between the image and a caller's buffer.
@@ -91,11 +101,11 @@ void img_std_copy_samples(const std::uint8_t *from, std::size_t from_step, std::
 void img_fill_samples(std::uint8_t *buffer, std::size_t count, std::int32_t nbytes,
                       const std::uint8_t *value);
 
-// --- Regions of one band
-// -------------------------------------------------------------------------- A region is `nlines` x
-// `nsamps` samples from (`line`, `samp`) on, inside the image; row i of `buffer` starts at sample i
-// * `stride`, and its samples are in host order. All return 0, or -1 after a message; what was
-// moved before a failure stays. Writes leave `buffer` as it is.
+// --- Regions of one band ---
+//
+// A region is `nlines` x `nsamps` samples from (`line`, `samp`) on, inside the image; row i of
+// `buffer` starts at sample i * `stride`, and its samples are in host order. All return 0, or -1
+// after a message; what was moved before a failure stays. Writes leave `buffer` as it is.
 
 // The `read` and `write` operations: hand the region to the transfer of the image's layout. An
 // empty region moves nothing; one that is not inside the image is refused quietly.
@@ -143,11 +153,11 @@ std::int32_t img_std_write_tiled(img_desc *desc, std::int32_t line, std::int32_t
                                  const std::uint8_t *buffer, std::int32_t stride,
                                  const std::uint8_t *fill);
 
-// --- Whole tiles
-// ---------------------------------------------------------------------------------- A run is the
-// tile planes of `band` of tiles `first_tile` to `first_tile` + `ntiles` - 1, inside the image, one
-// after the other in `buffer` and in the file's byte order. All return 0, or -1 after a message. A
-// run of no tiles, or of an untiled image, moves nothing.
+// --- Whole tiles ---
+//
+// A run is the tile planes of `band` of tiles `first_tile` to `first_tile` + `ntiles` - 1, inside
+// the image, one after the other in `buffer` and in the file's byte order. All return 0, or -1
+// after a message. A run of no tiles, or of an untiled image, moves nothing.
 
 // The `read_tiles` and `write_tiles` operations. What a failed read did get is in `buffer`.
 std::int32_t img_std_read_tiles(img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,
@@ -184,8 +194,7 @@ void img_std_merge_tile(std::int32_t nbands, const std::array<std::int32_t, 3> &
                         const std::array<const std::uint8_t *, 3> &planes, std::int32_t tile_nsamps,
                         std::int32_t tile_nlines, std::int32_t nbytes, std::uint8_t *tile);
 
-// --- Pre-reads
-// ------------------------------------------------------------------------------------
+// --- Pre-reads ---
 
 // The scope of reads of tiles that are to be overlaid and stored again. While it lasts,
 // img_std_read_tiles prints nothing, and a read that does not get bytes that the file holds is
@@ -206,12 +215,12 @@ private:
     std::int32_t m_outer_read_error;
 };
 
-// --- Images in memory
-// -----------------------------------------------------------------------------
+// --- Images in memory ---
 
 // Copies the whole in-memory image `mem_desc` into the file image `desc`, or fills it from there
 // (`writing` 0); its first sample lies at (`line0`, `samp0`) of the file image. Both must agree
-// in width, bands, sample size and, if tiled, in tile sizes and tile corners. No byte exchange.
+// in width and bands and, if tiled, in tile sizes; tiled images meet at tile corners. No byte
+// exchange.
 // Returns 0, or -1 after a message; quietly for an image that has no such storage.
 std::int32_t img_std_io_virtual(std::int32_t writing, img_desc *desc, img_desc *mem_desc,
                                 std::int32_t line0, std::int32_t samp0);

@@ -1,6 +1,5 @@
 // The driver's state of one image: making it, the file organisation, and the bytes of the file.
 #include "api/img_desc.h"
-#include "api/report.h"
 #include "io/io_method.h"
 #include "std/std.h"
 
@@ -11,10 +10,9 @@
 namespace {
 
 constexpr std::int32_t FILE_MODE = 0666;
-enum : std::int32_t { FROM_START = 0, FROM_CURRENT = 1, FROM_END = 2 };
 constexpr std::int64_t MAX_OFFSET = std::numeric_limits<std::int32_t>::max();
 
-// --- Sizes: every one is either within 0..MAX_OFFSET or -1, which means that it does not fit ---
+// Every size below is either within 0..MAX_OFFSET or -1, which means that it does not fit.
 
 std::int64_t fitting(std::int64_t size)
 {
@@ -44,13 +42,10 @@ const img_type_hooks &hooks_of(const img_desc *desc)
 
 bool within_the_drivers_limits(const img_desc *desc)
 {
+    const bool one_byte = desc->nbytes == 1 && desc->nbits >= 1 && desc->nbits <= 8;
+    const bool two_bytes = desc->nbytes == 2 && desc->nbits >= 9 && desc->nbits <= 16;
     return desc->nlines >= 0 && desc->nsamps >= 0 && desc->tile_nlines >= 0 &&
-           desc->tile_nsamps >= 0 && desc->nbands >= 0 && (desc->nbytes == 1 || desc->nbytes == 2);
-}
-
-bool is_tiled(const img_desc *desc)
-{
-    return desc->tile_nsamps != 0 && desc->tile_nlines != 0;
+           desc->tile_nsamps >= 0 && desc->nbands >= 0 && (one_byte || two_bytes);
 }
 
 bool gets_virtual_tiles(const img_desc *desc)
@@ -109,7 +104,7 @@ bool set_up_planes(img_desc *desc, img_std_file *file)
 // Chooses the layout, where that is left to the type, and sets up stored or virtual tiles.
 bool set_up_layout(img_desc *desc, img_std_file *file)
 {
-    const bool tiled = is_tiled(desc);
+    const bool tiled = img_is_tiled(desc);
     if (desc->layout == IMG_LAYOUT_DEFAULT)
         desc->layout = tiled ? hooks_of(desc).tiled_layout : hooks_of(desc).untiled_layout;
     desc->virtual_tiled = !tiled && gets_virtual_tiles(desc) ? 1 : 0;
@@ -121,10 +116,10 @@ bool set_up_layout(img_desc *desc, img_std_file *file)
     const bool interleaved = desc->layout == IMG_LAYOUT_TILED_BIP;
     const bool in_tiles =
         interleaved || desc->layout == IMG_LAYOUT_TILED || desc->layout == IMG_LAYOUT_BAND_TILED;
-    if (in_tiles && !is_tiled(desc)) return false;
+    if (in_tiles && !img_is_tiled(desc)) return false;
     if (interleaved && desc->nbands > static_cast<std::int32_t>(desc->band_map.size()))
         return false;
-    return !is_tiled(desc) || set_up_tiles(desc, file);
+    return !img_is_tiled(desc) || set_up_tiles(desc, file);
 }
 
 std::int32_t seek(const img_desc *desc, std::int64_t offset, std::int32_t whence)
@@ -139,10 +134,25 @@ std::int32_t seek(const img_desc *desc, std::int64_t offset, std::int32_t whence
 
 std::int32_t seek_to(const img_desc *desc, std::int64_t offset)
 {
-    const std::int32_t at = seek(desc, offset, FROM_START);
+    const std::int32_t at = seek(desc, offset, IMG_SEEK_START);
     if (at == offset) return 0;
     if (at != -1) errno = EIO;  // the method stands elsewhere than it was told to
     return -1;
+}
+
+// Appends zero bytes to a file whose descriptor stands at its end, by writing the last of them.
+std::int32_t append_zeros(const img_desc *desc, std::int32_t end, std::int64_t count)
+{
+    const std::int32_t at = seek(desc, count - 1, IMG_SEEK_CURRENT);
+    if (at == -1) return -1;
+    if (at != end + count - 1) {
+        errno = EIO;
+        return -1;
+    }
+    const std::int32_t written =
+        desc->io_method->write(desc->std_file->data_fd, img_zero_sample.data(), 1);
+    if (written == 0) errno = ENOSPC;
+    return written == 1 ? 0 : -1;
 }
 
 // Makes the state of an image whose files are open on `fd`, or in memory for -1.
@@ -160,6 +170,7 @@ std::int32_t make_state(img_desc *desc, std::int32_t fd)
         .tile_size = 0,
         .padded_nsamps = 0,
         .padded_nlines = 0,
+        .pre_reads = 0,
         .read_error = 0,
         .companion_name = nullptr,
     };
@@ -197,7 +208,7 @@ void complete(img_desc *desc)
 {
     const img_std_file *const file = desc->std_file;
     const std::int32_t expected = desc->nbands * file->band_size + file->data_offset;
-    const std::int32_t length = seek(desc, 0, FROM_END);
+    const std::int32_t length = seek(desc, 0, IMG_SEEK_END);
     if (length != -1 && length < expected) img_std_extend(desc, expected - length);
 }
 
@@ -207,7 +218,8 @@ void note_bytes_not_read(img_desc *desc, std::int64_t offset, std::int32_t got)
     img_std_file *const file = desc->std_file;
     if (got == -1) {
         file->read_error = errno != 0 ? errno : EIO;
-    } else if (const std::int32_t end = seek(desc, 0, FROM_END); end == -1 || end > offset + got) {
+    } else if (const std::int32_t end = seek(desc, 0, IMG_SEEK_END);
+               end == -1 || end > offset + got) {
         file->read_error = EIO;
     }
 }
@@ -296,28 +308,25 @@ std::int32_t img_std_setup(img_desc *desc)
 std::int32_t img_std_extend(img_desc *desc, std::int32_t count)
 {
     if (desc->mem_image) return 0;
-    if (seek(desc, 0, FROM_END) == -1 || seek(desc, count - 1, FROM_CURRENT) == -1) return -1;
-    const std::int32_t written =
-        desc->io_method->write(desc->std_file->data_fd, img_zero_sample.data(), 1);
-    if (written == 0) errno = ENOSPC;
-    return written == 1 ? 0 : -1;
+    const std::int32_t end = seek(desc, 0, IMG_SEEK_END);
+    return end != -1 ? append_zeros(desc, end, count) : -1;
 }
 
 std::int32_t img_std_seek_to_write(img_desc *desc, std::int64_t offset)
 {
     if (offset <= desc->std_file->veof) return seek_to(desc, offset);
     // The file may have grown since it was last looked at: what is missing counts from its end.
-    const std::int32_t end = seek(desc, 0, FROM_END);
+    const std::int32_t end = seek(desc, 0, IMG_SEEK_END);
     if (end == -1) return -1;
     if (offset <= end) return seek_to(desc, offset);
-    if (img_std_extend(desc, static_cast<std::int32_t>(offset - end)) == -1) return -1;
+    if (append_zeros(desc, end, offset - end) == -1) return -1;
     desc->std_file->veof = static_cast<std::int32_t>(offset);
     return 0;
 }
 
 std::int32_t img_std_update_veof(img_desc *desc)
 {
-    const std::int32_t end = seek(desc, 0, FROM_END);
+    const std::int32_t end = seek(desc, 0, IMG_SEEK_END);
     if (end == -1) return -1;
     desc->std_file->veof = end;
     return 0;
@@ -329,7 +338,7 @@ std::int32_t img_std_read_at(img_desc *desc, std::int64_t offset, void *buffer, 
     if (got == 0)
         got = desc->io_method->read(desc->std_file->data_fd, buffer,
                                     static_cast<std::uint32_t>(count));
-    if (got != count && img_std_report_errors == 0) note_bytes_not_read(desc, offset, got);
+    if (got != count && desc->std_file->pre_reads > 0) note_bytes_not_read(desc, offset, got);
     return got;
 }
 

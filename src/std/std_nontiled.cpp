@@ -5,7 +5,6 @@
 #include "std/std.h"
 
 #include <algorithm>
-#include <cerrno>
 #include <new>
 
 namespace {
@@ -19,22 +18,6 @@ std::size_t bytes_of(const img_desc *desc, std::int32_t nsamps)
 std::size_t row_start(const img_desc *desc, std::int32_t row, std::int32_t stride)
 {
     return static_cast<std::size_t>(row) * bytes_of(desc, stride);
-}
-
-// Offset of the region's line `line` in the band-sequential and in the interleaved layout. Any
-// layout that has no transfer of its own is taken for band sequential.
-std::int64_t line_offset(const img_desc *desc, std::int64_t line, std::int32_t samp,
-                         std::int32_t band)
-{
-    const img_std_file *const file = desc->std_file;
-    return file->data_offset + std::int64_t{band} * file->band_size +
-           (line * file->padded_nsamps + samp) * desc->nbytes;
-}
-
-std::int64_t pixel_line_offset(const img_desc *desc, std::int64_t line, std::int32_t samp)
-{
-    const img_std_file *const file = desc->std_file;
-    return file->data_offset + (line * file->padded_nsamps + samp) * desc->nbands * desc->nbytes;
 }
 
 void copy_row(const img_desc *desc, const std::uint8_t *from, std::uint8_t *to, std::int32_t nsamps,
@@ -61,19 +44,21 @@ std::int32_t write_interleaved_line(img_desc *desc, std::int64_t at, std::int32_
         return img_fail_errno("img_std_write_nontiled_interleaved:write");
     const img_io_method *const method = desc->io_method;
     const std::int32_t fd = desc->std_file->data_fd;
-    const std::int32_t other_bands = (desc->nbands - 1) * desc->nbytes;
+    const std::int32_t pixel_length = desc->nbands * desc->nbytes;
     for (std::int32_t i = 0; i < nsamps; ++i) {
-        if (i > 0 && method->seek(fd, other_bands, 1) == -1)
-            return img_fail_errno("img_std_write_nontiled_interleaved:write");
         std::array<std::uint8_t, 2> sample;
-        copy_row(desc, from + row_start(desc, i, 1), sample.data(), 1,
-                 img_std_exchanges_bytes(desc));
+        copy_row(desc, from + bytes_of(desc, i), sample.data(), 1, img_std_exchanges_bytes(desc));
         const std::int32_t written =
             method->write(fd, sample.data(), static_cast<std::uint32_t>(desc->nbytes));
         if (written == -1) return img_fail_errno("img_std_write_nontiled_interleaved:write");
         if (written != desc->nbytes)
             return img_fail("img_std_write_nontiled_inter: %d of %d bytes written!!\n", written,
                             desc->nbytes);
+        at += pixel_length;
+        const bool moved = method->seek(fd, pixel_length - desc->nbytes, IMG_SEEK_CURRENT) == at;
+        // Behind the last sample may be the end of all that can be addressed.
+        if (!moved && i + 1 < nsamps)
+            return img_fail_errno("img_std_write_nontiled_interleaved:write");
     }
     if (img_std_update_veof(desc) == -1)
         return img_fail_errno("img_std_write_nontiled_interleaved:write");
@@ -93,7 +78,7 @@ std::int32_t img_std_read_lines(img_desc *desc, std::int32_t line, std::int32_t 
 {
     const std::int32_t row_length = desc->nbytes * nsamps;
     for (std::int32_t i = 0; i < nlines; ++i) {
-        const std::int64_t offset = line_offset(desc, std::int64_t{line} + i, samp, band);
+        const std::int64_t offset = img_std_line_offset(desc, std::int64_t{line} + i, samp, band);
         std::uint8_t *const row = buffer + row_start(desc, i, stride);
         if (desc->mem_image) {
             if (offset + row_length - 1 > desc->std_file->veof)
@@ -102,6 +87,7 @@ std::int32_t img_std_read_lines(img_desc *desc, std::int32_t line, std::int32_t 
             continue;
         }
         const std::int32_t got = img_std_read_at(desc, offset, row, row_length);
+        if (got != row_length && img_std_report_errors == 0) return -1;  // virtual tiles
         if (got == -1) return img_fail_errno("img_read_nontiled:read");
         if (got != row_length)
             return img_fail("img_read_nontiled: %d of %d bytes read!!\n", got, row_length);
@@ -130,7 +116,7 @@ std::int32_t img_std_read_nontiled_interleaved(img_desc *desc, std::int32_t line
         return img_fail_errno("img_std_read_nontiled_interleaved:malloc");
 
     for (std::int32_t i = 0; i < nlines; ++i) {
-        const std::int64_t offset = pixel_line_offset(desc, std::int64_t{line} + i, samp);
+        const std::int64_t offset = img_std_pixel_offset(desc, std::int64_t{line} + i, samp);
         const std::uint8_t *pixels = row.get();
         if (desc->mem_image) {
             if (offset + row_length - 1 > desc->std_file->veof_max)
@@ -162,7 +148,7 @@ std::int32_t img_std_write_lines(img_desc *desc, std::int32_t line, std::int32_t
 
     img_std_file *const file = desc->std_file;
     for (std::int32_t i = 0; i < nlines; ++i) {
-        const std::int64_t offset = line_offset(desc, std::int64_t{line} + i, samp, band);
+        const std::int64_t offset = img_std_line_offset(desc, std::int64_t{line} + i, samp, band);
         const std::uint8_t *row = buffer + row_start(desc, i, stride);
         if (desc->mem_image) {
             const std::int64_t last = offset + row_length - 1;
@@ -204,7 +190,7 @@ std::int32_t img_std_write_nontiled_interleaved(img_desc *desc, std::int32_t lin
     const std::size_t pixel_length = bytes_of(desc, desc->nbands);
     const std::int32_t row_length = desc->nbands * desc->nbytes * nsamps;
     for (std::int32_t i = 0; i < nlines; ++i) {
-        const std::int64_t offset = pixel_line_offset(desc, std::int64_t{line} + i, samp);
+        const std::int64_t offset = img_std_pixel_offset(desc, std::int64_t{line} + i, samp);
         const std::int64_t at = offset + std::int64_t{band} * desc->nbytes;
         const std::uint8_t *const row = buffer + row_start(desc, i, stride);
         if (desc->mem_image) {

@@ -1,4 +1,4 @@
-// Where a sample lies, in each of the five layouts.
+// Where lines, tiles and samples lie, in each of the five layouts.
 #include "api/img_desc.h"
 #include "std/std.h"
 
@@ -6,53 +6,79 @@
 
 namespace {
 
-std::int64_t untiled_offset(const img_desc *desc, std::int64_t line, std::int64_t samp,
-                            std::int64_t band)
+constexpr std::int64_t MAX_OFFSET = std::numeric_limits<std::int32_t>::max();
+
+std::int32_t fitting(std::int64_t offset)
 {
-    const img_std_file *const file = desc->std_file;
-    const std::int64_t pixel = line * file->padded_nsamps + samp;
-    if (desc->layout == IMG_LAYOUT_BSQ) return band * file->band_size + pixel * desc->nbytes;
-    return (pixel * desc->nbands + band) * desc->nbytes;
+    return offset <= MAX_OFFSET ? static_cast<std::int32_t>(offset) : -1;
 }
 
-std::int64_t tiled_offset(const img_desc *desc, std::int64_t line, std::int64_t samp,
-                          std::int64_t band)
+std::int32_t untiled_sample_offset(const img_desc *desc, std::int32_t line, std::int32_t samp,
+                                   std::int32_t band)
+{
+    // Beyond that many pixels the offset does not fit, and its products need not either.
+    if (std::int64_t{line} * desc->std_file->padded_nsamps + samp > MAX_OFFSET) return -1;
+    if (desc->layout == IMG_LAYOUT_BSQ) return fitting(img_std_line_offset(desc, line, samp, band));
+    return fitting(img_std_pixel_offset(desc, line, samp) + std::int64_t{band} * desc->nbytes);
+}
+
+std::int32_t tiled_sample_offset(const img_desc *desc, std::int32_t line, std::int32_t samp,
+                                 std::int32_t band)
 {
     const img_std_file *const file = desc->std_file;
-    const std::int64_t tile =
-        line / desc->tile_nlines * file->tiles_across + samp / desc->tile_nsamps;
+    const std::int32_t tile_row = line / desc->tile_nlines;
+    const std::int32_t tile_col = samp / desc->tile_nsamps;
+    if (tile_row >= file->tiles_down || tile_col >= file->tiles_across) return -1;
     const std::int64_t pixel =
-        line % desc->tile_nlines * desc->tile_nsamps + samp % desc->tile_nsamps;
-    switch (desc->layout) {
-    case IMG_LAYOUT_TILED:
-        return (tile * desc->nbands + band) * file->tile_size + pixel * desc->nbytes;
-    case IMG_LAYOUT_BAND_TILED:
-        return band * file->band_size + tile * file->tile_size + pixel * desc->nbytes;
-    default:
-        return tile * file->tile_size + (pixel * desc->nbands + band) * desc->nbytes;
-    }
+        std::int64_t{line % desc->tile_nlines} * desc->tile_nsamps + samp % desc->tile_nsamps;
+    const std::int64_t tile =
+        img_std_tile_offset(desc, tile_row * file->tiles_across + tile_col, band);
+    const bool interleaved = desc->layout == IMG_LAYOUT_TILED_BIP;
+    return fitting(tile + (interleaved ? pixel * desc->nbands + band : pixel) * desc->nbytes);
 }
 
 }  // namespace
+
+std::int64_t img_std_line_offset(const img_desc *desc, std::int64_t line, std::int32_t samp,
+                                 std::int32_t band)
+{
+    const img_std_file *const file = desc->std_file;
+    return file->data_offset + std::int64_t{band} * file->band_size +
+           (line * file->padded_nsamps + samp) * desc->nbytes;
+}
+
+std::int64_t img_std_pixel_offset(const img_desc *desc, std::int64_t line, std::int32_t samp)
+{
+    const img_std_file *const file = desc->std_file;
+    return file->data_offset + (line * file->padded_nsamps + samp) * desc->nbands * desc->nbytes;
+}
+
+std::int64_t img_std_tile_offset(const img_desc *desc, std::int64_t tile, std::int32_t band)
+{
+    const img_std_file *const file = desc->std_file;
+    switch (desc->layout) {
+    case IMG_LAYOUT_TILED:
+        return file->data_offset + (tile * desc->nbands + band) * file->tile_size;
+    case IMG_LAYOUT_TILED_BIP:
+        return file->data_offset + tile * file->tile_size;
+    default:
+        return file->data_offset + std::int64_t{band} * file->band_size + tile * file->tile_size;
+    }
+}
 
 std::int32_t img_std_sample_offset(const img_desc *desc, std::int32_t line, std::int32_t samp,
                                    std::int32_t band)
 {
     if (line < 0 || samp < 0 || band < 0) return -1;
-    std::int64_t offset = desc->std_file->data_offset;
     switch (desc->layout) {
     case IMG_LAYOUT_BSQ:
     case IMG_LAYOUT_BIP:
-        offset += untiled_offset(desc, line, samp, band);
-        break;
+        return untiled_sample_offset(desc, line, samp, band);
     case IMG_LAYOUT_TILED:
     case IMG_LAYOUT_BAND_TILED:
     case IMG_LAYOUT_TILED_BIP:
-        offset += tiled_offset(desc, line, samp, band);
-        break;
+        return tiled_sample_offset(desc, line, samp, band);
     default:
         return 0;
     }
-    return offset <= std::numeric_limits<std::int32_t>::max() ? static_cast<std::int32_t>(offset)
-                                                              : -1;
 }

@@ -4,6 +4,8 @@
 #include "api/report.h"
 #include "std/std.h"
 
+#include <algorithm>
+#include <cerrno>
 #include <new>
 
 namespace {
@@ -14,6 +16,7 @@ public:
     struct part {
         std::int32_t first;  // first line or sample in the tile
         std::int32_t count;
+        std::int32_t place;  // where it lies in the stretch
     };
 
     tile_span(std::int32_t begin, std::int32_t extent, std::int32_t tile_extent)
@@ -28,7 +31,8 @@ public:
         const std::int32_t first = index == 0 ? m_begin % m_tile_extent : 0;
         const std::int32_t last =
             index == ntiles() - 1 ? m_last % m_tile_extent : m_tile_extent - 1;
-        return {first, last - first + 1};
+        const std::int32_t place = index * m_tile_extent - m_begin % m_tile_extent;
+        return {first, last - first + 1, std::max(place, 0)};
     }
 
 private:
@@ -62,18 +66,16 @@ public:
     // Calls `copy(run_byte, buffer_byte, count)` for every tile line of the region in a row of
     // tiles: `count` samples that lie at these bytes of the run and of the caller's buffer.
     template <typename Copy>
-    void for_each_tile_line(std::int32_t tile_row, Copy copy)
+    void for_each_tile_line(std::int32_t tile_row, Copy copy) const
     {
         const tile_span::part lines = m_lines.in_tile(tile_row);
-        std::int32_t samp = 0;
         for (std::int32_t tile = 0; tile < ntiles(); ++tile) {
             const tile_span::part samps = m_samps.in_tile(tile);
             for (std::int32_t i = 0; i < lines.count; ++i)
                 copy(run_byte(tile, lines.first + i, samps.first),
-                     buffer_byte(m_rows_done + i, samp), static_cast<std::size_t>(samps.count));
-            samp += samps.count;
+                     buffer_byte(lines.place + i, samps.place),
+                     static_cast<std::size_t>(samps.count));
         }
-        m_rows_done += lines.count;
     }
 
 private:
@@ -94,7 +96,6 @@ private:
     img_desc *m_desc;
     tile_span m_lines, m_samps;
     std::int32_t m_stride;
-    std::int32_t m_rows_done = 0;  // rows of the caller's buffer that are transferred
     std::unique_ptr<std::uint8_t[]> m_run;
 };
 
@@ -111,7 +112,9 @@ std::int32_t read_stored_run(img_desc *desc, std::int32_t first_tile, std::int32
                              std::int32_t band, std::uint8_t *run)
 {
     const img_std_pre_read pre_read(desc);
-    if (desc->mem_image) {
+    if (img_access_mode(desc) == IMG_OPEN_WRITE_ONLY) {
+        desc->std_file->read_error = EBADF;  // there is no way to know what it holds
+    } else if (desc->mem_image) {
         img_std_read_tiles(desc, first_tile, ntiles, band, run);
     } else if (desc->cache_mb > 0 || desc->virtual_tiled != 0) {
         // Behind a tile that cannot be read may lie one that waits in the cache, or lines that
@@ -131,7 +134,7 @@ std::int32_t img_read_tiled(img_desc *desc, std::int32_t line, std::int32_t samp
                             std::int32_t nlines, std::int32_t nsamps, std::int32_t band,
                             std::uint8_t *buffer, std::int32_t stride)
 {
-    tiled_region region(desc, line, samp, nlines, nsamps, stride);
+    const tiled_region region(desc, line, samp, nlines, nsamps, stride);
     if (region.run() == nullptr) return img_fail_errno("img_read_tiled:malloc");
     for (std::int32_t row = 0; row < region.tile_rows(); ++row) {
         if (img_load_tiles(desc->handle, region.first_tile(row), region.ntiles(), band,
@@ -150,7 +153,7 @@ std::int32_t img_std_write_tiled(img_desc *desc, std::int32_t line, std::int32_t
                                  const std::uint8_t *buffer, std::int32_t stride,
                                  const std::uint8_t *fill)
 {
-    tiled_region region(desc, line, samp, nlines, nsamps, stride);
+    const tiled_region region(desc, line, samp, nlines, nsamps, stride);
     if (region.run() == nullptr) return img_fail_errno("img_std_write_tiled:malloc");
     const std::size_t run_samples = region.run_length() / static_cast<std::size_t>(desc->nbytes);
     for (std::int32_t row = 0; row < region.tile_rows(); ++row) {

@@ -35,20 +35,10 @@ bool is_interleaved(const img_desc *desc)
     return desc->layout == IMG_LAYOUT_TILED_BIP && desc->nbands > 1;
 }
 
-// Tiles of layout 2 with several bands: a run of one band is not contiguous.
+// In layout 2 with several bands a run of one band is not contiguous.
 bool has_planes_between(const img_desc *desc)
 {
     return desc->layout == IMG_LAYOUT_TILED && desc->nbands > 1;
-}
-
-// Offset of the first byte of a tile of `band`, or of the whole tile when it is interleaved.
-std::int64_t tile_offset(const img_desc *desc, std::int64_t tile, std::int32_t band)
-{
-    const img_std_file *const file = desc->std_file;
-    const std::int64_t data = file->data_offset;
-    if (is_interleaved(desc)) return data + tile * file->tile_size;
-    if (has_planes_between(desc)) return data + (tile * desc->nbands + band) * file->tile_size;
-    return data + std::int64_t{band} * file->band_size + tile * file->tile_size;
 }
 
 std::int32_t run_bytes(const img_desc *desc, std::int32_t ntiles)
@@ -56,9 +46,23 @@ std::int32_t run_bytes(const img_desc *desc, std::int32_t ntiles)
     return ntiles * desc->std_file->tile_size;
 }
 
-tile_buffer new_tiles(std::size_t length)
+tile_buffer new_run(std::int32_t length)
 {
-    return tile_buffer(new (std::nothrow) std::uint8_t[length]{});
+    return tile_buffer(new (std::nothrow) std::uint8_t[static_cast<std::size_t>(length)]);
+}
+
+tile_buffer new_zero_plane(const img_desc *desc)
+{
+    return tile_buffer(new (std::nothrow) std::uint8_t[img_std_plane_size(desc)]{});
+}
+
+// True when `length` bytes at `offset` of an in-memory image are there; a message says that they
+// are not.
+bool is_in_memory(const img_desc *desc, std::int64_t offset, std::int32_t length)
+{
+    if (offset + length - 1 <= desc->std_file->veof) return true;
+    if (img_std_report_errors != 0) img_fail("img_std_read_tiles: read beyond virtual eof!!\n");
+    return false;
 }
 
 // Reads `length` bytes of tiles. Returns how many came; fewer than `length` is a failure that
@@ -67,11 +71,7 @@ std::int32_t read_bytes(img_desc *desc, std::int64_t offset, std::uint8_t *buffe
                         std::int32_t length)
 {
     if (desc->mem_image) {
-        if (offset + length - 1 > desc->std_file->veof) {
-            if (img_std_report_errors != 0)
-                img_fail("img_std_read_tiles: read beyond virtual eof!!\n");
-            return -1;
-        }
+        if (!is_in_memory(desc, offset, length)) return -1;
         std::memcpy(buffer, desc->mem_image.get() + offset, static_cast<std::size_t>(length));
         return length;
     }
@@ -143,7 +143,7 @@ void split_tile_into_cache(const img_desc *desc, const std::uint8_t *pixels, std
         const auto at = static_cast<std::size_t>(each);
         if (each != band && desc->tile_cache != nullptr &&
             img_tile_cache_has(desc->tile_cache, tile, each) == 0)
-            others[at] = new_tiles(img_std_plane_size(desc));  // none: it is not cached
+            others[at] = new_zero_plane(desc);  // null: it is not cached
         planes[at] = each == band ? plane : others[at].get();
     }
     img_std_split_tile(pixels, desc->tile_nsamps, desc->tile_nlines, desc->nbytes, desc->nbands,
@@ -157,14 +157,25 @@ std::int32_t read_interleaved(img_desc *desc, std::int32_t first_tile, std::int3
                               std::int32_t band, std::uint8_t *buffer)
 {
     const std::int32_t length = run_bytes(desc, ntiles);
-    const tile_buffer run = new_tiles(static_cast<std::size_t>(length));
-    if (!run) return -1;
-    const std::int32_t got =
-        read_bytes(desc, tile_offset(desc, first_tile, band), run.get(), length);
+    const std::int64_t offset = img_std_tile_offset(desc, first_tile, band);
+    tile_buffer run;  // an in-memory image is split where it lies
+    const std::uint8_t *pixels;
+    std::int32_t got = length;
+    if (desc->mem_image) {
+        if (!is_in_memory(desc, offset, length)) return -1;
+        pixels = desc->mem_image.get() + offset;
+    } else {
+        run = new_run(length);
+        if (!run) {
+            desc->std_file->read_error = ENOMEM;  // what the file holds stays unknown
+            return -1;
+        }
+        got = read_bytes(desc, offset, run.get(), length);
+        pixels = run.get();
+    }
 
     const auto tile_size = static_cast<std::size_t>(desc->std_file->tile_size);
     auto left = static_cast<std::size_t>(std::clamp(got, 0, length));
-    const std::uint8_t *pixels = run.get();
     for (std::int32_t tile = first_tile; left >= tile_size && tile < first_tile + ntiles; ++tile) {
         split_tile_into_cache(desc, pixels, tile, band, buffer);
         pixels += tile_size;
@@ -190,7 +201,7 @@ std::int32_t merge_with_other_bands(img_desc *desc, std::int32_t tile, std::int3
     for (std::int32_t each = 0; each < desc->nbands; ++each) {
         if (each == band) continue;
         auto &other = others[static_cast<std::size_t>(each)];
-        other = new_tiles(img_std_plane_size(desc));  // 0 where the file holds nothing yet
+        other = new_zero_plane(desc);  // 0 where the file holds nothing yet
         if (!other) return -1;
         img_std_read_tiles(desc, tile, 1, each, other.get());
         planes[static_cast<std::size_t>(each)] = other.get();
@@ -206,7 +217,7 @@ std::int32_t write_interleaved(img_desc *desc, std::int32_t first_tile, std::int
                                std::int32_t band, const std::uint8_t *buffer)
 {
     const std::int32_t length = run_bytes(desc, ntiles);
-    const tile_buffer run = new_tiles(static_cast<std::size_t>(length));
+    const tile_buffer run = new_run(length);
     if (!run) return -1;
     for (std::int32_t i = 0; i < ntiles; ++i) {
         const auto at = static_cast<std::size_t>(i);
@@ -216,7 +227,7 @@ std::int32_t write_interleaved(img_desc *desc, std::int32_t first_tile, std::int
                                    run.get() + at * tile_size) == -1)
             return -1;
     }
-    return write_bytes(desc, tile_offset(desc, first_tile, band), run.get(), length, false);
+    return write_bytes(desc, img_std_tile_offset(desc, first_tile, band), run.get(), length, false);
 }
 
 // The region of an untiled image that one virtual tile shows.
@@ -238,12 +249,14 @@ img_std_pre_read::img_std_pre_read(img_desc *desc)
     : m_file(desc->std_file), m_outer_report_errors(std::exchange(img_std_report_errors, 0)),
       m_outer_read_error(std::exchange(m_file->read_error, 0))
 {
+    ++m_file->pre_reads;
 }
 
 img_std_pre_read::~img_std_pre_read()
 {
     img_std_report_errors = m_outer_report_errors;
     m_file->read_error = m_outer_read_error;
+    --m_file->pre_reads;
 }
 
 std::int32_t img_std_pre_read::result() const
@@ -270,8 +283,8 @@ std::int32_t img_std_read_tiles(img_desc *desc, std::int32_t first_tile, std::in
     const std::int32_t pieces = has_planes_between(desc) ? ntiles : 1;
     const std::int32_t length = run_bytes(desc, ntiles / pieces);
     for (std::int32_t i = 0; i < pieces; ++i) {
-        if (read_bytes(desc, tile_offset(desc, std::int64_t{first_tile} + i, band), buffer,
-                       length) != length)
+        if (read_bytes(desc, img_std_tile_offset(desc, first_tile + i, band), buffer, length) !=
+            length)
             return -1;
         buffer += length;
     }
@@ -290,7 +303,7 @@ std::int32_t img_std_write_tiles(img_desc *desc, std::int32_t first_tile, std::i
     const std::int32_t pieces = tile_by_tile ? ntiles : 1;
     const std::int32_t length = run_bytes(desc, ntiles / pieces);
     for (std::int32_t i = 0; i < pieces; ++i) {
-        if (write_bytes(desc, tile_offset(desc, std::int64_t{first_tile} + i, band), buffer, length,
+        if (write_bytes(desc, img_std_tile_offset(desc, first_tile + i, band), buffer, length,
                         tile_by_tile) == -1)
             return -1;
         buffer += length;

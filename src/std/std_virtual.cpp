@@ -1,7 +1,6 @@
 // Between a file image and an in-memory image, and single samples of the latter.
 #include "api/img_desc.h"
 #include "api/report.h"
-#include "io/io_method.h"
 #include "std/std.h"
 
 #include <cstring>
@@ -40,15 +39,11 @@ std::int32_t check_fit(const img_desc *desc, const img_desc *mem_desc, std::int3
     return 0;
 }
 
-// Moves `size` bytes between the file at `offset` and `data`. Returns the bytes moved, or -1.
-std::int32_t transfer(std::int32_t writing, const img_desc *desc, std::int32_t offset,
-                      std::uint8_t *data, std::int32_t size)
+std::int32_t transfer(std::int32_t writing, img_desc *desc, std::int32_t offset, std::uint8_t *data,
+                      std::int32_t size)
 {
-    const img_io_method *const method = desc->io_method;
-    const std::int32_t fd = desc->std_file->data_fd;
-    const auto count = static_cast<std::uint32_t>(size);
-    if (method->seek(fd, offset, 0) != offset) return -1;
-    return writing != 0 ? method->write(fd, data, count) : method->read(fd, data, count);
+    return writing != 0 ? img_std_write_at(desc, offset, data, size)
+                        : img_std_read_at(desc, offset, data, size);
 }
 
 }  // namespace
@@ -79,10 +74,9 @@ std::int32_t img_std_io_virtual(std::int32_t writing, img_desc *desc, img_desc *
 std::int32_t img_std_pix_io_virtual(std::int32_t writing, img_desc *desc, std::int32_t line,
                                     std::int32_t samp, std::int32_t band, std::uint8_t *value)
 {
-    if (!desc->mem_image) return -1;
+    if (!desc->mem_image || line < 0 || samp < 0 || band < 0) return -1;
     const std::int32_t offset = img_std_sample_offset(desc, line, samp, band);
-    if (offset == -1) return -1;
-    if (offset > desc->std_file->veof_max)
+    if (offset == -1 || offset > desc->std_file->veof_max)
         return img_fail("img_std_pix_io_virtual:Pixel out of range.\n");
     // The last sample may begin within the image and end beyond it.
     const std::int64_t room = std::int64_t{desc->std_file->veof_max} - offset + 1;
