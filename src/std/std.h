@@ -63,6 +63,8 @@ void img_std_fail_close(img_desc *desc);
 
 // --- Bytes of the data file ---
 
+// Returns 0 when a seek went to `expected`, else -1 with errno set: by the seek, or by this.
+std::int32_t img_std_check_position(std::int32_t position, std::int64_t expected);
 // Appends `count` >= 1 zero bytes to the data file and leaves its descriptor at the new end; does
 // nothing for an in-memory image. Returns 0, or -1 with errno set.
 std::int32_t img_std_extend(img_desc *desc, std::int32_t count);

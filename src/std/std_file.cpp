@@ -134,21 +134,14 @@ std::int32_t seek(const img_desc *desc, std::int64_t offset, std::int32_t whence
 
 std::int32_t seek_to(const img_desc *desc, std::int64_t offset)
 {
-    const std::int32_t at = seek(desc, offset, IMG_SEEK_START);
-    if (at == offset) return 0;
-    if (at != -1) errno = EIO;  // the method stands elsewhere than it was told to
-    return -1;
+    return img_std_check_position(seek(desc, offset, IMG_SEEK_START), offset);
 }
 
 // Appends zero bytes to a file whose descriptor stands at its end, by writing the last of them.
 std::int32_t append_zeros(const img_desc *desc, std::int32_t end, std::int64_t count)
 {
     const std::int32_t at = seek(desc, count - 1, IMG_SEEK_CURRENT);
-    if (at == -1) return -1;
-    if (at != end + count - 1) {
-        errno = EIO;
-        return -1;
-    }
+    if (img_std_check_position(at, end + count - 1) == -1) return -1;
     const std::int32_t written =
         desc->io_method->write(desc->std_file->data_fd, img_zero_sample.data(), 1);
     if (written == 0) errno = ENOSPC;
@@ -303,6 +296,13 @@ std::int32_t img_std_setup(img_desc *desc)
     if (img_std_update_veof(desc) == -1) return -1;
     file->veof_max = file->veof;
     return seek_to(desc, 0);
+}
+
+std::int32_t img_std_check_position(std::int32_t position, std::int64_t expected)
+{
+    if (position == expected) return 0;
+    if (position != -1) errno = EIO;  // the method stands elsewhere than it was told to
+    return -1;
 }
 
 std::int32_t img_std_extend(img_desc *desc, std::int32_t count)

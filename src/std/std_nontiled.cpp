@@ -55,9 +55,9 @@ std::int32_t write_interleaved_line(img_desc *desc, std::int64_t at, std::int32_
             return img_fail("img_std_write_nontiled_inter: %d of %d bytes written!!\n", written,
                             desc->nbytes);
         at += pixel_length;
-        const bool moved = method->seek(fd, pixel_length - desc->nbytes, IMG_SEEK_CURRENT) == at;
+        const std::int32_t next = method->seek(fd, pixel_length - desc->nbytes, IMG_SEEK_CURRENT);
         // Behind the last sample may be the end of all that can be addressed.
-        if (!moved && i + 1 < nsamps)
+        if (i + 1 < nsamps && img_std_check_position(next, at) == -1)
             return img_fail_errno("img_std_write_nontiled_interleaved:write");
     }
     if (img_std_update_veof(desc) == -1)
