@@ -60,7 +60,7 @@ tile_buffer new_zero_plane(const img_desc *desc)
 // are not.
 bool is_in_memory(const img_desc *desc, std::int64_t offset, std::int32_t length)
 {
-    if (offset + length - 1 <= desc->std_file->veof) return true;
+    if (length >= 0 && offset + length - 1 <= desc->std_file->veof) return true;
     if (img_std_report_errors != 0) img_fail("img_std_read_tiles: read beyond virtual eof!!\n");
     return false;
 }
