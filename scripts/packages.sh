@@ -1,0 +1,34 @@
+# shellcheck shell=bash
+# Sourced by the commands of this folder.
+
+# Installs those of the named Debian packages that are missing; says so when there are any.
+need_packages()
+{
+    local missing=() package as_root=()
+    command -v dpkg-query >/dev/null || {
+        echo "Not a Debian system: taking it that these are here: $*"
+        return
+    }
+    for package in "$@"; do
+        dpkg-query -W -f '${db:Status-Status}' "$package" 2>/dev/null | grep -qx installed ||
+            missing+=("$package")
+    done
+    ((${#missing[@]})) || return 0
+
+    echo "Installing ${missing[*]}"
+    ((EUID == 0)) || as_root=(sudo)
+    quietly "${as_root[@]}" apt-get update
+    quietly "${as_root[@]}" env DEBIAN_FRONTEND=noninteractive \
+        apt-get install --yes --no-install-recommends "${missing[@]}"
+}
+
+# Runs a command whose output is of interest only when it fails.
+quietly()
+{
+    local log status=0
+    log=$(mktemp)
+    "$@" >"$log" 2>&1 || status=$?
+    ((status == 0)) || cat "$log" >&2
+    rm -f "$log"
+    return "$status"
+}
