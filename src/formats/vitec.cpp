@@ -97,9 +97,10 @@ std::int32_t img_vitec_read_header(img_desc *desc)
     take_geometry(desc, block);
 
     const std::int64_t header_length = img_get_int(block.bytes, IMG_VITEC_AT_HEADER_LENGTH);
-    desc->std_file->data_offset =
+    const std::int32_t data_offset =
         img_header_seek(desc, header_length - std::int64_t{sizeof block.bytes}, IMG_SEEK_CURRENT);
-    return desc->std_file->data_offset != -1 ? 0 : -1;
+    desc->std_file->data_offset = data_offset;
+    return data_offset != -1 && data_offset == link + 4 + header_length ? 0 : -1;
 }
 
 std::int32_t img_vitec_write_header(img_desc *desc)
@@ -118,7 +119,7 @@ std::int32_t img_vitec_write_header(img_desc *desc)
         return -1;
     desc->swap = IMG_WRITES_SWAPPED ? 1 : 0;
     desc->std_file->data_offset = img_header_seek(desc, 0, IMG_SEEK_CURRENT);
-    return desc->std_file->data_offset != -1 ? 0 : -1;
+    return desc->std_file->data_offset == IMG_VITEC_DATA_OFFSET ? 0 : -1;
 }
 
 std::int32_t img_vitec_padded_nlines(img_desc *desc)

@@ -24,6 +24,7 @@ enum : std::uint32_t {
 };
 
 inline constexpr std::size_t IMG_VITEC_RESERVED = 64;  // zero bytes after each of the two blocks
+inline constexpr std::int32_t IMG_VITEC_DATA_OFFSET = 244;  // first pixel byte of a new file
 
 struct img_vitec_file_block {
     std::array<std::uint8_t, 48> bytes;  // those without a name are 0

@@ -81,7 +81,7 @@ std::int32_t img_split_name(const char *name, std::unique_ptr<char[]> *filename_
         filename.remove_prefix(start);
         if (const auto at = filename.find('@'); at != std::string_view::npos) {
             method_name = filename.data() + at + 1;
-            filename = filename.substr(0, at);
+            filename.remove_suffix(filename.size() - at);
         }
     }
     auto copy = copy_of(filename);

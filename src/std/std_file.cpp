@@ -242,6 +242,7 @@ std::int32_t img_std_create_mem(img_desc *desc)
     if (make_state(desc, -1) == -1) return -1;
     img_std_file *const file = desc->std_file;
     if (img_std_setup(desc) == 0) {
+        // In layout 4 a tile counts all bands already; there is room for them once more.
         const std::int64_t size =
             file->tile_size != 0
                 ? product(file->tiles_down, file->tiles_across, desc->nbands, file->tile_size)
@@ -314,7 +315,7 @@ std::int32_t img_std_extend(img_desc *desc, std::int32_t count)
 
 std::int32_t img_std_seek_to_write(img_desc *desc, std::int64_t offset)
 {
-    if (offset <= desc->std_file->veof) return seek_to(desc, offset);
+    if (offset <= desc->std_file->veof || fitting(offset) == -1) return seek_to(desc, offset);
     // The file may have grown since it was last looked at: what is missing counts from its end.
     const std::int32_t end = seek(desc, 0, IMG_SEEK_END);
     if (end == -1) return -1;

@@ -1,0 +1,52 @@
+#include "support/fault_memory.h"
+
+#include <cerrno>
+#include <cstddef>
+#include <new>
+
+namespace {
+
+int requests_left = 0;
+bool denies_the_rest = false;
+bool denied = false;
+
+bool denies()
+{
+    if (requests_left == 0 || --requests_left != 0) return false;
+    if (denies_the_rest) requests_left = 1;
+    denied = true;
+    errno = ENOMEM;
+    return true;
+}
+
+}  // namespace
+
+void memory_arm(int nth, bool lasting)
+{
+    requests_left = nth;
+    denies_the_rest = lasting;
+    denied = false;
+}
+
+bool memory_denied()
+{
+    return denied;
+}
+
+// The linker puts these in place of the non-throwing operator new and operator new[], which the
+// library alone uses, and calls the originals __real_.
+extern "C" {
+
+void *__real__ZnwmRKSt9nothrow_t(std::size_t size, const std::nothrow_t &tag) noexcept;
+void *__real__ZnamRKSt9nothrow_t(std::size_t size, const std::nothrow_t &tag) noexcept;
+
+void *__wrap__ZnwmRKSt9nothrow_t(std::size_t size, const std::nothrow_t &tag) noexcept
+{
+    return denies() ? nullptr : __real__ZnwmRKSt9nothrow_t(size, tag);
+}
+
+void *__wrap__ZnamRKSt9nothrow_t(std::size_t size, const std::nothrow_t &tag) noexcept
+{
+    return denies() ? nullptr : __real__ZnamRKSt9nothrow_t(size, tag);
+}
+}

@@ -1,0 +1,11 @@
+// Memory that cannot be had.
+#ifndef IMG_TEST_FAULT_MEMORY_H
+#define IMG_TEST_FAULT_MEMORY_H
+
+// Denies the library's `nth` request for memory from now on, and every later one if `lasting`.
+// Counting starts anew; nth 0: none is denied.
+void memory_arm(int nth, bool lasting = false);
+// True when a request was denied since memory_arm.
+bool memory_denied();
+
+#endif

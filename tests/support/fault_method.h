@@ -1,0 +1,30 @@
+// The access method "fault": ordinary files whose nth call goes wrong.
+#ifndef IMG_TEST_FAULT_METHOD_H
+#define IMG_TEST_FAULT_METHOD_H
+
+#include <cstdint>
+#include <map>
+
+enum class io_call { open, close, read, write, seek, unlink };
+
+enum class fault {
+    fails,       // -1, errno EIO, nothing done
+    moves_none,  // read, write: 0
+    moves_one,   // read, write: 1 byte
+    moves_half,  // read, write: half of what was asked
+    stands_off,  // seek: the file stands, and is said to stand, one byte further
+};
+
+// Registers the method; once per process, later calls do nothing.
+void fault_register();
+// Lets the `nth` call of that kind from now on go wrong, and every later one if `lasting`.
+// Counters start anew. nth 0: nothing goes wrong.
+void fault_arm(io_call call, int nth, fault what = fault::fails, bool lasting = false);
+// True when a call went wrong since fault_arm.
+bool fault_fired();
+// Calls since fault_arm.
+int calls_of(io_call call);
+// Descriptors that were opened and not closed since the process began.
+int open_descriptors();
+
+#endif

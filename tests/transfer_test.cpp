@@ -1,0 +1,422 @@
+// Windows and whole tiles in every layout, held against the addressing rules alone; how many calls
+// of the file they take, and what is said when one of them fails.
+#include "std/std.h"
+
+#include "access/tile_cache.h"
+#include "support/file_test.h"
+#include "support/layout_rules.h"
+#include "support/random.h"
+#include "support/refusal.h"
+
+#include <algorithm>
+#include <bit>
+#include <fstream>
+#include <set>
+
+namespace {
+
+// A window, or with `stride` 0 the run of `nlines` whole tiles from tile `line` on.
+struct region {
+    std::int32_t band, line, samp, nlines, nsamps, stride;
+};
+
+std::int32_t transfer(bool writing, img_handle image, const region &at, bytes *buffer,
+                      const bytes &fill)
+{
+    const auto [band, line, samp, nlines, nsamps, stride] = at;
+    std::uint8_t *const data = buffer->data();
+    if (stride == 0)
+        return writing ? img_dump_tiles(image, line, nlines, band, data)
+                       : img_load_tiles(image, line, nlines, band, data);
+    return writing
+               ? img_dump_buffer(image, line, samp, nlines, nsamps, band, data, stride, &fill[0])
+               : img_load_buffer(image, line, samp, nlines, nsamps, band, data, stride, &fill[0]);
+}
+
+enum class storage { file, cached_file, memory };
+
+// The life of one image, made up of random transfers. What must be stored by now is known byte by
+// byte, and with it what a load delivers and whether the file reaches far enough for it.
+class random_life {
+public:
+    random_life(std::uint32_t seed, std::string name)
+        : m_random(seed), m_name(std::move(name)), m_where(static_cast<storage>(seed % 3))
+    {
+        m_image = {m_random.within(1, 20), m_random.within(1, 20), m_random.within(1, 3),
+                   m_random.within(1, 2)};
+        m_image.layout = m_random.within(IMG_LAYOUT_BSQ, IMG_LAYOUT_TILED_BIP);
+        m_image.swap = m_random.within(0, 1);
+        if (m_image.layout >= IMG_LAYOUT_TILED) m_image.tile_nsamps = m_random.within(1, 8);
+        // With one of the tile sizes alone an image is untiled, but stored in multiples of it.
+        if (m_image.tile_nsamps != 0 || (m_where != storage::memory && m_random.below(4) == 0))
+            m_image.tile_nlines = m_random.within(1, 8);
+    }
+    void run()
+    {
+        for (const bool created : {true, false}) {
+            if (m_where == storage::memory && !created) break;
+            open(created);
+            for (int i = 0; i < 15 && !testing::Test::HasFailure(); ++i) act();
+            img_closefile(m_handle);
+            m_stored.resize(stored_bytes(m_image));
+            if (m_where != storage::memory) expect_stored();
+        }
+    }
+    std::ptrdiff_t failures() const { return m_failures; }
+    std::string name() const
+    {
+        return "storage " + std::to_string(static_cast<int>(m_where)) + ", geometry " +
+               testing::PrintToString(std::bit_cast<std::array<std::int32_t, 8>>(m_image));
+    }
+
+private:
+    void open(bool created)
+    {
+        img_cache_mb = m_where == storage::cached_file ? 1 : 0;
+        img_default_tile_nsamps = m_random.within(1, 8);
+        img_default_tile_nlines = m_random.within(1, 8);
+        m_handle = m_where == storage::memory ? create_test_memory(m_image)
+                   : created                  ? create_test_file(m_name, m_image)
+                                              : open_test_file(m_name, IMG_OPEN_READ_WRITE);
+        img_cache_mb = 0;
+        m_desc = img_find_image(m_handle);
+        m_complete = !created;
+        if (m_where == storage::memory)
+            m_stored.resize(stored_bytes(m_image));
+        else if (created)
+            m_header = read_file(m_name);
+        if (m_where != storage::cached_file || !img_is_tiled(m_desc)) return;
+        bytes plane(img_std_plane_size(m_desc));
+        if (img_load_tiles(m_handle, 0, 1, 0, plane.data()) == -1) ++m_failures;
+        m_desc->tile_cache->free_entries = m_random.within(1, 4);
+    }
+    void act()
+    {
+        const std::uint32_t kind = m_random.below(5);
+        if (kind > 2)
+            load(random_region());
+        else if (kind > 0)
+            dump(random_region());
+        else if (m_where == storage::file)
+            grow_meanwhile();
+        if (!is_cached()) expect_stored();
+    }
+
+    // --- What is where ---
+
+    bool is_cached() const { return m_desc->tile_cache != nullptr; }
+    bool has_stored_tiles() const { return img_is_tiled(m_desc) && m_desc->virtual_tiled == 0; }
+    bool is_interleaved() const
+    {
+        return m_image.layout == IMG_LAYOUT_BIP || m_image.layout == IMG_LAYOUT_TILED_BIP;
+    }
+    std::size_t nbytes() const { return static_cast<std::size_t>(m_image.nbytes); }
+
+    region random_region()
+    {
+        const std::int32_t band = m_random.within(0, m_image.nbands - 1);
+        if (img_is_tiled(m_desc) && m_random.below(2) == 0) {
+            const std::int32_t last =
+                m_desc->std_file->tiles_across * m_desc->std_file->tiles_down - 1;
+            const std::int32_t first = m_random.within(0, last);
+            return {band, first, 0, m_random.within(1, last + 1 - first), 0, 0};
+        }
+        region at{band,
+                  m_random.within(-3, m_image.nlines),
+                  m_random.within(-3, m_image.nsamps),
+                  m_random.within(1, m_image.nlines + 4),
+                  m_random.within(1, m_image.nsamps + 4),
+                  0};
+        at.stride = at.nsamps + m_random.within(0, 2);
+        return at;
+    }
+    // Calls `visit(byte, line, samp, inside)` for every sample, which lies at that byte of the
+    // buffer. Returns the bytes of the buffer.
+    template <typename Visit>
+    std::size_t for_each_sample(const region &at, Visit visit) const
+    {
+        const bool in_tiles = at.stride == 0;
+        const std::int32_t width = in_tiles ? m_desc->tile_nsamps : at.nsamps;
+        const std::int32_t height = in_tiles ? m_desc->tile_nlines : at.nlines;
+        const std::int32_t across = m_desc->std_file->tiles_across;
+        std::size_t byte = 0;
+        for (std::int32_t i = 0; i < (in_tiles ? at.nlines * height : height); ++i)
+            for (std::int32_t j = 0; j < width; ++j) {
+                const std::int32_t tile = at.line + i / height;
+                const auto line = in_tiles ? tile / across * height + i % height : at.line + i;
+                const auto samp = in_tiles ? tile % across * width + j : at.samp + j;
+                const bool in_image =
+                    line >= 0 && line < m_image.nlines && samp >= 0 && samp < m_image.nsamps;
+                byte = static_cast<std::size_t>(i * (in_tiles ? width : at.stride) + j) * nbytes();
+                visit(byte, line, samp, in_image || (in_tiles && has_stored_tiles()));
+            }
+        return byte + nbytes();
+    }
+    // The end of what moves together with a sample: its tile, or its pixel.
+    std::size_t end_of(std::int32_t band, std::int32_t line, std::int32_t samp) const
+    {
+        if (has_stored_tiles()) {
+            line += m_image.tile_nlines - 1 - line % m_image.tile_nlines;
+            samp += m_image.tile_nsamps - 1 - samp % m_image.tile_nsamps;
+        }
+        if (is_interleaved()) band = m_image.nbands - 1;
+        return stored_at(m_image, band, line, samp) + nbytes();
+    }
+    // Stores those bytes of a sample that do not lie before `from`.
+    void store(std::int32_t band, std::int32_t line, std::int32_t samp, const std::uint8_t *sample,
+               std::size_t from = 0)
+    {
+        const std::size_t at = stored_at(m_image, band, line, samp);
+        const std::size_t end = has_stored_tiles() ? end_of(band, line, samp) : at + nbytes();
+        m_stored.resize(std::max(m_stored.size(), end));
+        for (std::size_t i = 0; i < nbytes(); ++i)
+            if (at + i >= from) m_stored[at + i] = sample[i];
+    }
+    void expect_stored() const
+    {
+        bytes stored = m_header;
+        stored.insert(stored.end(), m_stored.begin(), m_stored.end());
+        if (m_where == storage::memory) {
+            EXPECT_TRUE(std::equal(stored.begin(), stored.end(), m_desc->mem_image.get()));
+        } else {
+            EXPECT_EQ(read_file(m_name), stored);
+        }
+    }
+
+    // --- Transfers ---
+
+    bytes random_bytes(std::size_t count)
+    {
+        bytes some(count);
+        for (auto &byte : some) byte = static_cast<std::uint8_t>(m_random.below(256));
+        return some;
+    }
+    bytes random_buffer(const region &at)
+    {
+        return random_bytes(for_each_sample(at, [](auto...) {}));
+    }
+    // Between the order in which samples are stored and that of a caller's buffer.
+    void exchange(const region &at, std::uint8_t *sample) const
+    {
+        if (at.stride != 0 && m_image.nbytes == 2 && m_image.swap != 0)
+            std::swap(sample[0], sample[1]);
+    }
+
+    void load(const region &at)
+    {
+        bytes buffer = random_buffer(at), expected = buffer;
+        const bytes fill{random_bytes(1)[0], 0};
+        std::int32_t result = transfer(false, m_handle, at, &buffer, fill);
+        std::size_t needed = 0;
+        for_each_sample(at, [&](auto byte, auto line, auto samp, bool inside) {
+            std::uint8_t *const sample = &expected[byte];
+            // Virtual tiles at the edges have no samples for all of their plane.
+            if (!inside) std::copy_n(at.stride != 0 ? &fill[0] : &buffer[byte], nbytes(), sample);
+            if (!inside) return;
+            const std::size_t from = stored_at(m_image, at.band, line, samp);
+            for (std::size_t i = 0; i < nbytes() && from + i < m_stored.size(); ++i)
+                sample[i] = m_stored[from + i];
+            exchange(at, sample);
+            needed = std::max(needed, end_of(at.band, line, samp));
+        });
+        if (m_where == storage::memory && img_is_tiled(m_desc) && needed > 0) {
+            EXPECT_EQ(result, -1);  // quietly
+            if (at.stride != 0) return;
+            result = img_std_read_tiles(m_desc, at.line, at.nlines, at.band, buffer.data());
+        }
+        // While changed tiles wait in a cache, the file may not be as long yet as they will make
+        // it, and the cache may have more than was asked to be stored.
+        const bool is_stored = needed <= m_stored.size();
+        if (m_complete || !is_cached()) {
+            EXPECT_EQ(result, is_stored ? 0 : -1);
+        }
+        if (result == -1) ++m_failures;
+        if (result == 0 ? is_stored : at.stride == 0 && !is_cached()) {
+            EXPECT_EQ(buffer, expected);
+        }
+    }
+
+    void dump(const region &at)
+    {
+        const bytes fill = is_cached() ? bytes(2) : random_bytes(2);
+        bytes buffer = random_buffer(at);
+        const bytes before = buffer;
+        EXPECT_EQ(transfer(true, m_handle, at, &buffer, fill), 0);
+        EXPECT_EQ(buffer, before);
+        std::set<std::pair<std::int32_t, std::int32_t>> filled;  // tiles, by row and column
+        std::size_t length = 0;  // stored when the first of their row was filled
+        for_each_sample(at, [&](auto byte, auto line, auto samp, bool inside) {
+            if (!inside) return;
+            if (at.stride != 0 && has_stored_tiles()) {
+                const std::int32_t width = m_desc->tile_nsamps, height = m_desc->tile_nlines;
+                const std::pair tile{line / height, samp / width};
+                if (filled.lower_bound({tile.first, 0}) == filled.end()) length = m_stored.size();
+                for (std::int32_t i = filled.insert(tile).second ? 0 : width * height;
+                     i < width * height; ++i)
+                    store(at.band, tile.first * height + i / width, tile.second * width + i % width,
+                          &fill[0], length);
+            }
+            exchange(at, &buffer[byte]);
+            store(at.band, line, samp, &buffer[byte]);
+        });
+    }
+
+    // Someone else appends to the file, which may end within a tile then. Of interleaved tiles
+    // only whole samples are ever taken back.
+    void grow_meanwhile()
+    {
+        const std::size_t room = stored_bytes(m_image) - m_stored.size();
+        const std::size_t count = std::min<std::size_t>(room, m_random.below(20));
+        const bytes more = random_bytes(is_interleaved() ? count / nbytes() * nbytes() : count);
+        m_stored.insert(m_stored.end(), more.begin(), more.end());
+        std::ofstream out(m_name, std::ios::binary | std::ios::app);
+        for (const std::uint8_t byte : more) out.put(static_cast<char>(byte));
+    }
+
+    random_numbers m_random;
+    std::string m_name;
+    storage m_where;
+    test_geometry m_image;
+    img_handle m_handle = -1;
+    img_desc *m_desc = nullptr;
+    bool m_complete = false;  // the file was as long as its data from the beginning
+    bytes m_header, m_stored;
+    std::ptrdiff_t m_failures = 0;  // each of which prints a line
+};
+
+class Transfers : public FileTest {};
+
+TEST_F(Transfers, FollowTheAddressingRules)
+{
+    for (std::uint32_t seed = 1; seed <= 1500; ++seed) {
+        random_life life(seed, m_file);
+        const std::string text = printed_by([&] { life.run(); });
+        EXPECT_EQ(std::count(text.begin(), text.end(), '\n'), life.failures()) << text;
+        ASSERT_FALSE(HasFailure()) << "seed " << seed << ", " << life.name();
+    }
+}
+
+// Two tiles side by side, if the layout has any.
+test_geometry two_tiles(std::int32_t layout, std::int32_t nbands = 3)
+{
+    const std::int32_t tile = layout >= IMG_LAYOUT_TILED && layout <= IMG_LAYOUT_TILED_BIP ? 1 : 0;
+    return {4, 10, nbands, 2, 5 * tile, 4 * tile, layout};
+}
+
+TEST_F(Transfers, TakeFewCallsAndSayWhichOneFailed)
+{
+    constexpr region part{1, 1, 3, 2, 4, 4}, tiles{1, 0, 0, 2, 0, 0};
+    const std::string read = "img_std_read_tiles:read", write = "img_std_write_tiles:write";
+    const std::string plane_written = "img_std_write_tiles:20 of 40 bytes written!!\n" +
+                                      perror_line("img_std_write_tiles:partial write", EIO);
+    const struct {
+        std::int32_t layout;
+        region at;
+        int reads, writes;
+        std::string failed, cut_short;  // the last write, of a load the last read
+    } cases[] = {
+        {0, part, 2, 0, "img_read_nontiled:read", "img_read_nontiled: 4 of 8 bytes read!!\n"},
+        {1, part, 2, 0, "img_std_read_nontiled_interleaved:read",
+         "img_std_read_nontiled_interleaved: 12 of 24 bytes read!!\n"},
+        {2, part, 2, 0, read, "img_std_read_tiles: 20 of 40 bytes read!!\n"},
+        {2, tiles, 2, 0, read, "img_std_read_tiles: 20 of 40 bytes read!!\n"},
+        {3, part, 1, 0, read, "img_std_read_tiles: 40 of 80 bytes read!!\n"},
+        {3, tiles, 1, 0, read, "img_std_read_tiles: 40 of 80 bytes read!!\n"},
+        {4, part, 1, 0, read, "img_std_read_tiles: 120 of 240 bytes read!!\n"},
+        {4, tiles, 1, 0, read, "img_std_read_tiles: 120 of 240 bytes read!!\n"},
+        {0, part, 0, 2, "img_std_write_nontiled:write",
+         "img_std_write_nontiled: 4 of 8 bytes written!!\n"},
+        {1, part, 0, 8, "img_std_write_nontiled_interleaved:write",
+         "img_std_write_nontiled_inter: 1 of 2 bytes written!!\n"},
+        {2, part, 2, 2, write, plane_written},
+        {2, tiles, 0, 2, write, plane_written},
+        {3, part, 1, 1, write, "img_std_write_tiles: 40 of 80 bytes written!!\n"},
+        {3, tiles, 0, 1, write, "img_std_write_tiles: 40 of 80 bytes written!!\n"},
+        {4, part, 5, 1, write, "img_std_write_tiles: 120 of 240 bytes written!!\n"},
+        {4, tiles, 4, 1, write, "img_std_write_tiles: 120 of 240 bytes written!!\n"},
+    };
+    for (const auto &[layout, at, reads, writes, failed, cut_short] : cases) {
+        img_closefile(create_test_file(m_name, two_tiles(layout)));
+        const img_handle image = open_test_file(m_name, IMG_OPEN_READ_WRITE);
+        bytes buffer(80);
+        const auto run = [&, at = at, writes = writes] {
+            return transfer(writes > 0, image, at, &buffer, bytes(2));
+        };
+        fault_arm(io_call::open, 0);
+        EXPECT_EQ(run(), 0);
+        EXPECT_EQ((std::pair{calls_of(io_call::read), calls_of(io_call::write)}),
+                  (std::pair{reads, writes}));
+        EXPECT_TRUE(writes > 0 || calls_of(io_call::seek) == reads);
+        for (const fault kind : {fault::fails, fault::moves_half}) {
+            fault_arm(writes > 0 ? io_call::write : io_call::read, writes > 0 ? writes : reads,
+                      kind);
+            EXPECT_EQ(refusal(run), kind == fault::fails ? perror_line(failed, EIO) : cut_short);
+            for (int nth = 1; writes > 0 && nth <= reads; ++nth) {  // of what is stored again
+                fault_arm(io_call::read, nth, kind);
+                EXPECT_EQ(refusal(run), perror_line(read, EIO));
+                EXPECT_EQ(calls_of(io_call::write), 0);
+            }
+        }
+        img_closefile(image);
+    }
+}
+
+TEST_F(Transfers, StayWithinAnImageInMemory)
+{
+    const std::pair lines{"img_read_nontiled: read", "img_write_nontiled: Write"};
+    const std::pair tiles{"img_std_read_tiles: read", "img_std_write_tiles: write"};
+    const std::pair pixels{"img_std_read_nontiled_interleaved: read",
+                           "img_std_write_nontiled_interleaved: Write"};
+    const struct {
+        std::int32_t layout, nbands;
+        std::pair<std::string, std::string> text;
+    } cases[] = {{0, 2, lines}, {1, 1, lines}, {5, 2, lines}, {1, 2, pixels},
+                 {2, 2, tiles}, {3, 2, tiles}, {4, 2, tiles}};
+    for (const auto &[layout, nbands, text] : cases) {
+        const test_geometry image = two_tiles(layout, nbands);
+        img_desc *const desc = img_find_image(create_test_memory(image));
+        img_std_file *const file = desc->std_file;
+        const auto last = static_cast<std::int32_t>(stored_bytes(image)) - 1;
+        bytes buffer(80, 9);
+        const auto load = [&, band = nbands - 1] {
+            return img_is_tiled(desc) ? img_std_read_tiles(desc, 1, 1, band, buffer.data())
+                                      : img_std_read(desc, 3, 9, 1, 1, band, buffer.data(), 1);
+        };
+        const auto dump = [&, band = nbands - 1](std::int32_t line, std::int32_t samp) {
+            return img_std_write(desc, line, samp, 1, 1, band, buffer.data(), 1, nullptr);
+        };
+        file->veof = file->veof_max = last - 1;
+        EXPECT_EQ(refusal(load), text.first + " beyond virtual eof!!\n");
+        EXPECT_EQ(refusal([&] { return dump(3, 9); }), text.second + " past virtual eof!!\n");
+        EXPECT_EQ(desc->mem_image[static_cast<std::size_t>(last)], 0);
+        file->veof_max = last;
+        EXPECT_EQ(dump(3, 9) + dump(0, 0), 0);
+        EXPECT_EQ(file->veof, last);
+        EXPECT_EQ(load(), 0);
+        img_closefile(desc->handle);
+    }
+}
+
+TEST_F(Transfers, RefuseRegionsThatAreNotInside)
+{
+    constexpr std::array inside{0, 0, 1, 1, 0}, beyond{4, 10, 5, 11, 3};  // lines, samples, band
+    for (std::int32_t layout = 0; layout < 5; ++layout) {
+        img_desc *const desc = img_find_image(create_test_memory(two_tiles(layout)));
+        for (std::size_t i = 0; i < 7; ++i)
+            for (const std::int32_t absurd : {INT32_MIN, -1, beyond[i % 5], INT32_MAX}) {
+                auto at = inside;
+                at[i % 5] = absurd;
+                if (i >= 5) at[i - 3] = INT32_MAX;  // where both are large their sum overflows
+                const auto [line, samp, nlines, nsamps, band] = at;
+                const std::int32_t expected = nlines < 1 || nsamps < 1 ? 0 : -1;
+                EXPECT_EQ(img_std_read(desc, line, samp, nlines, nsamps, band, nullptr, 1),
+                          expected);
+                EXPECT_EQ(
+                    img_std_write(desc, line, samp, nlines, nsamps, band, nullptr, 1, nullptr),
+                    expected);
+            }
+        img_closefile(desc->handle);
+    }
+}
+
+}  // namespace

@@ -1,0 +1,146 @@
+// Between file images and images in memory.
+#include "std/std.h"
+
+#include "support/file_test.h"
+#include "support/layout_rules.h"
+#include "support/refusal.h"
+
+#include <algorithm>
+#include <numeric>
+
+namespace {
+
+class VirtualIo : public FileTest {
+protected:
+    // Opens a file of 20 lines and an image in memory, whose bytes are 1, 2, 3, ...
+    void open(std::int32_t layout, std::int32_t nbands, const test_geometry &memory)
+    {
+        const std::int32_t tile = layout < IMG_LAYOUT_TILED ? 0 : 4;
+        m_image = {20, 6, nbands, memory.nbytes, tile, tile, layout};
+        img_closefile(create_test_file(m_name, m_image));
+        m_desc = img_find_image(open_test_file(m_name, IMG_OPEN_READ_WRITE));
+        m_memory = img_find_image(create_test_memory(memory));
+        std::iota(&m_memory->mem_image[0], &m_memory->mem_image[0] + m_memory->std_file->veof + 1,
+                  std::uint8_t{1});
+        fault_arm(io_call::open, 0);
+    }
+    void close()
+    {
+        img_closefile(m_desc->handle);
+        img_closefile(m_memory->handle);
+    }
+    std::int32_t transfer(bool writing, std::int32_t line0 = 8, std::int32_t samp0 = 0)
+    {
+        return img_type_of(m_desc).io_virtual(writing ? 1 : 0, m_desc, m_memory, line0, samp0);
+    }
+
+    test_geometry m_image;
+    img_desc *m_desc = nullptr, *m_memory = nullptr;
+};
+
+TEST_F(VirtualIo, MovesAllAtOnceOrBandByBand)
+{
+    const struct {
+        std::int32_t layout, nbands, transfers;
+        const char *cut_short;  // the last transfer
+    } cases[] = {
+        {0, 3, 3, "img_std_io_virtual: 42 of 84 bytes ioed!!\n"},
+        {1, 3, 1, "img_std_io_virtual:Only 126 of 252 bytes ioed!!\n"},
+        {2, 3, 1, "img_std_io_virtual:Only 192 of 384 bytes ioed!!\n"},
+        {3, 3, 3, "img_std_io_virtual: 64 of 128 bytes ioed!!\n"},
+        {4, 1, 1, "img_std_io_virtual:Only 64 of 128 bytes ioed!!\n"},
+    };
+    for (const auto &[layout, nbands, transfers, cut_short] : cases) {
+        const std::int32_t tile = layout < IMG_LAYOUT_TILED ? 0 : 4;
+        const test_geometry part{7, 6, nbands, 2, tile, tile, layout};
+        open(layout, nbands, part);
+        const std::size_t size = stored_bytes(part) / static_cast<std::size_t>(transfers);
+        std::uint8_t *const memory = m_memory->mem_image.get();
+        const bytes pixels(memory, memory + stored_bytes(part));
+        bytes file = read_file(m_file);
+        for (std::int32_t band = 0; band < transfers; ++band)
+            std::copy_n(memory + static_cast<std::size_t>(band) * size, size,
+                        &file[TEST_HEADER_LENGTH + stored_at(m_image, band, 8, 0)]);
+        EXPECT_EQ(transfer(true), 0);
+        EXPECT_EQ(read_file(m_file), file) << "layout " << layout;
+        std::fill_n(memory, pixels.size(), std::uint8_t{0});
+        EXPECT_EQ(transfer(false), 0);
+        EXPECT_EQ(bytes(memory, memory + pixels.size()), pixels) << "layout " << layout;
+        EXPECT_EQ(calls_of(io_call::write), transfers);
+        EXPECT_EQ(calls_of(io_call::read), transfers);
+        for (const bool writing : {false, true})
+            for (const fault kind : {fault::fails, fault::moves_half}) {
+                fault_arm(writing ? io_call::write : io_call::read, transfers, kind);
+                EXPECT_EQ(refusal([&] { return transfer(writing); }),
+                          kind == fault::fails ? perror_line("img_std_io_virtual:write", EIO)
+                                               : cut_short);
+            }
+        close();
+    }
+}
+
+TEST_F(VirtualIo, RefusesImagesAndPlacesThatDoNotFit)
+{
+    const std::string only = "Only images with same ", supported = " currently supported!\n";
+    const std::string widths = only + "# samps" + supported, bands = only + "# bands" + supported;
+    const std::string tiles = only + "tile sizes" + supported;
+    const std::string corners = "Tiled images must be loaded/dumped on tile boundaries!!\n";
+    const struct {
+        test_geometry memory;
+        std::int32_t line0, samp0;
+        std::string expected;
+    } cases[] = {
+        {{7, 5, 2, 1, 8, 8, 2}, 1, 1, widths},
+        {{7, 6, 2, 1, 8, 8, 2}, 1, 1, bands},
+        {{7, 6, 3, 1, 8, 4, 2}, 1, 1, tiles},
+        {{7, 6, 3, 1, 4, 8, 2}, 0, 0, tiles},
+        {{7, 6, 3, 1, 4, 4, 2}, 2, 0, corners},
+        {{7, 6, 3, 1, 4, 4, 2}, 0, 3, corners},
+        {{7, 6, 3, 1, 4, 4, 2}, 20, 0, ""},
+        {{7, 6, 3, 1, 4, 4, 2}, -4, 0, ""},
+        {{7, 6, 3}, -1, 0, ""},
+        {{7, 6, 3}, 0, INT32_MAX, ""},
+    };
+    for (const auto &each : cases) {
+        open(each.memory.layout, 3, each.memory);
+        for (const bool writing : {false, true})
+            EXPECT_EQ(refusal([&] { return transfer(writing, each.line0, each.samp0); }),
+                      each.expected);
+        EXPECT_EQ(calls_of(io_call::read) + calls_of(io_call::write), 0);
+        std::swap(m_desc, m_memory);
+        EXPECT_EQ(refusal([&] { return transfer(true); }), "");
+        close();
+    }
+}
+
+TEST_F(VirtualIo, ReachesThePixelsInMemoryAndNoneBeyond)
+{
+    const std::string beyond = "img_std_pix_io_virtual:Pixel out of range.\n";
+    for (const std::int32_t nbytes : {1, 2}) {
+        open(IMG_LAYOUT_BIP, 3, {7, 6, 3, nbytes, 0, 0, IMG_LAYOUT_BIP});
+        bytes value(static_cast<std::size_t>(nbytes), 99);
+        const auto pixel = [&](bool writing, std::int32_t line, std::int32_t samp,
+                               std::int32_t band) {
+            return img_type_of(m_memory).pix_io_virtual(writing ? 1 : 0, m_memory, line, samp, band,
+                                                        value.data());
+        };
+        const auto refused = [&](auto... place) {
+            return refusal([&] { return pixel(true, place...); });
+        };
+        EXPECT_EQ(pixel(true, 6, 5, 1), 0);
+        EXPECT_EQ(pixel(false, 6, 5, 2), 0);
+        EXPECT_EQ(value.back(), (126 * nbytes) % 256);
+        EXPECT_EQ(pixel(false, 6, 5, 1), 0);
+        EXPECT_EQ(value, bytes(value.size(), 99));
+        EXPECT_EQ(refused(6, 5, 3), beyond);
+        EXPECT_EQ(refused(INT32_MAX, 0, 0), beyond);
+        EXPECT_EQ(refused(-1, 0, 0) + refused(0, -1, 0) + refused(0, 0, -1), "");
+        --m_memory->std_file->veof_max;  // in the middle of two bytes
+        EXPECT_EQ(refused(6, 5, 2), nbytes == 1 ? beyond : "");
+        std::swap(m_desc, m_memory);
+        EXPECT_EQ(refused(0, 0, 0), "");  // in a file
+        close();
+    }
+}
+
+}  // namespace
