@@ -29,7 +29,7 @@ Operation given_or_refusal(Operation operation)
 std::unique_ptr<char[]> copy_of(std::string_view text)
 {
     std::unique_ptr<char[]> copy(new (std::nothrow) char[text.size() + 1]);
-    if (copy) copy[text.copy(copy.get(), text.size())] = '\0';
+    if (copy) *std::ranges::copy(text, copy.get()).out = '\0';
     return copy;
 }
 
