@@ -197,6 +197,7 @@ TEST_F(Chain, IsAppliedOncePerPreparation)
     EXPECT_NE(prepare(), nullptr);
     std::memset(prepare(), 0, 30);  // the buffer of the first preparation is freed
     EXPECT_EQ(img_apply_img_chain(image), 0);
+    EXPECT_EQ(chain.prepared, 0);
     EXPECT_EQ(refusal(img_apply_img_chain, image), "");
     EXPECT_NE(prepare(), nullptr);
     img_chain_release(image);  // as after a failed read
@@ -208,7 +209,11 @@ TEST_F(Chain, IsAppliedOncePerPreparation)
 
 TEST_F(Chain, AFailingLinkEndsTheLoad)
 {
-    const auto refused = [this] { return refusal([this] { return load(); }); };
+    const auto refused = [this] {
+        const std::string text = refusal([this] { return load(); });
+        EXPECT_EQ(chain.work_buffer, nullptr);
+        return text;
+    };
     const std::string where = "img_apply_img_chain: ";
     add_creating(fail_to_create);
     EXPECT_EQ(refused(), where + "Error in IMG_CHAIN_LUT_FCN\n");
@@ -316,8 +321,8 @@ TEST(RandomChain, DoesToTheDataWhatItsLinksDoToEachSample)
         const auto any = [&] { return random.within(1, 13); };
         random_lut first(&random, any(), any()), second(&random, any(), any());
         random_lut computed(&random, 12, any()), third(&random, any(), any());
-        const int wide = random.within(bits, nbytes == 1 ? 8 : 14);
-        random_lut narrowing(&random, wide, wide - random.within(1, 7));
+        const int wide = nbytes == 1 ? random.within(6, 8) : random.within(9, 14);
+        random_lut narrowing(&random, wide, wide - random.within(1, 5));
         random_lut last(&random, narrowing.bits_out, any()), pending(&random, any(), any());
 
         const img_handle image = create_test_memory({nlines, nsamps, 1, nbytes});

@@ -6,7 +6,7 @@
 
 namespace {
 
-constexpr std::int32_t TILE = 128 * 128, BAND = 1'000'000;
+constexpr std::int32_t TILE = 128 * 64, BAND = 1'000'000;
 
 TEST(SampleOffset, FollowsTheLayoutOrIsRefused)
 {
@@ -18,18 +18,18 @@ TEST(SampleOffset, FollowsTheLayoutOrIsRefused)
         {1, 3, 1, 130, 5, 1, 512 + (130 * 516 + 5) * 3 + 1},
         {1, 3, 2, 0, 1, 2, 512 + 6 + 4},
         {1, 1, 2, 2, 3, 0, 512 + (2 * 516 + 3) * 2},
-        {2, 3, 1, 130, 5, 1, 512 + 13 * TILE + in_tile},
-        {2, 3, 2, 130, 5, 1, 512 + (13 * TILE + in_tile) * 2},
-        {2, 1, 1, 127, 511, 0, 512 + 4 * TILE - 1},
-        {3, 3, 1, 130, 5, 1, 512 + BAND + 4 * TILE + in_tile},
-        {3, 3, 2, 130, 261, 2, 512 + 2 * BAND + (6 * TILE + in_tile) * 2},
-        {4, 3, 1, 130, 5, 1, 512 + (4 * TILE + in_tile) * 3 + 1},
-        {4, 2, 2, 130, 5, 1, 512 + ((4 * TILE + in_tile) * 2 + 1) * 2},
-        {5, 3, 1, 130, 5, 1, 0},
-        {6, 3, 1, 130, 5, 1, 0},
+        {2, 3, 1, 66, 5, 1, 512 + 13 * TILE + in_tile},
+        {2, 3, 2, 66, 5, 1, 512 + (13 * TILE + in_tile) * 2},
+        {2, 1, 1, 63, 511, 0, 512 + 4 * TILE - 1},
+        {3, 3, 1, 66, 5, 1, 512 + BAND + 4 * TILE + in_tile},
+        {3, 3, 2, 66, 261, 2, 512 + 2 * BAND + (6 * TILE + in_tile) * 2},
+        {4, 3, 1, 66, 5, 1, 512 + (4 * TILE + in_tile) * 3 + 1},
+        {4, 2, 2, 66, 5, 1, 512 + ((4 * TILE + in_tile) * 2 + 1) * 2},
+        {5, 3, 1, 66, 5, 1, 0},
+        {6, 3, 1, 66, 5, 1, 0},
         {0, 1, 1, last_line, 0, 0, 512 + last_line * 516},
         {0, 1, 1, last_line + 1, 0, 0, -1},
-        {2, 1, 1, 512, 0, 0, -1},
+        {2, 1, 1, 256, 0, 0, -1},
         {2, 1, 1, 0, 512, 0, -1},
         {0, 1, 1, 0, 0, max, -1},
         {1, 3, 2, max, max, max, -1},
@@ -49,7 +49,8 @@ TEST(SampleOffset, FollowsTheLayoutOrIsRefused)
         desc.layout = layout;
         desc.nbands = nbands;
         desc.nbytes = nbytes;
-        desc.tile_nsamps = desc.tile_nlines = 128;
+        desc.tile_nsamps = 128;
+        desc.tile_nlines = 64;
         desc.std_file = &file;
         EXPECT_EQ(img_std_sample_offset(&desc, line, samp, band), expected)
             << layout << ' ' << line << ' ' << samp << ' ' << band;

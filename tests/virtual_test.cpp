@@ -107,8 +107,8 @@ TEST_F(VirtualIo, RefusesImagesAndPlacesThatDoNotFit)
             EXPECT_EQ(refusal([&] { return transfer(writing, each.line0, each.samp0); }),
                       each.expected);
         EXPECT_EQ(calls_of(io_call::read) + calls_of(io_call::write), 0);
-        std::swap(m_desc, m_memory);
-        EXPECT_EQ(refusal([&] { return transfer(true); }), "");
+        for (img_desc *const both : {m_desc, m_memory})
+            EXPECT_EQ(refusal([=] { return img_std_io_virtual(1, both, both, 0, 0); }), "");
         close();
     }
 }
