@@ -218,9 +218,7 @@ TEST(LoadBuffer, OfAFileThatEndsEarlyKeepsOneByteSamplesThatCame)
         const img_handle image = opening(folder / "short", IMG_OPEN_READ_ONLY).result;
         bytes expected(40, UNTOUCHED), buffer = expected;
         if (nbytes == 1) std::fill_n(expected.begin(), 2 * 8 + 3, std::uint8_t{7});
-        EXPECT_EQ(refusal([&] {
-                      return load(image, {0, 0, 4, 8}, &buffer, 8);
-                  }),
+        EXPECT_EQ(refusal(load, image, img_window{0, 0, 4, 8}, &buffer, 8, std::uint8_t{0}),
                   "img_read_nontiled: 3 of " + std::to_string(8 * nbytes) + " bytes read!!\n");
         EXPECT_EQ(buffer, expected);
         EXPECT_EQ(load(image, {0, 0, 2, 8}, &buffer, 8), 0);

@@ -159,13 +159,11 @@ private:
             const std::int32_t first = m_random.within(0, ntiles - 1);
             return {band, first, 0, m_random.within(1, ntiles - first), 0, 0};
         }
+        const std::int32_t line = m_random.within(-3, m_image.nlines);
+        const std::int32_t samp = m_random.within(-3, m_image.nsamps);
+        const std::int32_t nlines = m_random.within(1, m_image.nlines + 4);
         const std::int32_t nsamps = m_random.within(1, m_image.nsamps + 4);
-        return {band,
-                m_random.within(-3, m_image.nlines),
-                m_random.within(-3, m_image.nsamps),
-                m_random.within(1, m_image.nlines + 4),
-                nsamps,
-                nsamps + m_random.within(0, 2)};
+        return {band, line, samp, nlines, nsamps, nsamps + m_random.within(0, 2)};
     }
     bytes random_bytes(std::size_t count)
     {
@@ -195,7 +193,7 @@ private:
     void load(const region &at)
     {
         const std::vector<sample> samples = samples_of(at);
-        bytes buffer = random_bytes(samples.back().byte + nbytes()), expected = buffer;
+        bytes buffer = random_bytes(samples.back().byte + nbytes() + 8), expected = buffer;
         const bytes fill{random_bytes(1)[0], 0};
         std::int32_t result = transfer(false, m_handle, at, &buffer, fill);
         std::size_t needed = 0;
