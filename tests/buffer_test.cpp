@@ -152,6 +152,16 @@ TEST_F(ExtremeWindows, AreTransferredOrRefused)
                     }
 }
 
+TEST(DumpBuffer, OfAnEmptyImageTakesNothingHoweverLargeTheWindow)
+{
+    const scratch_folder folder;
+    const std::string name = folder / "empty";
+    const img_handle image = img_createfile(name.c_str(), 14, 0, 7, IMG_TYPE_HELAVA, 0, 0, 1);
+    const std::uint8_t sample = 1;
+    EXPECT_EQ(img_dump_buffer(image, 0, -2, 14, 1 << 28, 4, &sample, 1 << 28, &sample), 0);
+    img_closefile(image);
+}
+
 TEST(DumpBuffer, LetsTheRowsOfTwoByteWindowsOverlap)
 {
     const img_handle image = create_test_memory({.nlines = 2, .nsamps = 6, .nbytes = 2});

@@ -27,6 +27,7 @@ std::int32_t img_dump_buffer(img_handle handle, std::int32_t line, std::int32_t 
         if (place == IMG_WINDOW_OUTSIDE) return 0;
         if (place == IMG_WINDOW_PARTIAL) skipped = img_clip_window(desc, &window, stride);
     }
+    if (window.nlines < 1 || window.nsamps < 1) return 0;  // an empty image has nothing to take
     // Rows that are not read need not be there.
     const std::int64_t samples = static_cast<std::int64_t>(skipped) +
                                  (std::int64_t{window.nlines} - 1) * stride + window.nsamps;

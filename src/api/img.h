@@ -111,7 +111,7 @@ IMG_EXPORT int32_t img_mgr_cleanup(void);
 IMG_EXPORT int32_t img_query_dimension(img_handle handle, int32_t *nlines_out, int32_t *nsamps_out);
 
 /* Asks the tile size of an image: its width in samples, then its height in lines (the other way
- * round than img_query_dimension). An untiled image answers 0 and 0.
+ * round than img_query_dimension). An untiled image answers 0 for at least one of them.
  *
  * A null pointer is passed over. Returns 0, or -1 quietly for a handle that names no image; then
  * nothing is stored. */
@@ -163,10 +163,10 @@ IMG_EXPORT int32_t img_load_buffer(img_handle handle, int32_t line, int32_t samp
  * last, only `nsamps` <= `stride` * bytes per sample is tested: the rows of a two-byte window may
  * overlap in `buffer`.
  * Returns 0. Returns -1 quietly for a handle that names no image, an image opened read-only, and
- * a `buffer` that is null or of which 2^31 bytes or more would be spanned; -1 after a message for
- * an unfit `nsamps` or `band`, when memory is short, when the file cannot be written, or when a
- * tile that the window shares cannot be read back. What was written before the failure stays;
- * stored samples outside the window are never lost. */
+ * a `buffer` that is null or of which 2^31 bytes or more would be spanned by what is written; -1
+ * after a message for an unfit `nsamps` or `band`, when memory is short, when the file cannot be
+ * written, or when a tile that the window shares cannot be read back. What was written before the
+ * failure stays; stored samples outside the window are never lost. */
 IMG_EXPORT int32_t img_dump_buffer(img_handle handle, int32_t line, int32_t samp, int32_t nlines,
                                    int32_t nsamps, int32_t band, const void *buffer, int32_t stride,
                                    const void *fill);
