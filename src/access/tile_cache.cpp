@@ -27,9 +27,10 @@ entry *tile_at(const img_tile_cache *cache, std::int32_t col, std::int32_t row)
     return cell != nullptr ? *cell : nullptr;
 }
 
+// Takes a tile that is not the first off the list.
 void unlink(img_tile_cache *cache, entry *tile)
 {
-    (tile->newer != nullptr ? tile->newer->older : cache->mru) = tile->older;
+    tile->newer->older = tile->older;
     (tile->older != nullptr ? tile->older->newer : cache->lru) = tile->newer;
 }
 

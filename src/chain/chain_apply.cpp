@@ -17,7 +17,7 @@ public:
     // Returns false when memory is short. `with_spare`: there will be conversions.
     bool allocate(std::int32_t bits, bool with_spare)
     {
-        if (bits < 0 || bits > IMG_CHAIN_MAX_BITS) {
+        if (bits > IMG_CHAIN_MAX_BITS) {
             errno = ENOMEM;
             return false;
         }

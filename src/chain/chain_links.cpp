@@ -63,6 +63,18 @@ void link_added(img_handle handle)
     img_chain_of(handle).prepared = 0;
 }
 
+void put_remap_link(img_handle handle, std::int32_t link, const img_chain_remap_part &remap,
+                    void *arg, std::int32_t owns_arg)
+{
+    img_chain_link &slot = link_of(handle, link);
+    slot.kind = IMG_CHAIN_REMAP_FCN;
+    slot.arg = arg;
+    slot.owns_arg = owns_arg;
+    slot.remap = remap;
+    img_chain_update_out_bits(handle);
+    link_added(handle);
+}
+
 }  // namespace
 
 img_chain &img_chain_of(img_handle handle)
@@ -91,13 +103,9 @@ std::int32_t img_chain_add_remap_link(img_handle handle, std::int32_t link, std:
                                       img_chain_input_def_fn input_def_fn)
 {
     if (img_validate_img_handle(handle) != 0 || !is_slot(link) || process_fn == nullptr) return -1;
-    img_chain_link &slot = link_of(handle, link);
-    slot.kind = IMG_CHAIN_REMAP_FCN;
-    slot.arg = arg;
-    slot.owns_arg = 0;
-    slot.remap = {.out_bits = out_bits, .process_fn = process_fn, .input_def_fn = input_def_fn};
-    img_chain_update_out_bits(handle);
-    link_added(handle);
+    put_remap_link(handle, link,
+                   {.out_bits = out_bits, .process_fn = process_fn, .input_def_fn = input_def_fn},
+                   arg, 0);
     return 0;
 }
 
@@ -108,8 +116,8 @@ std::int32_t img_chain_add_lut_link(img_handle handle, std::int32_t link, std::i
     if (img_validate_img_handle(handle) != 0 || !is_slot(link) || !is_width(bits_in) ||
         !is_width(bits_out) || lut == nullptr)
         return -1;
-    img_chain_link &slot = link_of(handle, link);
     if (remap == 0) {
+        img_chain_link &slot = link_of(handle, link);
         slot.kind = IMG_CHAIN_LUT;
         slot.arg = nullptr;
         slot.owns_arg = 0;
@@ -117,14 +125,14 @@ std::int32_t img_chain_add_lut_link(img_handle handle, std::int32_t link, std::i
         link_added(handle);
         return 0;
     }
-    std::unique_ptr<img_chain_lut> record(
-        new (std::nothrow) img_chain_lut(lut_record(bits_in, bits_out, lut, owned)));
-    if (!record) return -1;
-    if (img_chain_add_remap_link(handle, link, bits_out, record.get(), img_chain_lut_remap,
-                                 img_chain_lut_input_definition) != 0)
-        return -1;
-    static_cast<void>(record.release());  // the link owns it now
-    slot.owns_arg = 1;
+    auto *const record =
+        new (std::nothrow) img_chain_lut(lut_record(bits_in, bits_out, lut, owned));
+    if (record == nullptr) return -1;
+    put_remap_link(handle, link,
+                   {.out_bits = bits_out,
+                    .process_fn = img_chain_lut_remap,
+                    .input_def_fn = img_chain_lut_input_definition},
+                   record, 1);
     return 0;
 }
 

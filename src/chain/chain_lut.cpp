@@ -1,7 +1,6 @@
 // Lookup tables at work: over a buffer, from one buffer to another, and for other widths.
 #include "chain/chain.h"
 
-#include <algorithm>
 #include <cstring>
 #include <memory>
 #include <new>
@@ -58,10 +57,6 @@ void img_chain_convert_lut(const std::uint16_t *src_table, const img_chain_lut *
 {
     const std::int32_t in_shift = dst->bits_in - src->bits_in;
     const std::int32_t out_shift = dst->bits_out - src->bits_out;
-    if (in_shift == 0 && out_shift == 0) {
-        if (src_table != dst_table) std::copy_n(src_table, dst->size, dst_table);
-        return;
-    }
     // Chains only widen; a narrower index or value takes the high bits of the wider one.
     for (std::int32_t i = 0; i < dst->size; ++i) {
         const std::int32_t from = in_shift >= 0 ? i >> in_shift : i << -in_shift;

@@ -21,7 +21,7 @@ std::int64_t trailer_offset(const img_desc *desc)
     constexpr std::int64_t last = INT32_MAX - std::int64_t{IMG_HELAVA_TRAILER_LENGTH};
     const std::int64_t band = std::int64_t{desc->nsamps} * desc->nlines;
     if (desc->nbands == 0) return 0;
-    if (band < -last || band > last) return -1;
+    if (band < 0 || band > last) return -1;
     const std::int64_t offset = band * desc->nbands;
     return offset <= last ? offset : -1;
 }

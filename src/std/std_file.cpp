@@ -16,7 +16,7 @@ constexpr std::int64_t MAX_OFFSET = std::numeric_limits<std::int32_t>::max();
 
 std::int64_t fitting(std::int64_t size)
 {
-    return size >= 0 && size <= MAX_OFFSET ? size : -1;
+    return size <= MAX_OFFSET ? size : -1;
 }
 
 std::int64_t product(std::int64_t a, std::int64_t b)
@@ -30,9 +30,9 @@ std::int64_t product(std::int64_t a, std::int64_t b, More... more)
     return product(product(a, b), more...);
 }
 
-std::int64_t sum(std::int64_t a, std::int64_t b)
+std::int64_t sum(std::int64_t known, std::int64_t size)  // `known` is no -1
 {
-    return a < 0 || b < 0 ? -1 : fitting(a + b);
+    return size < 0 ? -1 : fitting(known + size);
 }
 
 const img_type_hooks &hooks_of(const img_desc *desc)
@@ -54,7 +54,8 @@ bool gets_virtual_tiles(const img_desc *desc)
            desc->layout == IMG_LAYOUT_BSQ && img_type_of(desc).read_tiles == img_std_read_tiles;
 }
 
-// Fills in the tile counts and the tile size. Returns false when they do not fit.
+// Fills in the tile counts, which are not above the proven numbers of lines and samples of a plane,
+// and the tile size. Returns false when it does not fit.
 bool set_up_tiles(const img_desc *desc, img_std_file *file)
 {
     const std::int64_t planes = desc->layout == IMG_LAYOUT_TILED_BIP ? desc->nbands : 1;
@@ -62,7 +63,7 @@ bool set_up_tiles(const img_desc *desc, img_std_file *file)
         product(desc->tile_nlines, desc->tile_nsamps, desc->nbytes, planes);
     file->tiles_across = img_whole_tiles(desc->nsamps, desc->tile_nsamps);
     file->tiles_down = img_whole_tiles(desc->nlines, desc->tile_nlines);
-    if (tile_size == -1 || product(file->tiles_across, file->tiles_down) == -1) return false;
+    if (tile_size == -1) return false;
     file->tile_size = static_cast<std::int32_t>(tile_size);
     return true;
 }

@@ -116,7 +116,7 @@ std::int32_t read_stored_run(img_desc *desc, std::int32_t first_tile, std::int32
         desc->std_file->read_error = EBADF;  // there is no way to know what it holds
     } else if (desc->mem_image) {
         img_std_read_tiles(desc, first_tile, ntiles, band, run);
-    } else if (desc->cache_mb > 0 || desc->virtual_tiled != 0) {
+    } else if (desc->cache_mb != 0) {  // as it is for all virtual tiles
         // Behind a tile that cannot be read may lie one that waits in the cache, or lines that
         // the file does hold: each tile is asked for by itself.
         for (std::int32_t i = 0; i < ntiles; ++i)
@@ -136,6 +136,8 @@ std::int32_t img_read_tiled(img_desc *desc, std::int32_t line, std::int32_t samp
 {
     const tiled_region region(desc, line, samp, nlines, nsamps, stride);
     if (region.run() == nullptr) return img_fail_errno("img_read_tiled:malloc");
+    // Virtual tiles at the edges have no samples for all of their plane, but are cached whole.
+    if (desc->virtual_tiled != 0) std::fill_n(region.run(), region.run_length(), std::uint8_t{0});
     for (std::int32_t row = 0; row < region.tile_rows(); ++row) {
         if (img_load_tiles(desc->handle, region.first_tile(row), region.ntiles(), band,
                            region.run()) == -1)

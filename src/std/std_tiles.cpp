@@ -60,7 +60,7 @@ tile_buffer new_zero_plane(const img_desc *desc)
 // are not.
 bool is_in_memory(const img_desc *desc, std::int64_t offset, std::int32_t length)
 {
-    if (length >= 0 && offset + length - 1 <= desc->std_file->veof) return true;
+    if (offset + length - 1 <= desc->std_file->veof) return true;
     if (img_std_report_errors != 0) img_fail("img_std_read_tiles: read beyond virtual eof!!\n");
     return false;
 }
@@ -72,7 +72,7 @@ std::int32_t read_bytes(img_desc *desc, std::int64_t offset, std::uint8_t *buffe
 {
     if (desc->mem_image) {
         if (!is_in_memory(desc, offset, length)) return -1;
-        std::memcpy(buffer, desc->mem_image.get() + offset, static_cast<std::size_t>(length));
+        std::copy_n(desc->mem_image.get() + offset, length, buffer);
         return length;
     }
     const std::int32_t got = img_std_read_at(desc, offset, buffer, length);
@@ -176,7 +176,7 @@ std::int32_t read_interleaved(img_desc *desc, std::int32_t first_tile, std::int3
 
     const auto tile_size = static_cast<std::size_t>(desc->std_file->tile_size);
     auto left = static_cast<std::size_t>(std::clamp(got, 0, length));
-    for (std::int32_t tile = first_tile; left >= tile_size && tile < first_tile + ntiles; ++tile) {
+    for (std::int32_t tile = first_tile; left >= tile_size; ++tile) {
         split_tile_into_cache(desc, pixels, tile, band, buffer);
         pixels += tile_size;
         left -= tile_size;
