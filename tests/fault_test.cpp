@@ -1,14 +1,17 @@
 // Each call to the access method goes wrong and each request for memory is denied, one after the
 // other. Whatever it was: a call of the library that answers 0 has done its work, one that answers
-// -1 has said so, nothing stored is lost but what was being written, and afterwards the file is as
+// -1 has said why, nothing stored is lost but what was being written, and afterwards the file is as
 // good as ever.
+#include "support/effort.h"
 #include "support/fault_memory.h"
-#include "support/fault_method.h"
-#include "support/files.h"
-#include "support/test_image.h"
+#include "support/file_test.h"
+#include "support/layout_rules.h"
 
-#include <cerrno>
-#include <gtest/gtest.h>
+#include "chain/chain.h"
+#include "io/io_method.h"
+#include "std/std.h"
+
+#include <algorithm>
 #include <optional>
 
 #include <unistd.h>
@@ -19,19 +22,21 @@ struct fault_plan {
     std::optional<io_call> call;  // none: a request for memory
     fault what = fault::fails;
 };
-constexpr fault_plan PLANS[] = {{io_call::open},
-                                {io_call::close},
-                                {io_call::read},
-                                {io_call::read, fault::moves_none},
-                                {io_call::read, fault::moves_one},
-                                {io_call::read, fault::moves_half},
-                                {io_call::write},
-                                {io_call::write, fault::moves_none},
-                                {io_call::write, fault::moves_one},
-                                {io_call::write, fault::moves_half},
-                                {io_call::seek},
-                                {io_call::seek, fault::stands_off},
-                                {std::nullopt}};
+
+std::vector<fault_plan> all_plans()
+{
+    std::vector<fault_plan> plans{{io_call::open},
+                                  {io_call::close},
+                                  {io_call::unlink},
+                                  {io_call::seek},
+                                  {io_call::seek, fault::stands_off},
+                                  {std::nullopt}};
+    for (const io_call call : {io_call::read, io_call::write})
+        for (const fault what :
+             {fault::fails, fault::moves_none, fault::moves_one, fault::moves_half})
+            plans.push_back({call, what});
+    return plans;
+}
 
 void arm(const fault_plan &plan, int nth, bool lasting)
 {
@@ -39,138 +44,326 @@ void arm(const fault_plan &plan, int nth, bool lasting)
     memory_arm(plan.call ? 0 : nth, lasting);
 }
 
-bool went_wrong()
-{
-    return fault_fired() || memory_denied();
-}
-
+// A window of one band, or with `nsamps` 0 the run of `nlines` whole tiles from tile `line` on.
 struct step {
     bool writes;
     std::int32_t band, line, samp, nlines, nsamps;
+};
+constexpr bool R = false, W = true;
+
+// What the transfers of a layout say; the last one of a write that falls short.
+struct wording {
+    std::string read, write, written;
+};
+const std::string TILES_READ = "img_std_read_tiles", TILES_WRITTEN = "img_std_write_tiles";
+const wording WORDINGS[] = {
+    {"img_read_nontiled", "img_std_write_nontiled", "img_std_write_nontiled: "},
+    {"img_std_read_nontiled_interleaved", "img_std_write_nontiled_interleaved",
+     "img_std_write_nontiled_inter: "},
+    {TILES_READ, TILES_WRITTEN, TILES_WRITTEN + ":"},
+    {TILES_READ, TILES_WRITTEN, TILES_WRITTEN + ": "},
+    {TILES_READ, TILES_WRITTEN, TILES_WRITTEN + ": "}};
+
+// What is said when a bad call ends a load, or a dump, in a layout.
+std::string line_of(const bad_call &bad, std::int32_t layout, bool writing)
+{
+    const wording &words = WORDINGS[layout];
+    const std::string counts =
+        std::to_string(bad.got) + " of " + std::to_string(bad.asked) + " bytes ";
+    const bool moved = bad.got != -1 && bad.call != io_call::seek && !bad.grows;
+    if (writing && bad.call == io_call::read) return perror_line(TILES_READ + ":read", EIO);
+    if (!writing && moved) return words.read + ": " + counts + "read!!\n";
+    if (!writing) return perror_line(words.read + ":read", EIO);
+    if (!moved)
+        return perror_line(words.write + ":write", bad.grows && bad.got == 0 ? ENOSPC : EIO);
+    const std::string line = words.written + counts + "written!!\n";
+    return layout == IMG_LAYOUT_TILED ? line + perror_line(TILES_WRITTEN + ":partial write", EIO)
+                                      : line;
+}
+
+struct image_kind {
+    const char *name;
+    std::int32_t type;
+    test_geometry geometry;
+    std::int32_t header_length;  // or that of the trailer
 };
 
 // The life of one file, and what it must hold by then.
 class life {
 public:
-    life(const std::string &name, const test_geometry &geometry)
-        : m_name(name), m_geometry(geometry), m_model(geometry), m_doubtful(geometry)
+    life(const std::string &name, const image_kind &kind, const fault_plan &plan)
+        : m_name(name), m_type(kind.type), m_image(kind.geometry), m_plan(plan),
+          m_length(static_cast<std::size_t>(kind.header_length) + stored_bytes(m_image)),
+          m_model(m_image), m_doubt(m_image)
     {
+        std::filesystem::remove(name);
     }
-
-    void run(bool faults_last)
+    void run()
     {
-        m_image = create_test_file(m_name + "@fault", m_geometry);
-        m_created = m_image != -1;
-        EXPECT_TRUE(m_created || went_wrong());
-        run({{true, 1, 3, 2, 2, 5},
-             {false, 1, 3, 2, 2, 5},
-             {true, 0, 1, 0, 2, 3},
-             {false, 0, 1, 0, 2, 3}},
-            faults_last);
-        if (!m_created) return;
-        const auto printed_before = printed();
-        m_image = open_test_file(m_name + "@fault", IMG_OPEN_READ_WRITE);
-        EXPECT_TRUE(m_image != -1 || memory_denied() ||
-                    (fault_fired() && errno == 22 && printed() == printed_before));
-        run({{true, 1, 1, 1, 3, 4}, {false, 0, 0, 0, 5, 7}}, faults_last);
+        create(m_name);
+        m_created = m_handle != -1;
+        live({{W, 1, 3, 2, 2, 5}, {W, 0, 1, 0, 2, 3}, {R, 0, 1, 0, 2, 3}, {W, 0, 3, 0, 1, 0}});
+        if (m_created) open(IMG_OPEN_READ_WRITE);
+        live({{W, 1, 1, 1, 3, 4}, whole(0), {W, 1, 0, 0, 3, 0}, {R, 1, 2, 0, 2, 0}});
+        const bytes before = read_file(m_name);
+        if (m_created) open(IMG_OPEN_READ_ONLY);
+        live({whole(1), {R, 0, 0, 0, 4, 0}});
+        EXPECT_EQ(read_file(m_name), before);
+        create(m_name + "2");
+        if (m_handle != -1) remove(m_name + "2");
     }
     // Once nothing goes wrong any more.
-    void verify()
+    void verify(bool lasting)
     {
         EXPECT_EQ(open_descriptors(), 0);
-        m_image = m_created ? open_test_file(m_name, IMG_OPEN_READ_WRITE)
-                            : create_test_file(m_name, m_geometry);
-        run({}, false);  // which completes the file
-        m_image = open_test_file(m_name, IMG_OPEN_READ_ONLY);
-        EXPECT_NE(m_image, -1);
-        run({{false, 0, 0, 0, 5, 7}, {false, 1, 0, 0, 5, 7}}, false);
+        m_created ? open(IMG_OPEN_READ_WRITE) : create(m_name);
+        live({});  // which completes the file
+        EXPECT_GE(std::filesystem::file_size(m_name), m_length);
+        open(IMG_OPEN_READ_ONLY);
+        m_lost_samples = 0;
+        live({whole(0), whole(1)});
+        EXPECT_TRUE(lasting || m_lost_samples <= m_lost_tiles * m_tile_nlines * m_tile_nsamps);
     }
 
 private:
-    static off_t printed() { return ::lseek(STDERR_FILENO, 0, SEEK_CUR); }
-
-    // Goes through the steps and closes the image.
-    void run(const std::vector<step> &steps, bool faults_last)
+    bool is_short_of_memory() const { return !m_plan.call && memory_denied(); }
+    bool shifts() const { return m_plan.what == fault::stands_off; }
+    step whole(std::int32_t band) const { return {R, band, 0, 0, m_image.nlines, m_image.nsamps}; }
+    // Notes what the access method does meanwhile.
+    template <typename Action>
+    outcome watch(Action action)
     {
-        for (const step &each : steps)
-            if (m_image != -1) run(each);
-        const bool wrong_before = went_wrong();
-        EXPECT_EQ(img_closefile(m_image), 0);
-        // What cannot be written back from the cache by now goes unreported.
-        if (went_wrong() && (faults_last || !wrong_before))
-            for (const step &each : steps)
-                for_each_sample(each, [&](auto, auto... place) {
-                    if (each.writes) m_doubtful.at(place...) = 1;
-                });
+        const off_t printed = ::lseek(STDERR_FILENO, 0, SEEK_CUR);
+        take_bad_calls();
+        outcome seen;
+        seen.result = action();
+        seen.error = errno;
+        seen.text.resize(static_cast<std::size_t>(::lseek(STDERR_FILENO, 0, SEEK_CUR) - printed));
+        EXPECT_NE(::pread(STDERR_FILENO, seen.text.data(), seen.text.size(), printed), -1);
+        m_bad_calls = take_bad_calls();
+        return seen;
     }
-    void run(const step &at)
+
+    void create(const std::string &file)
     {
-        bytes buffer(static_cast<std::size_t>(at.nlines * at.nsamps * m_geometry.nbytes));
-        if (at.writes)
-            for (auto &byte : buffer) byte = ++m_last_byte;
-        const auto printed_before = printed();
-        const bool done =
-            (at.writes ? img_dump_buffer(m_image, at.line, at.samp, at.nlines, at.nsamps, at.band,
-                                         buffer.data(), at.nsamps, nullptr)
-                       : img_load_buffer(m_image, at.line, at.samp, at.nlines, at.nsamps, at.band,
-                                         buffer.data(), at.nsamps, nullptr)) == 0;
-        EXPECT_TRUE(done || went_wrong());
-        // The reading of virtual tiles speaks of lines that are not there yet.
-        EXPECT_TRUE(done == (printed() == printed_before) || memory_denied() ||
-                    img_find_image(m_image)->virtual_tiled != 0);
+        const std::string name = file + "@fault";
+        const test_geometry &it = m_image;
+        const outcome seen = watch([&] {
+            if (m_type == TEST_TYPE) return create_test_file(name, it);
+            return img_createfile(name.c_str(), it.nlines, it.nsamps, it.nbands, m_type,
+                                  it.tile_nsamps, it.tile_nlines, it.nbytes);
+        });
+        m_handle = seen.result;
+        if (m_handle != -1) img_chain_init(m_handle);
+        if (is_short_of_memory()) return;
+        EXPECT_TRUE(m_bad_calls.empty() == (m_handle != -1) || shifts());
+        EXPECT_EQ(seen.text, m_handle == -1 ? could_not_create(name) : "");
+    }
+    void open(std::int32_t flags)
+    {
+        const outcome seen = watch([&] { return open_test_file(m_name + "@fault", flags); });
+        m_handle = seen.result;
+        if (is_short_of_memory()) return;
+        EXPECT_TRUE(m_handle != -1 || (seen.error == 22 && !m_bad_calls.empty()));
+        EXPECT_EQ(seen.text, "");
+    }
+    void remove(const std::string &file)
+    {
+        img_desc *const desc = img_find_image(m_handle);
+        const outcome seen = watch([&] { return img_type_of(desc).delete_image(desc); });
+        EXPECT_EQ(seen.result, std::filesystem::exists(file) ? -1 : 0);
+        EXPECT_TRUE(seen.result == 0 || m_plan.call == io_call::unlink);
+        EXPECT_EQ(img_closefile(m_handle), 0);
+        EXPECT_EQ(seen.text, "");
+    }
+    // Goes through the steps and closes the image.
+    void live(const std::vector<step> &steps)
+    {
+        if (m_handle == -1) return;
+        for (const step &each : steps) act(each);
+        const int lost = close();
+        m_lost_tiles += lost;
+        for (const step &each : steps)
+            for_each_sample(each, [&](auto, auto... place) {
+                if (lost > 0 && each.writes && m_doubt.at(place...) == NO_DOUBT)
+                    m_doubt.at(place...) = PERHAPS_LOST;
+            });
+        EXPECT_LE(std::filesystem::file_size(m_name), m_length);
+    }
+    // Returns how many changed tiles could not be written back from the cache. The close says so
+    // for each, unless memory is short, and says nothing else.
+    int close()
+    {
+        const bool caches = img_find_image(m_handle)->tile_cache != nullptr;
+        outcome seen = watch([&] { return img_closefile(m_handle); });
+        EXPECT_EQ(seen.result, 0);
+        if (is_short_of_memory()) return 1;
+        int lost = 0;
+        for (const bad_call &bad : m_bad_calls)
+            if (const std::string line = told(seen.text, bad, true, is_interleaved(m_image));
+                caches && bad.planned && line != "") {
+                seen.text.erase(0, line.size());
+                ++lost;
+            }
+        EXPECT_EQ(seen.text, "");
+        return lost;
+    }
+
+    void act(const step &at)
+    {
+        const img_desc &desc = *img_find_image(m_handle);
+        m_tile_nlines = desc.tile_nlines;
+        m_tile_nsamps = desc.tile_nsamps;
+        if (at.nsamps == 0 && !img_is_tiled(&desc)) return;
+        bytes buffer(static_cast<std::size_t>(samples_of(at) * m_image.nbytes));
+        for (auto &byte : buffer)
+            if (at.writes) byte = m_last_byte = static_cast<std::uint8_t>(m_last_byte % 255 + 1);
+        const outcome seen = watch([&] { return transfer(at, buffer.data()); });
+        const bool done = seen.result == 0;
+        expect_told(seen.text, done, at.writes,
+                    img_is_tiled(&desc) && (at.nsamps != 0 || is_interleaved(m_image)));
+        const std::size_t high = at.nsamps == 0 && desc.swap != 0 ? 0 : 1;
         for_each_sample(at, [&](std::size_t i, auto... place) {
             const auto value = static_cast<std::uint16_t>(
-                m_geometry.nbytes == 1 ? buffer[i] : buffer[2 * i] | buffer[2 * i + 1] << 8);
-            if (at.writes) m_doubtful.at(place...) = done ? 0 : 1;
-            if (at.writes && done) m_model.at(place...) = value;
-            EXPECT_TRUE(!done || m_doubtful.at(place...) != 0 || value == m_model.at(place...));
+                m_image.nbytes == 1 ? buffer[i]
+                                    : buffer[2 * i + 1 - high] | buffer[2 * i + high] << 8);
+            std::uint16_t &expected = m_model.at(place...), &doubt = m_doubt.at(place...);
+            if (at.writes) doubt = done ? NO_DOUBT : WRITTEN_IN_PART;
+            if (at.writes && done) expected = value;
+            EXPECT_TRUE(!done || doubt != NO_DOUBT || value == expected);
+            if (doubt == PERHAPS_LOST && value != expected) ++m_lost_samples;
         });
     }
-    template <typename Visit>
-    static void for_each_sample(const step &at, Visit visit)
+    std::int32_t transfer(const step &at, std::uint8_t *data)
     {
-        for (std::int32_t i = 0; i < at.nlines * at.nsamps; ++i)
-            visit(static_cast<std::size_t>(i), at.band, at.line + i / at.nsamps,
-                  at.samp + i % at.nsamps);
+        const auto [writes, band, line, samp, nlines, nsamps] = at;
+        if (nsamps == 0)
+            return writes ? img_dump_tiles(m_handle, line, nlines, band, data)
+                          : img_load_tiles(m_handle, line, nlines, band, data);
+        return writes ? img_dump_buffer(m_handle, line, samp, nlines, nsamps, band, data, nsamps,
+                                        nullptr)
+                      : img_load_buffer(m_handle, line, samp, nlines, nsamps, band, data, nsamps,
+                                        nullptr);
+    }
+    // The first call that did not do what was asked ends a transfer, with a line that tells it. A
+    // write may meet the end of the file where it looks at what is there.
+    void expect_told(const std::string &text, bool done, bool writing, bool looks)
+    {
+        if (is_short_of_memory()) return;
+        const auto bad = std::ranges::find_if(
+            m_bad_calls, [=](const bad_call &each) { return each.planned || !writing; });
+        if (bad == m_bad_calls.end())
+            EXPECT_TRUE(done && text.empty()) << text;
+        else if (done)
+            EXPECT_TRUE(is_harmless(*bad) && text.empty()) << text;
+        else
+            EXPECT_TRUE(!text.empty() && told(text, *bad, writing, looks) == text) << text;
+    }
+    // A length that is not the file's has to be believed. Once the last pixel of a line is written
+    // the file may stand anywhere.
+    bool is_harmless(const bad_call &bad) const
+    {
+        if (bad.call != io_call::seek) return false;
+        return bad.asked == IMG_SEEK_END ? shifts() : m_image.layout == IMG_LAYOUT_BIP;
+    }
+    // Returns the line at the beginning of `text` if it tells of that call. A write that looks at
+    // what is stored may have sought that.
+    std::string told(const std::string &text, const bad_call &bad, bool writing, bool looks) const
+    {
+        const std::string looked = perror_line(TILES_READ + ":read", EIO);
+        if (writing && looks && bad.call == io_call::seek && text.starts_with(looked))
+            return looked;
+        const std::string line = line_of(bad, m_image.layout, writing);
+        return text.starts_with(line) ? line : "";
     }
 
+    std::int32_t samples_of(const step &at) const
+    {
+        return at.nlines * (at.nsamps != 0 ? at.nsamps : m_tile_nlines * m_tile_nsamps);
+    }
+    template <typename Visit>
+    void for_each_sample(const step &at, Visit visit)
+    {
+        const std::int32_t width = at.nsamps != 0 ? at.nsamps : m_tile_nsamps;
+        const std::int32_t height = at.nsamps != 0 ? at.nlines : m_tile_nlines;
+        for (std::int32_t i = 0; i < samples_of(at); ++i) {
+            std::int32_t line = at.line, samp = at.samp;
+            if (at.nsamps == 0) {
+                const std::int32_t across = img_whole_tiles(m_image.nsamps, width);
+                const std::int32_t tile = at.line + i / (height * width);
+                line = tile / across * height;
+                samp = tile % across * width;
+            }
+            line += i / width % height;
+            samp += i % width;
+            if (m_model.has(line, samp)) visit(static_cast<std::size_t>(i), at.band, line, samp);
+        }
+    }
+
+    enum : std::uint16_t { NO_DOUBT, WRITTEN_IN_PART, PERHAPS_LOST };
     std::string m_name;
-    test_geometry m_geometry;
+    std::int32_t m_type;
+    test_geometry m_image;
+    fault_plan m_plan;
+    std::size_t m_length;  // of the complete file
     bool m_created = false;
-    img_handle m_image = -1;
+    img_handle m_handle = -1;
+    std::vector<bad_call> m_bad_calls;
+    std::int32_t m_tile_nlines = 0, m_tile_nsamps = 0;
     std::uint8_t m_last_byte = 0;
-    model_image m_model;
-    model_image m_doubtful;  // 1: of a write that failed
+    model_image m_model, m_doubt;
+    int m_lost_tiles = 0, m_lost_samples = 0;
 };
 
-class Faults : public testing::TestWithParam<std::int32_t> {};  // its parameter is the layout
+class Faults : public FileTest, public testing::WithParamInterface<image_kind> {
+protected:
+    ~Faults() override
+    {
+        memory_arm(0);
+        img_cache_mb = 0;
+        img_default_tile_nsamps = img_default_tile_nlines = 128;
+    }
+};
 
 TEST_P(Faults, AreReportedAndLoseNothing)
 {
-    const scratch_folder folder;
     const stderr_capture quiet;
     img_default_tile_nsamps = 4;
     img_default_tile_nlines = 2;
-    const bool tiled = GetParam() >= IMG_LAYOUT_TILED;
-    test_geometry geometry{5, 7, 2, 1, tiled ? 4 : 0, tiled ? 2 : 0, GetParam()};
-    for (geometry.nbytes = 1; geometry.nbytes < 3; ++geometry.nbytes)
-        for (img_cache_mb = 0; img_cache_mb < 2; ++img_cache_mb)
-            for (const fault_plan &plan : PLANS)
-                for (const bool lasting : {false, true})
-                    for (int nth = 1;; ++nth) {
-                        life file(folder / "scene", geometry);
-                        arm(plan, nth, lasting);
-                        file.run(lasting);
-                        if (!went_wrong()) break;
-                        arm(plan, 0, false);
-                        file.verify();
-                        ASSERT_FALSE(HasFailure())
-                            << geometry.nbytes << " bytes, cache " << img_cache_mb << ", plan "
-                            << &plan - PLANS << (lasting ? " from " : " at ") << nth;
-                    }
-    img_cache_mb = 0;
+    image_kind kind = GetParam();
+    const int stride = 100 / rounds(100);
+    int first = 0;
+    for (const fault_plan &plan : all_plans())
+        for (int variant = 0; variant < 8; ++variant) {
+            kind.geometry.nbytes = 1 + variant % 2;
+            if (kind.type == IMG_TYPE_HELAVA && kind.geometry.nbytes == 2) continue;
+            img_cache_mb = variant / 2 % 2;
+            const bool lasting = variant / 4 != 0;
+            for (int nth = 1 + first++ % stride;; nth += stride) {
+                life file(m_file, kind, plan);
+                arm(plan, nth, lasting);
+                file.run();
+                if (!fault_fired() && !memory_denied()) break;
+                arm(plan, 0, false);
+                file.verify(lasting);
+                ASSERT_FALSE(HasFailure())
+                    << "call " << (plan.call ? static_cast<int>(*plan.call) : -1) << ", fault "
+                    << static_cast<int>(plan.what) << ", variant " << variant << ", number " << nth;
+            }
+        }
 }
 
-INSTANTIATE_TEST_SUITE_P(Layouts, Faults, testing::Range(0, 5));
+constexpr std::int32_t HEADER = TEST_HEADER_LENGTH;
+INSTANTIATE_TEST_SUITE_P(
+    Kinds, Faults,
+    testing::Values(image_kind{"bsq", TEST_TYPE, {5, 7, 2, 1, 0, 0, 0}, HEADER},
+                    image_kind{"bip", TEST_TYPE, {5, 7, 2, 1, 0, 0, 1}, HEADER},
+                    image_kind{"tiled", TEST_TYPE, {5, 7, 2, 1, 4, 2, 2}, HEADER},
+                    image_kind{"band_tiled", TEST_TYPE, {5, 7, 2, 1, 4, 2, 3}, HEADER},
+                    image_kind{"tiled_bip", TEST_TYPE, {5, 7, 2, 1, 4, 2, 4, 1}, HEADER},
+                    image_kind{"vitec_tiled", IMG_TYPE_VITEC, {10, 12, 2, 1, 8, 8, 2}, 244},
+                    image_kind{"vitec", IMG_TYPE_VITEC, {5, 7, 2, 1, 0, 0, 0}, 244},
+                    image_kind{"helava", IMG_TYPE_HELAVA, {5, 7, 2, 1, 0, 0, 0}, 16}),
+    [](const auto &each) { return each.param.name; });
 
 }  // namespace

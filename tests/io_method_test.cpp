@@ -1,5 +1,8 @@
 #include "io/io_method.h"
 
+#include "support/fault_memory.h"
+
+#include <cerrno>
 #include <gtest/gtest.h>
 #include <string>
 
@@ -55,6 +58,7 @@ TEST_F(IoMethodTable, AnswersForMissingOperations)
     EXPECT_EQ((std::array{bare.open("file", 0, 0), bare.close(3), bare.read(3, &byte, 1),
                           bare.write(3, &byte, 1), bare.seek(3, 0, 0), bare.unlink("file")}),
               (std::array{-1, -1, -1, -1, -1, -1}));
+    EXPECT_EQ(errno, ENOSYS);
 }
 
 TEST_F(IoMethodTable, SplitsNamesAtTheirFirstAtSign)
@@ -79,6 +83,10 @@ TEST_F(IoMethodTable, SplitsNamesAtTheirFirstAtSign)
         EXPECT_EQ(img_split_name(name, &split_filename, &split_method), 0);
         EXPECT_STREQ(split_filename.get(), filename) << name;
         EXPECT_EQ(split_method, method != nullptr ? img_lookup_io_method(method) : nullptr) << name;
+        memory_arm(1);
+        EXPECT_EQ(img_split_name(name, &split_filename, &split_method), -1);
+        EXPECT_STREQ(split_filename.get(), filename) << name;
+        memory_arm(0);
     }
 }
 

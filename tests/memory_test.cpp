@@ -1,105 +1,182 @@
-// Each request for memory on a load's way through the chain is denied, one after the other: the
-// call that makes it fails, everything is freed, and the next time all is well.
-#include "chain/chain.h"
+// Each request for memory is denied, one after the other, that one alone or all that follow as
+// well: the call that makes it fails as documented, everything is freed, and the next time all is
+// well.
 #include "support/fault_memory.h"
-#include "support/files.h"
-#include "support/stretch_model.h"
-#include "support/test_image.h"
 
-#include <cerrno>
-#include <gtest/gtest.h>
-#include <set>
-#include <sstream>
+#include "access/tile_cache.h"
+#include "chain/chain.h"
+#include "io/io_method.h"
+#include "support/file_test.h"
+
+#include <functional>
 
 namespace {
 
-// Calls `use` with its first request denied, then with the second, and so on: that one alone, or
-// all that follow as well; and each time once more with nothing denied. Returns what was printed,
-// line by line.
-template <typename Use>
-std::set<std::string> deny_each_request(Use use)
-{
-    stderr_capture capture;
-    bool denied = true;
-    for (const bool lasting : {true, false})
-        for (int nth = 1; denied || nth == 1; ++nth) {
-            memory_arm(nth, lasting);
-            use();
+using call = std::function<std::int32_t()>;
+
+class Memory : public FileTest {
+protected:
+    ~Memory() override { img_cache_mb = 0; }
+
+    img_handle create(const std::string &name)
+    {
+        if (m_type == TEST_TYPE) return create_test_file(name, m_geometry);
+        return img_createfile(name.c_str(), 2, 8, 1, m_type, 0, 0, m_geometry.nbytes);
+    }
+    // Opens the image, with the cache made but for the tile that calls move.
+    void prepare(std::int32_t cache_mb)
+    {
+        img_cache_mb = 0;
+        std::filesystem::remove(m_file);
+        img_closefile(create(m_name));
+        img_cache_mb = cache_mb;
+        m_image = img_openfile(m_name.c_str(), IMG_OPEN_READ_WRITE);
+        if (m_type == TEST_TYPE) img_chain_init(m_image);
+        if (cache_mb > 0) img_load_tiles(m_image, 0, 1, 0, m_buffer.data());
+    }
+    // Returns a letter for what the call answers and prints, by the request that is denied.
+    std::string denied_requests(const call &use, std::int32_t cache_mb, bool lasting)
+    {
+        std::string letters;
+        for (bool denied = true; denied;) {
+            prepare(cache_mb);
+            memory_arm(static_cast<int>(letters.size()) + 1, lasting);
+            outcome answer = outcome_of(use);
             denied = memory_denied();
             memory_arm(0);
-            use();
-            EXPECT_FALSE(testing::Test::HasFailure()) << (lasting ? "from " : "at ") << nth;
+            if (denied) {
+                letters += letter_of(answer);
+                img_closefile(std::max(answer.result, 1));
+                answer = outcome_of(use);
+            }
+            EXPECT_TRUE(answer.result >= 0 && answer.text == "") << answer;
+            img_closefile(std::max(answer.result, 1));
+            img_closefile(m_image);
+            EXPECT_EQ(img_handle_pool->next + open_descriptors(), 0);
         }
-    std::istringstream text(capture.text());
-    std::set<std::string> lines;
-    for (std::string line; std::getline(text, line);) lines.insert(line + "\n");
-    return lines;
-}
-
-// True when a call did its work. It may have failed for want of memory alone.
-bool done(std::int32_t result)
-{
-    EXPECT_TRUE(result >= 0 || memory_denied());
-    return result >= 0;
-}
-
-// A load of two-byte samples through the stretch, and then through links of all kinds.
-void use_chain(const std::string &name)
-{
-    const samples pixels{100, 200, 300, 400};
-    bytes buffer(8);
-    const img_handle image = img_createfile(name.c_str(), 1, 4, 1, IMG_TYPE_VITEC, 0, 0, 2);
-    if (!done(image)) return;
-    const auto load = [&] {
-        return done(img_load_buffer(image, 0, 0, 1, 4, 0, buffer.data(), 4, nullptr));
-    };
-    if (done(img_dump_buffer(image, 0, 0, 1, 4, 0, pixels.data(), 4, nullptr)) && load()) {
-        EXPECT_EQ(buffer[3], expected_stretch(pixels, 4, 0, 12, 8)[400]);
-        img_chain_init(image);
-        std::uint16_t table[1 << 14] = {};
-        done(img_chain_add_lut_link(image, 0, 12, 12, 0, new std::uint16_t[4096]{}, 1));
-        done(img_chain_add_lut_create_link(image, 1, nullptr, img_chain_create_16to8_lut, 2, 13, 8,
-                                           0, nullptr, 0));
-        done(img_chain_add_lut_link(image, 4, 14, 13, 1, table, 0));  // converts its table
-        done(img_chain_add_lut_link(image, 6, 13, 12, 1, table, 0));
-        load();
-        img_chain_init(image);
+        return letters;
     }
-    img_closefile(image);
-}
+    static char letter_of(outcome answer)
+    {
+        const auto no_memory = [](const std::string &what) { return perror_line(what, ENOMEM); };
+        const std::string cache = "Out of cache memory!\n";
+        const std::string table = "img_chain_add_lut_create_link: error mallocing lut!!!\n";
+        const std::string stretch =
+            "img_set_auto_16to8bit_mapdown: Error installing auto mapdown in image chain\n"
+            "DO_16_TO_8: Error in img_set_auto_16to8bit_mapdown()\n";
+        const std::pair<std::string, char> failures[] = {
+            {"Out of memory!!!\n", 'M'},
+            {stretch, 's'},
+            {table + stretch, 't'},
+            {table, 'T'},
+            {cache, 'X'},
+            {no_memory("img_std_read_nontiled_interleaved:malloc"), 'i'},
+            {no_memory("img_std_write_nontiled:malloc"), 'n'},
+            {no_memory("img_read_tiled:malloc"), 'r'},
+            {no_memory("img_std_write_tiled:malloc"), 'w'},
+            {no_memory("img_std_read_tiles:read"), 'e'},
+            {no_memory("img_load_buffer:malloc failed for merge buffer"), 'm'},
+            {no_memory("img_apply_img_chain:malloc LUT"), 'l'},
+            {no_memory("img_chain_create_stretch_lut_from_buffer:calloc") +
+                 "img_apply_img_chain: Error in IMG_CHAIN_LUT_FCN\n",
+             'h'},
+            {"img_apply_img_chain: Error in IMG_CHAIN_REMAP_FCN\n", 'f'}};
+        while (answer.text.starts_with(cache + cache)) answer.text.erase(0, cache.size());
+        if (answer.result >= 0) return answer.text.empty() ? '+' : answer.text == cache ? 'x' : '?';
+        if (answer.text.empty()) return answer.error == 22 ? '2' : '-';
+        if (answer.text.starts_with("img_createfile: could not create ")) return 'C';
+        for (const auto &[text, letter] : failures)
+            if (answer.text == text) return letter;
+        return '?';
+    }
 
-void use_merged_bands()
-{
-    const img_handle image = create_test_memory({.nbands = 3});
-    if (!done(image)) return;
-    img_find_image(image)->merge_bands = 1;
-    img_find_image(image)->merge_fn = [](auto...) { return 0; };
-    std::uint8_t sample;
-    done(img_load_buffer(image, 0, 0, 1, 1, 0, &sample, 1, nullptr));
-    img_closefile(image);
-}
+    std::int32_t m_type = 0;
+    test_geometry m_geometry;
+    img_handle m_image = -1;
+    std::array<std::uint16_t, 16> m_buffer{};
+};
 
-TEST(Memory, ShortageFailsTheCallThatNeedsIt)
+TEST_F(Memory, ShortageFailsTheCallThatNeedsIt)
 {
-    const scratch_folder folder;
-    const std::string name = folder / "scene";
-    std::set<std::string> lines = deny_each_request([&] {
-        use_chain(name);
-        use_merged_bands();
-    });
-    lines.erase("No more open images available!!!\n");  // only where the library starts up here
-    EXPECT_EQ(lines,
-              (std::set<std::string>{
-                  "DO_16_TO_8: Error in img_set_auto_16to8bit_mapdown()\n", "Out of memory!!!\n",
-                  "img_apply_img_chain: Error in IMG_CHAIN_LUT_FCN\n",
-                  "img_apply_img_chain: Error in IMG_CHAIN_REMAP_FCN\n",
-                  "img_chain_add_lut_create_link: error mallocing lut!!!\n",
-                  "img_createfile: could not create " + name + "!\n",
-                  "img_set_auto_16to8bit_mapdown: Error installing auto mapdown in image chain\n",
-                  perror_line("img_apply_img_chain:malloc LUT", ENOMEM),
-                  perror_line("img_chain_create_stretch_lut_from_buffer:calloc", ENOMEM),
-                  perror_line("img_load_buffer:malloc failed for merge buffer", ENOMEM),
-                  perror_line("img_std_write_nontiled:malloc", ENOMEM)}));
+    const call creates = [&] { return create(m_file + "2@fault"); };
+    const call opens = [&] { return img_openfile(m_name.c_str(), IMG_OPEN_READ_WRITE); };
+    const call loads = [&] {
+        return img_load_buffer(m_image, 0, 4, 2, 4, 0, m_buffer.data(), 4, nullptr);
+    };
+    const call dumps = [&] {
+        return img_dump_buffer(m_image, 0, 4, 2, 4, 0, m_buffer.data(), 4, nullptr);
+    };
+    const call loads_tile = [&] { return img_load_tiles(m_image, 1, 1, 0, m_buffer.data()); };
+    const call dumps_tile = [&] { return img_dump_tiles(m_image, 1, 1, 0, m_buffer.data()); };
+    const call loads_merged = [&] {
+        img_find_image(m_image)->merge_bands = 1;
+        img_find_image(m_image)->merge_fn = [](auto...) { return 0; };
+        return loads();
+    };
+    std::vector<std::uint16_t> table(1 << 14);
+    const call loads_linked = [&] {
+        img_chain_init(m_image);
+        const bool added =
+            img_chain_add_lut_create_link(m_image, 1, nullptr, img_chain_create_16to8_lut, 2, 13, 8,
+                                          0, nullptr, 0) == 0 &&
+            img_chain_add_lut_link(m_image, 4, 14, 13, 1, table.data(), 0) == 0 &&
+            img_chain_add_lut_link(m_image, 6, 13, 12, 1, table.data(), 0) == 0;
+        return added ? loads() : -1;
+    };
+    const call creates_in_memory = [&] { return create_test_memory(m_geometry); };
+    const call makes_cache = [] {
+        return img_tile_cache_destroy(img_tile_cache_create(1, 1, 1, 1), 0);
+    };
+    const call makes_pool = [] {
+        img_id_pool *const pool = img_pool_create(0, 2);
+        img_pool_free(pool);
+        return pool != nullptr ? 0 : -1;
+    };
+    const call splits_name = [] {
+        std::unique_ptr<char[]> filename;
+        const img_io_method *method;
+        return img_split_name("scene@fault", &filename, &method);
+    };
+    constexpr std::int32_t vitec = IMG_TYPE_VITEC, helava = IMG_TYPE_HELAVA;
+    const test_geometry lines{2, 8, 2, 1, 0, 0, 0}, pixels{2, 8, 2, 1, 0, 0, 1};
+    const test_geometry tiles{2, 8, 2, 1, 4, 2, 2}, mixed{2, 8, 2, 1, 4, 2, 4}, deep{2, 8, 1, 2};
+    const struct {
+        const call &use;
+        std::int32_t type;
+        const test_geometry &image;
+        std::int32_t cache_mb;
+        std::string once, lasting;
+    } cases[] = {{creates, vitec, lines, 0, "MMMMMC", "MMMMMC"},
+                 {creates, helava, lines, 0, "MMMMMCC", "MMMMMCC"},
+                 {creates, vitec, deep, 0, "MMCts", "MMCts"},
+                 {creates_in_memory, vitec, lines, 0, "MM--", "MM--"},
+                 {opens, vitec, lines, 0, "MM2MMM", "MM2MMM"},
+                 {opens, helava, lines, 0, "MM+22MMM", "MM222MMM"},
+                 {opens, vitec, deep, 0, "MM2ts", "MM2ts"},
+                 {splits_name, vitec, lines, 0, "-", "-"},
+                 {makes_pool, vitec, lines, 0, "--", "--"},
+                 {makes_cache, vitec, lines, 0, "--", "--"},
+                 {loads, vitec, lines, 0, "", ""},
+                 {loads, TEST_TYPE, pixels, 0, "i", "i"},
+                 {loads, TEST_TYPE, tiles, 0, "r", "r"},
+                 {loads, TEST_TYPE, mixed, 0, "r-", "r-"},
+                 {loads, TEST_TYPE, mixed, 1, "r-+xxxx", "r-xxxxx"},
+                 {loads, vitec, deep, 0, "-lh", "-lh"},
+                 {loads_merged, TEST_TYPE, lines, 0, "mmmm", "mmmm"},
+                 {loads_linked, vitec, deep, 0, "T--llh-f", "T--llh-f"},
+                 {loads_tile, TEST_TYPE, mixed, 1, "-+xxxx", "-xxxxx"},
+                 {dumps, vitec, deep, 0, "n", "n"},
+                 {dumps, TEST_TYPE, tiles, 0, "w", "w"},
+                 {dumps, TEST_TYPE, mixed, 0, "we--e", "we--e"},
+                 {dumps, TEST_TYPE, mixed, 1, "we+xxxx", "weXXXXX"},
+                 {dumps_tile, TEST_TYPE, mixed, 0, "--e", "--e"},
+                 {dumps_tile, TEST_TYPE, mixed, 1, "XX", "XX"}};
+    for (const auto &[use, type, image, cache_mb, once, lasting] : cases) {
+        m_type = type;
+        m_geometry = image;
+        EXPECT_EQ(denied_requests(use, cache_mb, false), once);
+        EXPECT_EQ(denied_requests(use, cache_mb, true), lasting);
+    }
 }
 
 }  // namespace

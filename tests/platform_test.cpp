@@ -1,13 +1,10 @@
 #include "io/platform.h"
+
+#include "io/io_method.h"
+#include "support/fault_system.h"
 #include "support/file_test.h"
 
-#include <chrono>
-#include <csignal>
-#include <thread>
-
 #include <fcntl.h>
-#include <sys/resource.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 namespace {
@@ -33,23 +30,18 @@ TEST_F(Platform, TranslatesOpenFlags)
     EXPECT_EQ(open_and_ask(0x8000), O_RDONLY);
     EXPECT_EQ(open_and_ask(1), O_WRONLY);
     EXPECT_EQ(open_and_ask(0x102), O_RDWR);
+    host.block_devices = true;
+    EXPECT_EQ(open_and_ask(0), O_RDONLY);
+    host = {};
     for (const std::int32_t unknown : {3, 0x303, 0x306, 0x10302, -1, INT32_MIN})
         EXPECT_EQ(open_and_ask(unknown), -1) << unknown;
     EXPECT_EQ(read_file(m_file), content);
+    for (const auto &[name, error] : {std::pair{"/dev/null", EINVAL}, {"/dev/missing", ENOENT}}) {
+        EXPECT_EQ(img_platform_open(name, 0, 0), -1);
+        EXPECT_EQ(errno, error);
+    }
     EXPECT_EQ(open_and_ask(0x201), O_WRONLY);
     EXPECT_EQ(read_file(m_file), bytes{});
-}
-
-TEST_F(Platform, RefusesWithoutWaitingWhatIsNoFile)
-{
-    ASSERT_EQ(::mkfifo(m_file.c_str(), 0600), 0);
-    const int lowest_free = ::dup(STDERR_FILENO);
-    ::close(lowest_free);
-    for (const std::string &name : {m_file, m_folder / "", std::string("/dev/null")})
-        for (const std::int32_t mode : {0, 1, 2})
-            EXPECT_EQ(img_platform_open(name.c_str(), mode, 0666), -1) << name << mode;
-    EXPECT_EQ(::dup(STDERR_FILENO), lowest_free);
-    ::close(lowest_free);
 }
 
 TEST_F(Platform, KeepsFilesApartFromStandardStreamsAndOtherPrograms)
@@ -77,52 +69,25 @@ TEST_F(Platform, KeepsFilesApartFromStandardStreamsAndOtherPrograms)
     EXPECT_EQ(open_and_ask(0, F_GETFD), FD_CLOEXEC);
 }
 
-TEST_F(Platform, TransfersGoOnAfterInterruptionsAndInPieces)
-{
-    struct sigaction interrupting {};  // without SA_RESTART: calls that wait fail with EINTR
-    interrupting.sa_handler = [](int) {};
-    ::sigaction(SIGUSR1, &interrupting, nullptr);
-    std::signal(SIGPIPE, SIG_IGN);
-    int ends[2];
-    ASSERT_EQ(::pipe(ends), 0);
-    constexpr std::uint32_t size = 30'000'000;  // many times what a pipe holds
-    bytes sent(size), received(size);
-    for (std::size_t i = 0; i < size; ++i) sent[i] = static_cast<std::uint8_t>(i * 7 >> 3);
-    std::thread reader([&] {
-        img_platform_read(ends[0], received.data(), size);
-        ::close(ends[0]);  // lets a write that is not read to its end fail
-    });
-    std::thread interrupter([&, writer = ::pthread_self()] {
-        for (int i = 0; i < 40; ++i) {
-            std::this_thread::sleep_for(std::chrono::microseconds(500));
-            ::pthread_kill(i % 2 == 0 ? reader.native_handle() : writer, SIGUSR1);
-        }
-    });
-    std::this_thread::sleep_for(std::chrono::milliseconds(4));  // the reader waits for its first
-    EXPECT_EQ(img_platform_write(ends[1], sent.data(), size), size);
-    interrupter.join();
-    ::close(ends[1]);
-    reader.join();
-    EXPECT_TRUE(received == sent);
-}
-
 TEST_F(Platform, TransfersReturnWhatWasMovedBeforeAnErrorOrTheEnd)
 {
     const std::int32_t fd = img_platform_open(m_file.c_str(), 0x102, 0600);
     bytes block(16, 5);
-    rlimit limit{};
-    ASSERT_EQ(::getrlimit(RLIMIT_FSIZE, &limit), 0);
-    const rlimit ten_bytes{10, limit.rlim_max};
-    std::signal(SIGXFSZ, SIG_IGN);
-    ::setrlimit(RLIMIT_FSIZE, &ten_bytes);
-    const std::array written{img_platform_write(fd, block.data(), 16),
-                             img_platform_write(fd, block.data(), 16)};
-    ::setrlimit(RLIMIT_FSIZE, &limit);
-    EXPECT_EQ(written, (std::array{10, -1}));
+    host.disk_size = 10;
+    for (const std::int32_t expected : {10, -1})
+        EXPECT_EQ(img_platform_write(fd, block.data(), 16), expected);
+    host = {};
     EXPECT_EQ(img_platform_seek(fd, 0, 0), 0);
-    EXPECT_EQ(img_platform_read(fd, block.data(), 16), 10);
-    EXPECT_EQ(img_platform_read(fd, block.data(), 16), 0);
+    for (const std::int32_t expected : {10, 0})
+        EXPECT_EQ(img_platform_read(fd, block.data(), 16), expected);
     EXPECT_EQ(img_platform_read(fd, block.data(), 0x80000000U), -1);
+    EXPECT_EQ(img_platform_write(fd, block.data(), 0x80000000U), -1);
+    EXPECT_EQ(img_platform_seek(fd, 0, 0), 0);
+    host.interrupts = true;
+    host.reads_left = 6;  // half of them interrupted, the last one fails
+    for (const std::int32_t expected : {6, -1})
+        EXPECT_EQ(img_platform_read(fd, block.data(), 16), expected);
+    host = {};
     img_platform_close(fd);
     EXPECT_EQ(img_platform_read(fd, block.data(), 16), -1);
 }
@@ -138,6 +103,8 @@ TEST_F(Platform, PositionsFit31Bits)
         EXPECT_EQ(img_platform_seek(fd, offset, whence), -1) << offset << " from " << whence;
     }
     img_platform_close(fd);
+    EXPECT_EQ(img_lookup_io_method("")->unlink(m_file.c_str()), 0);
+    EXPECT_FALSE(std::filesystem::exists(m_file));
 }
 
 }  // namespace

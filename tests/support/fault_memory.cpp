@@ -1,7 +1,6 @@
 #include "support/fault_memory.h"
 
 #include <cerrno>
-#include <cstddef>
 #include <new>
 
 namespace {
@@ -9,9 +8,11 @@ namespace {
 int requests_left = 0;
 bool denies_the_rest = false;
 bool denied = false;
+std::size_t requested = 0;
 
-bool denies()
+bool denies(std::size_t size)
 {
+    requested += size;
     if (requests_left == 0 || --requests_left != 0) return false;
     if (denies_the_rest) requests_left = 1;
     denied = true;
@@ -26,11 +27,17 @@ void memory_arm(int nth, bool lasting)
     requests_left = nth;
     denies_the_rest = lasting;
     denied = false;
+    requested = 0;
 }
 
 bool memory_denied()
 {
     return denied;
+}
+
+std::size_t memory_requested()
+{
+    return requested;
 }
 
 // The linker puts these in place of the non-throwing operator new and operator new[], which the
@@ -42,11 +49,11 @@ void *__real__ZnamRKSt9nothrow_t(std::size_t size, const std::nothrow_t &tag) no
 
 void *__wrap__ZnwmRKSt9nothrow_t(std::size_t size, const std::nothrow_t &tag) noexcept
 {
-    return denies() ? nullptr : __real__ZnwmRKSt9nothrow_t(size, tag);
+    return denies(size) ? nullptr : __real__ZnwmRKSt9nothrow_t(size, tag);
 }
 
 void *__wrap__ZnamRKSt9nothrow_t(std::size_t size, const std::nothrow_t &tag) noexcept
 {
-    return denies() ? nullptr : __real__ZnamRKSt9nothrow_t(size, tag);
+    return denies(size) ? nullptr : __real__ZnamRKSt9nothrow_t(size, tag);
 }
 }

@@ -4,6 +4,7 @@
 #include "io/platform.h"
 
 #include <cerrno>
+#include <utility>
 
 namespace {
 
@@ -14,29 +15,34 @@ struct {
     bool lasting = false;
     bool fired = false;
     std::map<io_call, int> calls;
+    std::vector<bad_call> bad_calls;
 } plan;
 int descriptors = 0;
 
 bool goes_wrong(io_call call)
 {
     const int number = ++plan.calls[call];
-    const bool wrong = call == plan.call && plan.nth > 0 &&
-                       (number == plan.nth || (plan.lasting && number > plan.nth));
-    if (wrong) plan.fired = true;
-    if (wrong) errno = EIO;
-    return wrong;
+    if (call != plan.call || plan.nth == 0 || number < plan.nth ||
+        (number > plan.nth && !plan.lasting))
+        return false;
+    plan.fired = true;
+    plan.bad_calls.push_back({call});
+    errno = EIO;
+    return true;
 }
 
 std::uint32_t shortened(std::uint32_t count)
 {
-    switch (plan.what) {
-    case fault::moves_none:
-        return 0;
-    case fault::moves_one:
-        return count > 1 ? 1 : 0;
-    default:
-        return count / 2;
-    }
+    if (plan.what == fault::moves_half) return count / 2;
+    return plan.what == fault::moves_one && count > 1 ? 1 : 0;
+}
+
+bool is_at_end(std::int32_t fd)
+{
+    const std::int32_t at = img_platform_seek(fd, 0, IMG_SEEK_CURRENT);
+    const std::int32_t end = img_platform_seek(fd, 0, IMG_SEEK_END);
+    img_platform_seek(fd, at, IMG_SEEK_START);
+    return at >= end;
 }
 
 std::int32_t fault_open(const char *filename, std::int32_t oflags, std::int32_t mode)
@@ -56,20 +62,34 @@ std::int32_t fault_close(std::int32_t fd)
 
 std::int32_t fault_read(std::int32_t fd, void *buffer, std::uint32_t count)
 {
-    if (!goes_wrong(io_call::read)) return img_platform_read(fd, buffer, count);
-    return plan.what == fault::fails ? -1 : img_platform_read(fd, buffer, shortened(count));
+    const auto asked = static_cast<std::int32_t>(count);
+    const bool wrong = goes_wrong(io_call::read);
+    const bool fails = wrong && plan.what == fault::fails;
+    const std::int32_t got =
+        fails ? -1 : img_platform_read(fd, buffer, wrong ? shortened(count) : count);
+    if (wrong) plan.bad_calls.pop_back();
+    if (got != asked)
+        plan.bad_calls.push_back({io_call::read, asked, got, fails || !is_at_end(fd)});
+    return got;
 }
 
 std::int32_t fault_write(std::int32_t fd, const void *buffer, std::uint32_t count)
 {
     if (!goes_wrong(io_call::write)) return img_platform_write(fd, buffer, count);
-    return plan.what == fault::fails ? -1 : img_platform_write(fd, buffer, shortened(count));
+    bad_call &bad = plan.bad_calls.back();
+    bad.asked = static_cast<std::int32_t>(count);
+    bad.grows = count == 1 && *static_cast<const std::uint8_t *>(buffer) == 0;
+    if (plan.what != fault::fails) bad.got = img_platform_write(fd, buffer, shortened(count));
+    return bad.got;
 }
 
 std::int32_t fault_seek(std::int32_t fd, std::int32_t offset, std::int32_t whence)
 {
     if (!goes_wrong(io_call::seek)) return img_platform_seek(fd, offset, whence);
-    return plan.what == fault::fails ? -1 : img_platform_seek(fd, offset + 1, whence);
+    bad_call &bad = plan.bad_calls.back();
+    bad.asked = whence;
+    if (plan.what != fault::fails) bad.got = img_platform_seek(fd, offset + 1, whence);
+    return bad.got;
 }
 
 std::int32_t fault_unlink(const char *filename)
@@ -88,12 +108,17 @@ void fault_register()
 void fault_arm(io_call call, int nth, fault what, bool lasting)
 {
     fault_register();
-    plan = {call, nth, what, lasting, false, {}};
+    plan = {call, nth, what, lasting, false, {}, {}};
 }
 
 bool fault_fired()
 {
     return plan.fired;
+}
+
+std::vector<bad_call> take_bad_calls()
+{
+    return std::exchange(plan.bad_calls, {});
 }
 
 int calls_of(io_call call)

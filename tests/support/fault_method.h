@@ -4,6 +4,7 @@
 
 #include <cstdint>
 #include <map>
+#include <vector>
 
 enum class io_call { open, close, read, write, seek, unlink };
 
@@ -15,6 +16,15 @@ enum class fault {
     stands_off,  // seek: the file stands, and is said to stand, one byte further
 };
 
+// A call that failed, fell short or went elsewhere.
+struct bad_call {
+    io_call call;
+    std::int32_t asked = 0;  // bytes of a read or write, whence of a seek
+    std::int32_t got = -1;   // what it answered
+    bool planned = true;     // false: a read that met the end of the file
+    bool grows = false;      // the write of one zero byte
+};
+
 // Registers the method; once per process, later calls do nothing.
 void fault_register();
 // Lets the `nth` call of that kind from now on go wrong, and every later one if `lasting`.
@@ -22,6 +32,8 @@ void fault_register();
 void fault_arm(io_call call, int nth, fault what = fault::fails, bool lasting = false);
 // True when a call went wrong since fault_arm.
 bool fault_fired();
+// The bad calls since fault_arm or the last taking.
+std::vector<bad_call> take_bad_calls();
 // Calls since fault_arm.
 int calls_of(io_call call);
 // Descriptors that were opened and not closed since the process began.

@@ -3,11 +3,15 @@
 #ifndef IMG_TEST_FILE_TEST_H
 #define IMG_TEST_FILE_TEST_H
 
+#include "chain/chain.h"
 #include "support/fault_method.h"
 #include "support/files.h"
+#include "support/layout_rules.h"
 #include "support/test_image.h"
 
+#include <algorithm>
 #include <array>
+#include <bit>
 #include <cerrno>
 #include <gtest/gtest.h>
 #include <ostream>
@@ -122,6 +126,62 @@ inline bytes helava_file(const test_geometry &image, std::size_t nsamples,
     put_word(file, nsamples + 8, image.nlines, little_endian);
     put_word(file, nsamples + 12, 0x48411484, little_endian);
     return file;
+}
+
+// Gives the bytes from `first` to `end` values that tell where they lie.
+inline bytes numbered(bytes content, std::int64_t first, std::size_t end)
+{
+    for (auto at = static_cast<std::size_t>(first); at < end; ++at)
+        content[at] = static_cast<std::uint8_t>(at * 7 + at / 256);
+    return content;
+}
+
+// Returns a VITec file with numbered bytes after the image block.
+inline file_image vitec(test_geometry image, std::size_t length, const vitec_variant &variant = {})
+{
+    image.layout = has_tiles(image) ? IMG_LAYOUT_TILED : IMG_LAYOUT_BSQ;
+    image.swap = (std::endian::native == std::endian::little) != variant.little_endian ? 1 : 0;
+    const std::int64_t block = std::int64_t{variant.link} + 4;
+    return {image, block + variant.header_length,
+            numbered(vitec_file(image, length, variant), std::max<std::int64_t>(block, 112) + 68,
+                     length)};
+}
+
+// Reads of an open image what is where mistakes would show: windows and tiles at its corners.
+inline void expect_reads(const file_image &it, img_handle image)
+{
+    const test_geometry &at = it.image;
+    std::array<std::int32_t, 5> answers{0, 0, 0, 0, img_query_num_bands(image)};
+    img_query_dimension(image, &answers[0], &answers[1]);
+    img_query_tile_size(image, &answers[2], &answers[3]);
+    EXPECT_EQ(answers,
+              (std::array{at.nlines, at.nsamps, at.tile_nsamps, at.tile_nlines, at.nbands}));
+    img_chain_init(image);  // two-byte samples come as they are
+    reader expected(it);
+    const auto expect = [&expected](const bytes &wanted, auto read) {
+        bytes buffer(wanted.size(), UNTOUCHED);
+        EXPECT_EQ(read(buffer.data()), expected.fell_short() ? -1 : 0);
+        EXPECT_EQ(buffer, wanted);
+    };
+    const auto read_band = [&](std::int32_t band) {
+        for (const std::int32_t line : {-1, 0, 1, at.nlines - 1})
+            for (const std::int32_t samp : {0, at.nsamps - 1})
+                for (const std::int32_t nlines : {1, 2})
+                    expect(expected.window(band, line, samp, nlines, 5), [&](auto *buffer) {
+                        return img_load_buffer(image, line, samp, nlines, 5, band, buffer, 5,
+                                               &FILL);
+                    });
+        const std::int32_t ntiles = expected.ntiles();
+        for (const std::int32_t tile : {0, 1, ntiles - 2, ntiles - 1})
+            if (tile >= 0 && tile < ntiles)
+                expect(expected.tile(band, tile),
+                       [&](auto *buffer) { return img_load_tiles(image, tile, 1, band, buffer); });
+    };
+    const std::string text = printed_by([&] {
+        if (at.nbands > 0) read_band(0);
+        if (at.nbands > 1) read_band(at.nbands - 1);
+    });
+    EXPECT_EQ(text, expected.text());
 }
 
 #endif

@@ -4,6 +4,7 @@
 
 #include <cstdint>
 #include <random>
+#include <utility>
 
 class random_numbers {
 public:
@@ -22,6 +23,21 @@ public:
 
 private:
     std::mt19937 m_engine;
+};
+
+// The arguments of one of the 7^n calls that n arguments allow which lie at an edge of their range,
+// just beyond it, or nowhere near. Consecutive calls have little in common.
+class extreme_arguments {
+public:
+    extreme_arguments(int call, int calls) : m_which(call * 10007 % calls) {}
+    std::int32_t next(std::int32_t edge)
+    {
+        const std::int32_t extremes[] = {INT32_MIN, -1, 0, 1, edge, edge + 1, INT32_MAX};
+        return extremes[std::exchange(m_which, m_which / 7) % 7];
+    }
+
+private:
+    int m_which;
 };
 
 #endif

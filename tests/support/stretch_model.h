@@ -17,7 +17,7 @@ inline constexpr std::pair<std::size_t, std::size_t> COUNTING_BINS[] = {
     {0, 126},   {1, 253},    {2, 506},     {5, 1013},   {10, 2027}, {20, 4055},
     {41, 8110}, {81, 16220}, {163, 32440}, {327, 64880}};
 
-// The table for a histogram of 1 << `bits_in` counters; `bits_out` is not above `bits_in`.
+// The table for a histogram of 1 << `bits_in` counters.
 inline samples expected_stretch(const counters &histogram, int bits_in, int bits_out)
 {
     const auto [first, end] = COUNTING_BINS[bits_in - 1];
@@ -36,8 +36,9 @@ inline samples expected_stretch(const counters &histogram, int bits_in, int bits
     samples lut;
     for (std::size_t value = 0; value < histogram.size(); ++value) {
         const double above = static_cast<double>(value) - static_cast<double>(low);
-        const double narrowed = std::floor(std::trunc(above * gain) / (1 << (bits_in - bits_out)));
-        lut.push_back(static_cast<std::uint16_t>(std::clamp(narrowed, 0.0, (1 << bits_out) - 1.0)));
+        const double rescaled =
+            std::floor(std::ldexp(std::trunc(above * gain), bits_out - bits_in));
+        lut.push_back(static_cast<std::uint16_t>(std::clamp(rescaled, 0.0, (1 << bits_out) - 1.0)));
     }
     return lut;
 }

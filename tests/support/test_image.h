@@ -42,18 +42,15 @@ public:
                                           static_cast<std::size_t>(geometry.nsamps))
     {
     }
-    bool has(std::int32_t line, std::int32_t samp) const
+    const test_geometry &geometry() const { return m_geometry; }
+    bool has(std::int64_t line, std::int64_t samp) const
     {
         return line >= 0 && line < m_geometry.nlines && samp >= 0 && samp < m_geometry.nsamps;
     }
-    std::uint16_t &at(std::int32_t band, std::int32_t line, std::int32_t samp)
+    std::uint16_t &at(std::int64_t band, std::int64_t line, std::int64_t samp)
     {
-        const auto index =
-            (static_cast<std::size_t>(band) * static_cast<std::size_t>(m_geometry.nlines) +
-             static_cast<std::size_t>(line)) *
-                static_cast<std::size_t>(m_geometry.nsamps) +
-            static_cast<std::size_t>(samp);
-        return m_samples[index];
+        const auto index = (band * m_geometry.nlines + line) * m_geometry.nsamps + samp;
+        return m_samples[static_cast<std::size_t>(index)];
     }
 
 private:

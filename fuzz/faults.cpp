@@ -1,0 +1,25 @@
+// An image is created, written, read and closed, again and again, on a disk that goes wrong in
+// between; what a call was not writing when that happened must be as it was.
+#include "checked_image.h"
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size)
+{
+    const fuzz_run run;
+    fuzz_input in({data, size});
+    const std::string name = "file@memory";
+    open_image image = checked_create(in, name, 0);
+    while (!in.ended() && image.handle != -1) {
+        for (int left = in.below(8); left > 0; --left)
+            disk.faults.push_back({in.below(32), in.below(DISK_FAULTS)});
+        for (int left = in.below(8); left > 0; --left) checked_transfer(in, image, true);
+        checked_close(image, true);
+        image = in.below(4) == 0 ? checked_create(in, name, 0, true)
+                                 : checked_open(name, IMG_OPEN_READ_WRITE, 0, true);
+        checked_transfer(in, image, true);
+        disk.faults.clear();
+        if (image.handle != -1) checked_close(image);
+        image = checked_open(name, IMG_OPEN_READ_WRITE, 0);
+        for (int left = in.below(4); left > 0; --left) checked_transfer(in, image);
+    }
+    return 0;
+}

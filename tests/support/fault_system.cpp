@@ -1,0 +1,75 @@
+#include "support/fault_system.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <ctime>
+
+#include <sys/stat.h>
+#include <unistd.h>
+
+namespace {
+
+template <typename Transfer>
+ssize_t interruptible(std::size_t count, Transfer transfer)
+{
+    static bool interrupted = false;
+    if (!host.interrupts) return transfer(count);
+    interrupted = !interrupted;
+    if (!interrupted) return transfer(std::min<std::size_t>(count, 3));
+    errno = EINTR;
+    return -1;
+}
+
+}  // namespace
+
+// The linker puts these in place of the system's calls, and calls those __real_.
+extern "C" {
+
+int __real_open(const char *name, int flags, ...);
+ssize_t __real_read(int fd, void *buffer, std::size_t count);
+ssize_t __real_write(int fd, const void *buffer, std::size_t count);
+int __real_fstat(int fd, struct stat *status);
+std::time_t __real_time(std::time_t *now);
+std::tm *__real_localtime_r(const std::time_t *time, std::tm *local);
+
+int __wrap_open(const char *name, int flags, mode_t mode)
+{
+    const auto open = [=](auto) { return __real_open(name, flags, mode); };
+    return static_cast<int>(interruptible(0, open));
+}
+
+ssize_t __wrap_read(int fd, void *buffer, std::size_t count)
+{
+    if (host.reads_left > 0 && (host.reads_left == 1 || --host.reads_left == 1)) {
+        errno = EIO;
+        return -1;
+    }
+    return interruptible(count, [=](std::size_t part) { return __real_read(fd, buffer, part); });
+}
+
+ssize_t __wrap_write(int fd, const void *buffer, std::size_t count)
+{
+    const auto write = [=](std::size_t part) { return __real_write(fd, buffer, part); };
+    if (host.writes_left > 0 && --host.writes_left == 0)
+        ::_exit(write(host.half_done ? count / 2 : count) == -1 ? -1 : host.last_words);
+    if (host.disk_size == -1) return interruptible(count, write);
+    return limited(RLIMIT_FSIZE, host.disk_size, [=] { return write(count); });
+}
+
+int __wrap_fstat(int fd, struct stat *status)
+{
+    const int result = host.has_no_status ? -1 : __real_fstat(fd, status);
+    if (host.block_devices) status->st_mode = S_IFBLK;
+    return result;
+}
+
+std::time_t __wrap_time(std::time_t *now)
+{
+    return host.has_no_time ? -1 : __real_time(now);
+}
+
+std::tm *__wrap_localtime_r(const std::time_t *time, std::tm *local)
+{
+    return host.has_no_local_time ? nullptr : __real_localtime_r(time, local);
+}
+}

@@ -1,0 +1,35 @@
+// An operating system on which much goes wrong.
+#ifndef IMG_TEST_FAULT_SYSTEM_H
+#define IMG_TEST_FAULT_SYSTEM_H
+
+#include <csignal>
+#include <sys/resource.h>
+
+// What the library's calls of the system meet with; the default is nothing.
+struct fault_host {
+    bool interrupts = false;  // every other call, and the others move three bytes at most
+    bool has_no_status = false, has_no_time = false, has_no_local_time = false;
+    bool block_devices = false;  // all files are said to be such
+    int reads_left = 0;          // from the last of them on reads fail; 0: none does
+    int disk_size = -1;          // bytes that a file may have; -1: as many as it wants
+    int writes_left = 0;         // the process ends at the last of them; 0: it does not
+    bool half_done = false;      // that one moves half of what it should
+    int last_words = 0;          // what the process returns then
+};
+inline fault_host host;
+
+// Returns what `action` does with a resource of the process limited.
+template <typename Action>
+auto limited(decltype(RLIMIT_FSIZE) resource, int value, Action action)
+{
+    std::signal(SIGXFSZ, SIG_IGN);
+    rlimit saved{};
+    ::getrlimit(resource, &saved);
+    const rlimit lowered{static_cast<rlim_t>(value), saved.rlim_max};
+    ::setrlimit(resource, &lowered);
+    const auto result = action();
+    ::setrlimit(resource, &saved);
+    return result;
+}
+
+#endif

@@ -1,0 +1,324 @@
+// What an operating system, a disk, other programs and a sudden end may do to a file.
+#include "io/platform.h"
+#include "std/std.h"
+#include "support/effort.h"
+#include "support/fault_system.h"
+#include "support/file_test.h"
+#include "support/random.h"
+
+#include <atomic>
+#include <csignal>
+#include <thread>
+
+#include <fcntl.h>
+#include <malloc.h>
+#include <sys/stat.h>
+#include <sys/time.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+namespace {
+
+// An image of every layout and sample size.
+std::vector<test_geometry> images()
+{
+    std::vector<test_geometry> all;
+    for (std::int32_t layout = 0; layout < 5; ++layout)
+        for (const std::int32_t nbytes : {1, 2}) {
+            const std::int32_t tile = layout < IMG_LAYOUT_TILED ? 0 : 4;
+            all.push_back({5, 6, 2, nbytes, tile, tile, layout});
+        }
+    return all;
+}
+
+// A line of one band, and the bytes of its samples.
+struct image_line {
+    std::int32_t band, line, nsamps;
+    bytes row;
+};
+
+// All lines, each with a value of its own: the last band first, so that whole pixels are there.
+std::vector<image_line> lines_of(const test_geometry &image)
+{
+    std::vector<image_line> lines;
+    for (std::int32_t i = 9; i >= 0; --i)
+        lines.push_back({i / 5, i * 2 % 5, image.nsamps,
+                         bytes(static_cast<std::size_t>(image.nsamps * image.nbytes),
+                               static_cast<std::uint8_t>(i + 1))});
+    return lines;
+}
+
+std::int32_t dump(img_handle handle, const image_line &at)
+{
+    return img_dump_buffer(handle, at.line, 0, 1, at.nsamps, at.band, &at.row[0], at.nsamps,
+                           nullptr);
+}
+
+std::int32_t load(img_handle handle, const image_line &at, bytes *row)
+{
+    row->assign(at.row.size(), 0xEE);
+    return img_load_buffer(handle, at.line, 0, 1, at.nsamps, at.band, &(*row)[0], at.nsamps,
+                           nullptr);
+}
+
+// Loads a line that may be there in part: what is not its own is 0.
+void expect_no_other(img_handle handle, const image_line &at, bool whole = false)
+{
+    bytes row;
+    bool own = load(handle, at, &row) == 0;
+    EXPECT_TRUE(own || !whole);
+    for (std::size_t i = 0; own && i < row.size(); ++i)
+        EXPECT_TRUE(row[i] == at.row[i] || (row[i] == 0 && !whole));
+}
+
+// What a host sees of an image that it creates and writes, and the file that it leaves.
+struct life {
+    std::vector<bool> written;
+    bytes loaded, file;
+    bool operator==(const life &) const = default;
+};
+
+life live(const std::string &name, const test_geometry &image, std::int32_t type = TEST_TYPE)
+{
+    life seen;
+    const img_handle handle =
+        type == TEST_TYPE
+            ? create_test_file(name, image)
+            : img_createfile(name.c_str(), 5, 6, 2, type, image.tile_nsamps, image.tile_nlines, 1);
+    for (const image_line &at : handle != -1 ? lines_of(image) : std::vector<image_line>{}) {
+        bytes row;
+        load(handle, at, &row);
+        seen.loaded.insert(seen.loaded.end(), row.begin(), row.end());
+        seen.written.push_back(dump(handle, at) == 0);
+        host.last_words += seen.written.back() ? 1 : 0;
+        EXPECT_EQ(img_find_image(handle)->std_file->veof, std::filesystem::file_size(name));
+    }
+    img_closefile(handle);
+    seen.file = read_file(name);
+    return seen;
+}
+
+class System : public FileTest {
+protected:
+    ~System() override { host = {}; }
+
+    static auto descriptors_in_use()
+    {
+        return std::distance(std::filesystem::directory_iterator("/proc/self/fd"), {});
+    }
+    static void expect_refused(const std::string &name)
+    {
+        const auto in_use = descriptors_in_use();
+        for (const std::int32_t mode : {0, 1, 2}) EXPECT_EQ(opening(name, mode), REFUSED_QUIETLY);
+        for (const std::int32_t type : {IMG_TYPE_VITEC, IMG_TYPE_HELAVA})
+            EXPECT_EQ(creating(name, type, {}).text, could_not_create(name));
+        EXPECT_EQ(descriptors_in_use(), in_use) << name;
+    }
+    // Of a file that is opened afterwards, what was written is there.
+    static void expect_kept(const std::string &name, const test_geometry &image,
+                            std::vector<bool> written)
+    {
+        const outcome opened = outcome_of([&] { return open_test_file(name, IMG_OPEN_READ_ONLY); });
+        EXPECT_TRUE(opened.result == 0 || (opened == REFUSED_QUIETLY && written.empty()));
+        const stderr_capture quiet;
+        written.resize(10);
+        for (std::size_t i = 0; i < 10; ++i)
+            expect_no_other(opened.result, lines_of(image)[i], written[i]);
+        img_closefile(opened.result);
+    }
+};
+
+TEST_F(System, RefusesWhatItCannotOpen)
+{
+    const bytes file = vitec_file({});
+    write_file(m_file, file);
+    std::filesystem::create_directory(m_folder / "folder");
+    ASSERT_EQ(::symlink("loop", (m_folder / "loop").c_str()), 0);
+    ASSERT_EQ(::mkfifo((m_folder / "pipe").c_str(), 0600), 0);
+    for (const char *const name : {"folder", "missing/scene", "loop", "pipe", "scene/scene"})
+        expect_refused(m_folder / name);
+    expect_refused(m_folder / std::string(300, 'n'));
+    expect_refused("/dev/full");
+
+    const uid_t user = ::geteuid();  // the superuser has permission for all files
+    ::chmod(m_file.c_str(), 0);
+    ::chmod((m_folder / "").c_str(), 0755);
+    ASSERT_EQ(user == 0 ? ::seteuid(65534) : 0, 0);
+    expect_refused(m_file);
+    ASSERT_EQ(::seteuid(user), 0);
+    ::chmod(m_file.c_str(), 0600);
+
+    const int input = ::dup(STDIN_FILENO);
+    const std::string text = printed_by([&] {
+        ::close(STDIN_FILENO);
+        for (const int descriptors : {0, 3})  // with 3, what is opened in its place cannot stay
+            limited(RLIMIT_NOFILE, descriptors, [&] {
+                EXPECT_EQ(img_openfile(m_file.c_str(), 0), -1);
+                return img_createfile(m_file.c_str(), 1, 1, 1, IMG_TYPE_HELAVA, 0, 0, 1);
+            });
+        EXPECT_EQ(::dup(input), STDIN_FILENO);
+    });
+    EXPECT_EQ(text, could_not_create(m_file) + could_not_create(m_file));
+    ::close(input);
+
+    write_file(m_file, file);
+    fault_arm(io_call::seek, 1, fault::fails, true);
+    expect_refused(m_name);
+    write_file(m_file, file);
+    host.has_no_status = true;
+    expect_refused(m_file);
+}
+
+TEST_F(System, OpensLeaveNothingBehind)
+{
+    img_closefile(creating(m_file, IMG_TYPE_VITEC, {4, 4, 1, 2}).result);
+    write_file(m_folder / "cut", vitec_file({}, 150));
+    const auto open_both = [&] {
+        for (const std::string &name : {m_file, m_folder / "cut"}) {
+            const img_handle handle = img_openfile(name.c_str(), IMG_OPEN_READ_WRITE);
+            EXPECT_EQ(handle, name == m_file ? 0 : -1);
+            img_closefile(handle);
+        }
+    };
+    open_both();
+    const auto memory = ::mallinfo2().uordblks;  // always 0 where a sanitizer looks for leaks
+    const auto in_use = descriptors_in_use();
+    for (int i = rounds(100'000); i > 0; --i) open_both();
+    EXPECT_LE(::mallinfo2().uordblks, memory + 4096);
+    EXPECT_EQ(descriptors_in_use(), in_use);
+}
+
+TEST_F(System, FilesBearTheLocalTimeOrNone)
+{
+    for (bool *const missing : {&host.has_no_time, &host.has_no_local_time}) {
+        *missing = true;
+        EXPECT_EQ(img_closefile(creating(m_file, IMG_TYPE_VITEC, {}).result), 0);
+        *missing = false;
+        const bytes file = read_file(m_file);
+        ASSERT_EQ(file.size(), 245U);
+        EXPECT_EQ(bytes(&file[16], &file[22]), bytes(6));
+    }
+    ::setenv("TZ", "EST5", 1);  // where the day has another hour
+    const auto date = img_platform_local_time();
+    ::setenv("TZ", "EST-7", 1);
+    EXPECT_NE(img_platform_local_time(), date);
+}
+
+TEST_F(System, ResultsAreTheSameWhateverInterruptsCallsAndSwallowsMessages)
+{
+    struct sigaction handler = {}, saved_handler;
+    handler.sa_handler = [](int) {};  // without SA_RESTART
+    ::sigaction(SIGALRM, &handler, &saved_handler);
+    const int saved = ::dup(STDERR_FILENO);
+    for (const test_geometry &image : images()) {
+        life expected;
+        EXPECT_NE(printed_by([&] { expected = live(m_file, image); }), "");
+        ::close(STDERR_FILENO);
+        const life without_messages = live(m_file, image);
+        const int full = ::open("/dev/full", O_WRONLY);
+        const itimerval often{{0, 100}, {0, 100}}, never{};
+        ::setitimer(ITIMER_REAL, &often, nullptr);
+        for (int i = rounds(100); i > 0; --i) EXPECT_TRUE(live(m_file, image) == expected);
+        ::setitimer(ITIMER_REAL, &never, nullptr);
+        host.interrupts = true;
+        EXPECT_TRUE(live(m_file, image) == expected);
+        host = {};
+        ::dup2(saved, STDERR_FILENO);
+        EXPECT_EQ(full, STDERR_FILENO);
+        EXPECT_TRUE(without_messages == expected);
+    }
+    ::close(saved);
+    ::sigaction(SIGALRM, &saved_handler, nullptr);
+}
+
+TEST_F(System, FullDiskCostsNoLineThatWasWritten)
+{
+    for (const test_geometry &image : images()) {
+        bool complete = false;
+        for (host.disk_size = 0; !complete; host.disk_size += 12) {  // whole pixels
+            life seen;
+            const std::string text = printed_by([&] { seen = live(m_file, image); });
+            const bool created = !seen.written.empty();
+            complete = created && std::ranges::count(seen.written, false) == 0;
+            const char *const method = image.tile_nlines == 0 ? "nontiled" : "tiles";
+            const std::string line =
+                created ? std::string("img_std_write_") + method : could_not_create(m_file);
+            EXPECT_EQ(text.find(line) == text.npos, complete);
+            expect_kept(m_file, image, seen.written);
+        }
+    }
+}
+
+TEST_F(System, SuddenEndCostsNoLineThatWasWritten)
+{
+    constexpr int none = 99;
+    // Returns the lines that were written before the end, or `none` when there was no end.
+    const auto end_at = [this](int step, std::int32_t type, const test_geometry &image) {
+        if (const pid_t child = ::fork(); child != 0) {
+            int status = 0;
+            ::waitpid(child, &status, 0);
+            return WIFEXITED(status) ? WEXITSTATUS(status) : none;
+        }
+        host.writes_left = 1 + step / 2;
+        host.half_done = step % 2 != 0;
+        ::close(STDERR_FILENO);
+        live(m_file, image, type);
+        ::_exit(none);
+    };
+    std::vector<std::pair<std::int32_t, test_geometry>> cases{{IMG_TYPE_VITEC, {5, 6, 2}},
+                                                              {IMG_TYPE_VITEC, {5, 6, 2, 1, 8, 8}},
+                                                              {IMG_TYPE_HELAVA, {5, 6, 2}}};
+    for (const test_geometry &image : images())
+        if (image.nbytes == 2) cases.emplace_back(TEST_TYPE, image);
+    for (const auto &[type, image] : cases)
+        for (int step = 0, done = 0; done != none; step += 11 / rounds(10)) {
+            done = end_at(step, type, image);
+            expect_kept(m_file, image,
+                        std::vector<bool>(static_cast<std::size_t>(std::min(done, 10)), true));
+        }
+}
+
+TEST_F(System, DeliversNothingForeignFromAFileThatOthersChange)
+{
+    const stderr_capture quiet;
+    random_numbers random(1);
+    for (const bool during_calls : {false, true})
+        for (const test_geometry &image : images()) {
+            const bytes content = live(m_file, image).file;
+            const img_handle handle = open_test_file(m_file, IMG_OPEN_READ_WRITE);
+            const int fd = ::open(m_file.c_str(), O_RDWR);
+            std::size_t step = 0;
+            const auto change = [&] {
+                step += 97;
+                EXPECT_EQ(::ftruncate(fd, static_cast<off_t>(step % content.size())), 0);
+                EXPECT_NE(::pwrite(fd, &content[0], step % 3 * content.size() / 2, 0), -1);
+            };
+            std::atomic<bool> over = !during_calls;
+            std::thread other([&] {
+                while (!over) change();
+            });
+            const std::vector<image_line> lines = lines_of(image);
+            for (int i = rounds(5000); i > 0; --i) {
+                const image_line &at = lines[random.below(10)];
+                if (!during_calls) change();
+                expect_no_other(handle, at);
+                const bytes before = during_calls ? bytes() : read_file(m_file);
+                const std::int32_t result = dump(handle, at);
+                if (during_calls) continue;
+                EXPECT_EQ(result, 0);
+                bytes after = read_file(m_file);
+                EXPECT_EQ(img_find_image(handle)->std_file->veof, static_cast<int>(after.size()));
+                after.resize(before.size());
+                std::size_t changes = 0;
+                for (std::size_t k = 0; k < before.size(); ++k) changes += before[k] != after[k];
+                EXPECT_LE(changes, at.row.size());
+                expect_no_other(handle, at, image.layout != IMG_LAYOUT_BIP);
+            }
+            over = true;
+            other.join();
+            ::close(fd);
+            img_closefile(handle);
+        }
+}
+
+}  // namespace
