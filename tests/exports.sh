@@ -20,7 +20,7 @@ expect 'exported symbols' "$(echo "$declared" | sed 's/ /@@IMGFILE_0 /g')" "$exp
 dynamic=$("$readelf" -d "$library")
 expect 'SONAME' libimgfile.so.0 "$(echo "$dynamic" | sed -n 's/.*(SONAME).*\[\(.*\)\]/\1/p')"
 expect 'needed beyond the runtimes' '' "$(echo "$dynamic" | sed -n 's/.*(NEEDED).*\[\(.*\)\]/\1/p' |
-    grep -Ev '^(libstdc\+\+|libgcc_s|libm|libc|ld-linux[a-z0-9_-]*)\.so\.[0-9]+$' | joined)"
+    grep -Ev '^(libstdc\+\+|libgcc_s|libm|libc|libasan|libubsan|ld-linux[a-z0-9_-]*)\.so\.[0-9]+$' | joined)"
 
 # The library is built without exceptions: what throws when memory is short must not be called.
 expect 'calls that throw' '' "$("$nm" -D --undefined-only "$library" | awk '{ print $2 }' |

@@ -40,6 +40,7 @@ TEST(Library, StartsWithTheFirstOpen)
         EXPECT_EQ(opening("no such file"), REFUSED_QUIETLY);
         EXPECT_EQ(img_io_method_count, 1);
         EXPECT_EQ(img_find_io_method(""), 0);
+        EXPECT_EQ(img_io_method_table[0].get_value(), 0.0);
         for (std::size_t slot = 0; slot <= 44; ++slot)
             EXPECT_EQ(img_type_table[slot].enabled, slot == 0 || slot == 8 ? 1 : 0) << slot;
     }
