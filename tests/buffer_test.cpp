@@ -224,17 +224,19 @@ TEST(Buffers, OfUnclippedImagesAreLeftToTheTypeAndMayMergeItsBands)
     img_type_table[TEST_TYPE].read = note_request;
     img_type_table[TEST_TYPE].write = note_request;
     desc->unclipped = desc->merge_bands = 1;
-    desc->merge_fn = [](auto, auto, auto, auto, auto, auto, auto nbands, auto *bands,
-                        auto *buffer) {
+    desc->merge_fn = [](auto line, auto samp, auto nlines, auto nsamps, auto stride, auto nbytes,
+                        auto nbands, auto *bands, auto *buffer) {
+        EXPECT_EQ((std::array{line, samp, nlines, nsamps, stride, nbytes}),
+                  (std::array{0, 0, 2, 1, 3, 1}));
         for (std::int32_t band = 0; band < nbands; ++band)
             *buffer = static_cast<std::uint8_t>(*buffer * 10 + *bands[band]);
         return -1;  // is not looked at
     };
     bytes buffer(5, UNTOUCHED);
     EXPECT_EQ(img_query_num_bands(image), 1);
-    EXPECT_EQ(load(image, {-4, 5, 2, 2}, 0, buffer.data(), 3), 0);
-    EXPECT_EQ(buffer, (bytes{123, 0, UNTOUCHED, 0, 0}));
-    EXPECT_EQ(asked, (std::array{-4, 5, 2, 2, 2}));
+    EXPECT_EQ(load(image, {-4, 5, 2, 1}, 0, buffer.data(), 3), 0);
+    EXPECT_EQ(buffer, (bytes{123, UNTOUCHED, UNTOUCHED, 0, UNTOUCHED}));
+    EXPECT_EQ(asked, (std::array{-4, 5, 2, 1, 2}));
     answer = 7;
     EXPECT_EQ(load(image, {-4, 5, 2, 2}, 0, buffer.data(), 3), 7);
     desc->merge_fn = nullptr;

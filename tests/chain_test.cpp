@@ -170,6 +170,19 @@ TEST_F(Chain, IsAppliedOncePerPreparation)
     expect_unprepared();
 }
 
+TEST_F(Chain, LinksThatChangeTheDefinitionGetBuffers)
+{
+    enum { ALLOC, FINAL, PLACE, KEEP = 4, FREE };
+    const std::array<std::int32_t, 3> luts[] = {
+        {1, 12, 12}, {2, 12, 10}, {4, 10, 10}, {5, 10, 9}, {7, 9, 8}};
+    for (const auto &[link, bits_in, bits_out] : luts) add_lut(link, bits_in, bits_out, link > 1);
+    EXPECT_NE(prepare(), buffer.data());
+    EXPECT_EQ(of_links(&img_chain_link::placement),
+              (codes{PLACE, PLACE, ALLOC, PLACE, PLACE, ALLOC, PLACE, FINAL, FINAL, FINAL}));
+    EXPECT_EQ(of_links(&img_chain_link::release_input),
+              (codes{KEEP, KEEP, FREE, KEEP, KEEP, FREE, KEEP, FREE, KEEP, KEEP}));
+}
+
 TEST_F(Chain, ALinkThatFailsOrDoesNotFitEndsTheLoad)
 {
     const auto refused = [this] {

@@ -7,29 +7,7 @@
 
 namespace {
 
-class Open : public FileTest {
-protected:
-    // Creates or opens the file while a call goes wrong. False: there are not that many.
-    bool notices(bool create, std::int32_t type, io_call call, int nth, fault what) const
-    {
-        // Calls for a type that is asked before, and would not take the file anyway.
-        const int harmless = create || type == IMG_TYPE_VITEC ? 0 : call == io_call::seek ? 2 : 1;
-        const bytes before = read_file(m_file);
-        fault_arm(call, nth, what);
-        const outcome seen = create ? creating(m_name, type, {9, 5}) : opening(m_name);
-        const bool fired = fault_fired();
-        fault_arm(call, 0);
-        img_closefile(seen.result);
-        const outcome refused{-1, create ? seen.error : 22, create ? could_not_create(m_name) : ""};
-        const bool succeeds = !fired || nth <= harmless;
-        const bool may = call == io_call::seek && what != fault::fails;  // a position off by one
-        EXPECT_TRUE(seen.result == 0 ? succeeds || may : !succeeds && seen == refused) << seen;
-        EXPECT_TRUE(seen.result == -1 || read_file(m_file).size() == (type == 0 ? 289U : 61U));
-        EXPECT_TRUE(create || read_file(m_file) == before);
-        EXPECT_EQ(open_descriptors(), 0);
-        return fired;
-    }
-};
+using Open = FileTest;
 
 TEST(Library, StartsWithTheFirstOpen)
 {
@@ -150,16 +128,6 @@ TEST_F(Open, GivesImagesOfOneByteIdentityTablesAndThoseOfTwoTheStretch)
         EXPECT_EQ(std::to_string(seen.result) + seen.text, "-1" + text);
     }
     img_mapdown_slot = 9;
-}
-
-TEST_F(Open, NoticesWhatGoesWrongAndLeavesNothingBehind)
-{
-    img_type_table[TEST_TYPE].enabled = 0;
-    for (const std::int32_t type : {IMG_TYPE_VITEC, IMG_TYPE_HELAVA})
-        for (const io_call call : {io_call::open, io_call::seek, io_call::read, io_call::write})
-            for (const fault what : {fault::fails, fault::moves_one, fault::moves_half})
-                for (const bool create : {true, false})
-                    for (int nth = 1; notices(create, type, call, nth, what); ++nth) {}
 }
 
 }  // namespace

@@ -1,7 +1,6 @@
-// Whole tiles: the runs that there are, the cache in between, and tiles not stored as such.
+// Whole tiles: the runs that there are, and what they need.
 #include "std/std.h"
 
-#include "access/tile_cache.h"
 #include "support/file_test.h"
 #include "support/guarded_buffer.h"
 #include "support/random.h"
@@ -14,42 +13,15 @@ namespace {
 
 class Tiles : public FileTest {
 protected:
-    // Opens an image whose stored bytes are 1, 2, 3, ..., as many of them as the file has.
-    img_desc *open(const test_geometry &image, std::int32_t cache_mb = 0,
-                   std::size_t length = INT32_MAX, std::int32_t tile = 2)
+    img_desc *open(const test_geometry &image, std::int32_t cache_mb = 0)
     {
         img_closefile(create_test_file(m_file, image));
-        bytes file = read_file(m_file);
-        std::iota(file.begin() + TEST_HEADER_LENGTH, file.end(), std::uint8_t{1});
-        file.resize(std::min(file.size(), TEST_HEADER_LENGTH + length));
-        write_file(m_file, file);
         img_cache_mb = cache_mb;
-        img_default_tile_nsamps = img_default_tile_nlines = tile;
+        img_default_tile_nsamps = img_default_tile_nlines = 2;
         m_desc = img_find_image(open_test_file(m_name, IMG_OPEN_READ_WRITE));
+        img_default_tile_nsamps = img_default_tile_nlines = 128;
         img_cache_mb = 0;
         return m_desc;
-    }
-    bytes stored() const
-    {
-        const bytes file = read_file(m_file);
-        return {file.begin() + TEST_HEADER_LENGTH, file.end()};
-    }
-    // Returns what a load of a run of planes leaves in a buffer of sevens.
-    bytes load(std::int32_t first_tile, std::int32_t ntiles, std::int32_t band,
-               std::int32_t result = 0)
-    {
-        bytes buffer(static_cast<std::size_t>(ntiles) * img_std_plane_size(m_desc), 7);
-        fault_arm(io_call::read, 0);
-        printed_by([&] {
-            EXPECT_EQ(img_load_tiles(m_desc->handle, first_tile, ntiles, band, buffer.data()),
-                      result);
-        });
-        return buffer;
-    }
-    std::int32_t dump(std::int32_t first_tile, std::int32_t band, const bytes &planes)
-    {
-        const auto ntiles = static_cast<std::int32_t>(planes.size() / img_std_plane_size(m_desc));
-        return img_dump_tiles(m_desc->handle, first_tile, ntiles, band, planes.data());
     }
     // Expects results of both transfers, and that nothing is printed.
     static void expect(std::int32_t loaded, std::int32_t dumped, img_handle image,
@@ -124,69 +96,6 @@ TEST_F(Tiles, NeedABufferAndAnImageThatTakesThem)
     expect(-1, -1, image, plane.data());
     img_type_table[TEST_TYPE] = type;
     close();
-}
-
-TEST_F(Tiles, AreNotCachedAfterAllWhenTheFirstDoesNotFit)
-{
-    open({1, 1025, 1, 2, 0, 0, IMG_LAYOUT_BSQ, 1}, 1, INT32_MAX, 1024);  // two virtual tiles
-    for (const int reads : {1, 2}) {
-        const bytes planes = load(0, 2, 0);
-        EXPECT_EQ(bytes(planes.begin(), planes.begin() + 4), (bytes{1, 2, 3, 4}));
-        EXPECT_EQ(bytes(planes.end() - (2 << 20), planes.end() + 4 - (2 << 20)),
-                  (bytes{1, 2, 7, 7}));
-        EXPECT_EQ(m_desc->tile_cache, nullptr) << reads;
-        m_desc->cache_mb = 4;
-    }
-    bytes planes(4 << 20, 9), row(2050, 9);
-    planes[2 << 20] = row[2048] = 8;
-    EXPECT_EQ(dump(0, 0, planes), 0);
-    close();
-    EXPECT_EQ(stored(), row);
-}
-
-TEST_F(Tiles, OfInterleavedPixelsBringTheOtherBandsAlong)
-{
-    open({1, 4, 3, 1, 2, 1, IMG_LAYOUT_TILED_BIP}, 1);
-    load(0, 1, 0);
-    EXPECT_EQ(dump(1, 1, {50, 51}), 0);
-    img_tile_cache *const cache = m_desc->tile_cache;
-    const struct {
-        std::int32_t tile, band;
-        bytes plane;
-        int reads;
-    } loads[] = {{0, 1, {2, 5}, 0},
-                 {0, 2, {3, 6}, 0},
-                 {1, 0, {7, 10}, 1},
-                 {1, 2, {9, 12}, 0},
-                 {1, 1, {50, 51}, 0}};  // changed: the file has older bytes
-    for (const auto &[tile, band, plane, reads] : loads) {
-        EXPECT_EQ(load(tile, 1, band), plane);
-        EXPECT_EQ(calls_of(io_call::read), reads);
-    }
-    const bytes plane{60, 61};
-    EXPECT_EQ(img_std_write_tiles(m_desc, 1, 1, 0, plane.data()), 0);
-    EXPECT_EQ(stored(), (bytes{1, 2, 3, 4, 5, 6, 60, 8, 9, 61, 11, 12}));
-    EXPECT_EQ(m_desc->tile_cache, cache);
-    fault_arm(io_call::write, 0);
-    close();
-    EXPECT_EQ(calls_of(io_call::write), 1);  // what is as the file has it is not written
-    EXPECT_EQ(stored(), (bytes{1, 2, 3, 4, 5, 6, 60, 50, 9, 61, 51, 12}));
-}
-
-TEST_F(Tiles, BehindOneThatIsMissingAreKept)
-{
-    open({2, 6, 1, 1, 2, 2, IMG_LAYOUT_TILED}, 1, 4);
-    EXPECT_EQ(load(0, 3, 0, -1), (bytes{1, 2, 3, 4, 7, 7, 7, 7, 7, 7, 7, 7}));
-    EXPECT_EQ(img_tile_cache_has(m_desc->tile_cache, 1, 0), 0);
-    EXPECT_EQ(dump(2, 0, {50, 51, 52, 53}), 0);
-    const bytes row{60, 61, 62, 63}, fill{9};
-    for (const std::int32_t before : {0, 1}) {
-        img_std_report_errors = before;
-        EXPECT_EQ(img_dump_buffer(m_desc->handle, 0, 1, 1, 4, 0, row.data(), 4, fill.data()), 0);
-        EXPECT_EQ(img_std_report_errors, before);
-    }
-    close();
-    EXPECT_EQ(stored(), (bytes{1, 60, 3, 4, 61, 62, 9, 9, 63, 51, 52, 53}));
 }
 
 TEST(PixelInterleaving, FollowsTheBandMapAndPassesOverMissingPlanes)
