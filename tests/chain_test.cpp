@@ -253,11 +253,13 @@ TEST_F(Chain, NoDefinitionMakesItLeaveItsTablesAndBuffers)
     EXPECT_EQ(refusal([this] { return load(); }), "");
     img_chain_init(image);
 
+    add_lut(3, 12, 12, false);
     img_chain_add_remap_link(image, 5, 31, nullptr, do_nothing, nullptr);
     def.nbits = 31;
     EXPECT_NE(prepare(), nullptr);
     EXPECT_EQ(refusal(img_apply_img_chain, image),
               perror_line("img_apply_img_chain:malloc LUT", ENOMEM));
+    img_chain_remove_link(image, 3);
     img_chain_remove_link(image, 5);
     img_chain_add_remap_link(image, 5, 12, &wide, do_nothing, ask);
     def.nbits = 12;

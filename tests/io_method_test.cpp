@@ -59,6 +59,11 @@ TEST_F(IoMethodTable, AnswersForMissingOperations)
                           bare.write(3, &byte, 1), bare.seek(3, 0, 0), bare.unlink("file")}),
               (std::array{-1, -1, -1, -1, -1, -1}));
     EXPECT_EQ(errno, ENOSYS);
+    EXPECT_EQ(bare.lend, nullptr);
+    EXPECT_EQ(img_offer_lending("bar", nullptr), -1);
+    EXPECT_EQ(add(nullptr), -1);
+    EXPECT_EQ(img_register_default_io_method("bare"), -1);
+    EXPECT_EQ(bare.lend, nullptr);
 }
 
 TEST_F(IoMethodTable, SplitsNamesAtTheirFirstAtSign)

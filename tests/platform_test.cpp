@@ -89,13 +89,56 @@ TEST_F(Platform, TransfersReturnWhatWasMovedBeforeAnErrorOrTheEnd)
         EXPECT_EQ(img_platform_read(fd, block.data(), 16), expected);
     host = {};
     img_platform_close(fd);
-    EXPECT_EQ(img_platform_read(fd, block.data(), 16), -1);
+    for (const std::int32_t none : {fd, -1, 0}) {
+        errno = 0;
+        EXPECT_EQ((std::array{img_platform_read(none, block.data(), 16),
+                              img_platform_write(none, block.data(), 16),
+                              img_platform_seek(none, 0, 0), img_platform_close(none)}),
+                  (std::array{-1, -1, -1, -1}));
+        EXPECT_EQ(errno, EBADF);
+    }
+}
+
+TEST_F(Platform, AsksForTheHeadOfAFileOnce)
+{
+    const bytes content = numbered(bytes(600), 0, 600);
+    write_file(m_file, content);
+    const std::int32_t fd = img_platform_open(m_file.c_str(), 2, 0);
+    const auto read_at = [=](std::int32_t at, std::uint32_t count) {
+        bytes block(count);
+        img_platform_seek(fd, at, 0);
+        block.resize(static_cast<std::size_t>(img_platform_read(fd, &block[0], count)));
+        EXPECT_EQ(img_platform_seek(fd, 0, 1), at + std::ssize(block));
+        return block;
+    };
+    const auto part = [&](std::ptrdiff_t at, std::ptrdiff_t count) {
+        return bytes(content.begin() + at,
+                     content.begin() + std::min<std::ptrdiff_t>(at + count, 600));
+    };
+    for (const auto &[at, count] :
+         {std::pair{0, 4}, {112, 68}, {0, 600}, {510, 3}, {590, 20}, {700, 1}})
+        EXPECT_EQ(read_at(at, static_cast<std::uint32_t>(count)),
+                  at > 600 ? bytes() : part(at, count));
+    EXPECT_EQ(img_platform_seek(fd, 0, 2), 600);  // and from now on it is asked for
+    write_file(m_file, bytes(10));
+    EXPECT_EQ(read_at(4, 20), bytes(6));
+    EXPECT_EQ(img_platform_seek(fd, 0, 2), 10);
+    ::close(fd);
+    EXPECT_EQ(img_platform_seek(fd, 0, 2), -1);
+    EXPECT_EQ(img_platform_close(fd), -1);
+
+    std::vector<std::int32_t> all;
+    for (int i = 0; i < 65; ++i) all.push_back(img_platform_open(m_file.c_str(), 0, 0));
+    EXPECT_EQ(std::pair(all.back(), errno), (std::pair{-1, EMFILE}));
+    all.pop_back();
+    for (const std::int32_t each : all) EXPECT_EQ(img_platform_close(each), 0);
 }
 
 TEST_F(Platform, PositionsFit31Bits)
 {
-    const std::int32_t fd = img_platform_open(m_file.c_str(), 0x102, 0600);
+    write_file(m_file, {});
     ASSERT_EQ(::truncate(m_file.c_str(), INT32_MAX), 0);
+    const std::int32_t fd = img_platform_open(m_file.c_str(), 2, 0600);
     EXPECT_EQ(img_platform_seek(fd, 0, 2), INT32_MAX);
     for (const auto &[offset, whence] :
          {std::array{8, 1}, {INT32_MAX, 1}, {1, 2}, {0, 3}, {0, -1}}) {

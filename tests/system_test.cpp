@@ -282,6 +282,7 @@ TEST_F(System, DeliversNothingForeignFromAFileThatOthersChange)
 {
     const stderr_capture quiet;
     random_numbers random(1);
+    host.seconds_later = 0;
     for (const bool during_calls : {false, true})
         for (const test_geometry &image : images()) {
             const bytes content = live(m_file, image).file;

@@ -21,7 +21,8 @@ TEST(TileCache, HasRoomForTheBudgetOrForEveryCell)
         {1, 0, 2, 1, 0},          {0, 4, 2, 1, -1},
         {1, -4, 2, 1, -1},        {1, 4, -2, 1, -1},
         {1, 4, 0, 1, 0},          {1, 4, 2, max, 8},
-        {1, max, max, 1, -1}};
+        {1, max, max, 1, -1},     {1, 1 << 21, 1, 1, 1 << 20},
+        {1, 1 << 21, 2, 1, -1},   {1, 1 << 21, 2, 32, 1 << 22}};
     for (const auto &[tile_bytes, ncols, nrows, budget_mb, capacity] : cases) {
         img_tile_cache *const cache = img_tile_cache_create(tile_bytes, ncols, nrows, budget_mb);
         EXPECT_EQ(cache != nullptr ? cache->capacity : -1, capacity) << tile_bytes << ' ' << ncols;

@@ -92,9 +92,14 @@ img_tile_cache *img_tile_cache_create(std::int32_t tile_bytes, std::int32_t ncol
                                       std::int32_t nrows, std::int32_t budget_mb)
 {
     if (tile_bytes < 1 || ncols < 0 || nrows < 0) return nullptr;
-    const std::int64_t room = (std::int64_t{budget_mb} << 20) / tile_bytes;
+    const std::int64_t budget = std::int64_t{budget_mb} << 20;
+    const std::int64_t room = budget / tile_bytes;
     const std::int64_t cells = std::int64_t{ncols} * nrows;
-    if (room < 1 || cells > INT32_MAX) return nullptr;
+    // The grid, too, is memory: one that takes more than the tiles is for tiles of a few samples.
+    constexpr std::int64_t modest_grid = std::int64_t{16} << 20;
+    const std::int64_t most_cells =
+        std::max(budget, modest_grid) / static_cast<std::int64_t>(sizeof(entry *));
+    if (room < 1 || cells > most_cells) return nullptr;
     std::unique_ptr<entry *[]> grid(new (std::nothrow) entry *[static_cast<std::size_t>(cells)] {});
     if (!grid) return nullptr;
     const auto capacity = static_cast<std::int32_t>(std::min(cells, room));

@@ -37,7 +37,8 @@ struct img_tile_cache {
 // but return the second result given here.
 
 // Returns a cache for as many tiles of `tile_bytes` as `budget_mb` megabytes hold, at most one
-// per cell; null when that is none or memory is short.
+// per cell; null when that is none, memory is short, or the grid alone would take more than the
+// budget and 16 MB.
 img_tile_cache *img_tile_cache_create(std::int32_t tile_bytes, std::int32_t ncols,
                                       std::int32_t nrows, std::int32_t budget_mb);
 // Installs the owner's operation and its first argument. 0; -1.

@@ -1,5 +1,6 @@
 // Start-up and clean-up of the library, and how a format takes its slot in the type table.
 #include "api/img_desc.h"
+#include "api/scratch.h"
 #include "api/types.h"
 #include "formats/helava.h"
 #include "formats/vitec.h"
@@ -50,6 +51,7 @@ void img_library_init()
 std::int32_t img_mgr_cleanup()
 {
     img_pool_free(std::exchange(img_handle_pool, nullptr));
+    img_free_scratch();
     return 0;
 }
 

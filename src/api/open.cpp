@@ -6,6 +6,7 @@
 
 #include <cerrno>
 #include <new>
+#include <numeric>
 
 namespace {
 
@@ -24,8 +25,7 @@ std::int32_t img_init_luts(img_desc *desc)
             desc->lut = {};
             return -1;
         }
-        for (std::size_t entry = 0; entry < size; ++entry)
-            lut[entry] = static_cast<std::uint8_t>(entry);
+        std::iota(lut.get(), lut.get() + size, std::uint8_t{0});
     }
     desc->lut_size = static_cast<std::int32_t>(size);
     return 0;

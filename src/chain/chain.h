@@ -9,11 +9,11 @@
 #define IMG_CHAIN_H
 
 #include "api/img.h"
+#include "api/scratch.h"
 
 #include <algorithm>
 #include <array>
 #include <cstdint>
-#include <memory>
 
 inline constexpr std::int32_t IMG_CHAIN_LINKS = 10;
 inline constexpr std::int32_t IMG_CHAIN_MAX_BITS = 30;  // so that a table's size fits 31 bits
@@ -42,7 +42,7 @@ struct img_chain_lut {
 using img_chain_create_fn = std::int32_t (*)(void *arg, const std::uint8_t *buffer,
                                              const img_buffer_def *def, std::uint16_t *lut);
 // Maps the window in `in_buffer` to `out_buffer`; with `pending` not 0 every sample first passes
-// through `lut`, 1 << in_def->nbits entries. 0: success.
+// through `lut`, 1 << in_def->nbits entries, which is not to be read else. 0: success.
 using img_chain_process_fn = std::int32_t (*)(void *arg, const std::uint8_t *in_buffer,
                                               const img_buffer_def *in_def,
                                               std::uint8_t *out_buffer,
@@ -98,10 +98,11 @@ struct img_chain_link {
 struct img_chain {
     std::uint8_t identity;       // 1: no slot holds a link, the data is left as it is
     std::uint8_t prepared;       // 1: between preparation and the successful end of application
-    std::int32_t has_lut_link;   // not 0: application needs a second running table
+    std::int32_t has_lut_link;   // not 0: application needs running tables
     std::int32_t lut_bits;       // width that the running LUT covers
     std::int32_t out_bits;       // width of the samples that the chain delivers
-    std::uint8_t *work_buffer;   // what the image type reads into; owned unless it is final_buffer
+    std::uint8_t *work_buffer;   // what the image type reads into; null: forgotten
+    img_scratch work_memory;     // holds it, unless it is final_buffer
     img_buffer_def *work_def;    // the caller's of preparation
     std::uint8_t *final_buffer;  // the caller's buffer
     const img_buffer_def *final_def;
@@ -159,8 +160,7 @@ std::int32_t img_apply_img_chain(img_handle handle);
 // Frees the chain's own buffer, if it has one, after a failed read, and forgets it.
 void img_chain_release(img_handle handle);
 // Returns memory for `nlines` x `stride` samples; null when it cannot be had.
-std::unique_ptr<std::uint8_t[]> img_chain_new_buffer(std::int32_t nlines, std::int32_t stride,
-                                                     std::int32_t nbytes);
+img_scratch img_chain_new_buffer(std::int32_t nlines, std::int32_t stride, std::int32_t nbytes);
 
 // Returns the entry of `sample` in a table of `size` entries, the last one for what is beyond it.
 inline std::uint16_t img_chain_entry(const std::uint16_t *table, std::int32_t size,
@@ -199,5 +199,9 @@ std::int32_t img_chain_create_stretch_lut_from_buffer(const std::uint8_t *buffer
 // outside 1..16 or that disagree, and for a null histogram.
 std::int32_t img_chain_compute_stretch_lut(const std::uint32_t *histogram, std::int32_t bits_in,
                                            const img_chain_lut *descriptor, std::uint16_t *lut);
+// The kernel of the above for outputs that are not wider than the input: entry i becomes the bits
+// from `shift` on of (i - low) * gain, truncated, within 0..top.
+void img_chain_fill_stretch(std::uint16_t *lut, std::int32_t size, double low, double gain,
+                            std::int32_t shift, std::int32_t top);
 
 #endif

@@ -4,53 +4,41 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <new>
 #include <utility>
 
 namespace {
 
-using buffer_ptr = std::unique_ptr<std::uint8_t[]>;
-
 // The LUT links that have been passed but not yet applied to the data, folded into one table.
 class running_lut {
 public:
-    // Returns false when memory is short. `with_spare`: there will be conversions.
-    bool allocate(std::int32_t bits, bool with_spare)
+    // Makes the tables for data of up to `bits`. Returns false when memory is short.
+    bool allocate(std::int32_t bits)
     {
         if (bits > IMG_CHAIN_MAX_BITS) {
             errno = ENOMEM;
             return false;
         }
         m_bits = bits;
-        m_table.reset(new (std::nothrow) std::uint16_t[std::size_t{1} << bits]);
-        if (with_spare) m_spare.reset(new (std::nothrow) std::uint16_t[std::size_t{1} << bits]);
-        if (!m_table || (with_spare && !m_spare)) return false;
-        reset();
-        return true;
+        m_table = new_table();
+        m_spare = new_table();
+        return m_table && m_spare;
     }
 
     bool pending() const { return m_pending; }
-    const std::uint16_t *table() const { return m_table.get(); }
-
-    void reset()
-    {
-        set_widths(m_bits, m_bits);
-        for (std::int32_t i = 0; i < m_lut.size; ++i)
-            m_table[static_cast<std::size_t>(i)] = static_cast<std::uint16_t>(i);
-        m_pending = false;
-    }
+    const std::uint16_t *table() const { return entries(m_table); }
+    void reset() { m_pending = false; }
 
     void fold(const img_chain_lut &next)
     {
         if (!m_pending) {
             set_widths(next.bits_in, next.bits_out);
-            std::copy_n(next.lut, next.size, m_table.get());
+            std::copy_n(next.lut, next.size, entries(m_table));
         } else {
             if (m_lut.bits_out != next.bits_in) convert(m_lut.bits_in, next.bits_in);
-            for (std::int32_t i = 0; i < m_lut.size; ++i) {
-                std::uint16_t &entry = m_table[static_cast<std::size_t>(i)];
-                entry = img_chain_entry(next.lut, next.size, entry);
-            }
+            std::uint16_t *const table = entries(m_table);
+            std::transform(table, table + m_lut.size, table, [&next](std::uint16_t entry) {
+                return img_chain_entry(next.lut, next.size, entry);
+            });
             m_lut.bits_out = next.bits_out;
         }
         m_pending = true;
@@ -69,13 +57,18 @@ public:
     bool apply_to(std::uint8_t *buffer, const img_buffer_def &def)
     {
         if (!bring_to(def.nbits)) return false;
-        m_lut.lut = m_table.get();
+        m_lut.lut = entries(m_table);
         img_chain_apply_lut(buffer, &def, &m_lut);
         reset();
         return true;
     }
 
 private:
+    static std::uint16_t *entries(const img_scratch &table)
+    {
+        return reinterpret_cast<std::uint16_t *>(table.get());
+    }
+    img_scratch new_table() const { return img_take_scratch(sizeof(std::uint16_t) << m_bits); }
     void set_widths(std::int32_t bits_in, std::int32_t bits_out)
     {
         m_lut.bits_in = static_cast<std::uint8_t>(bits_in);
@@ -86,13 +79,13 @@ private:
     {
         const img_chain_lut source = m_lut;
         set_widths(bits_in, bits_out);
-        img_chain_convert_lut(m_table.get(), &source, m_spare.get(), &m_lut);
+        img_chain_convert_lut(entries(m_table), &source, entries(m_spare), &m_lut);
         std::swap(m_table, m_spare);
     }
 
     std::int32_t m_bits = 0;  // the tables have room for 1 << m_bits entries
     img_chain_lut m_lut{};    // widths of what is in m_table
-    std::unique_ptr<std::uint16_t[]> m_table, m_spare;
+    img_scratch m_table, m_spare;
     bool m_pending = false;
 };
 
@@ -104,12 +97,12 @@ public:
           m_def(m_chain.work_def)
     {
     }
-    bool allocate() { return m_lut.allocate(m_chain.lut_bits, m_chain.has_lut_link != 0); }
+    bool allocate() { return m_chain.has_lut_link == 0 || m_lut.allocate(m_chain.lut_bits); }
 
     // Applies one link. Returns 0, or -1.
     std::int32_t pass(const img_chain_link &link)
     {
-        buffer_ptr fresh;
+        img_scratch fresh;
         std::uint8_t *output = m_current;
         if (link.placement == IMG_CHAIN_OUT_FINAL) output = m_chain.final_buffer;
         if (link.placement == IMG_CHAIN_OUT_ALLOC) {
@@ -177,7 +170,7 @@ private:
     running_lut m_lut;
     std::uint8_t *m_current;  // where the data is, and how it is laid out
     const img_buffer_def *m_def;
-    buffer_ptr m_temporary;  // m_current, when a link's output was a fresh buffer
+    img_scratch m_temporary;  // m_current, when a link's output was a fresh buffer
 };
 
 // Ends an application that failed: its buffers are given back, but the chain counts as prepared

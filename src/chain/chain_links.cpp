@@ -210,6 +210,6 @@ std::int32_t img_chain_nbytes(std::int32_t nbits)
 void img_chain_release(img_handle handle)
 {
     img_chain &chain = img_chain_of(handle);
-    if (chain.work_buffer != chain.final_buffer) delete[] chain.work_buffer;
+    chain.work_memory.reset();
     chain.work_buffer = nullptr;
 }

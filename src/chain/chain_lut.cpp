@@ -1,9 +1,8 @@
 // Lookup tables at work: over a buffer, from one buffer to another, and for other widths.
 #include "chain/chain.h"
+#include "chain/line.h"
 
 #include <cstring>
-#include <memory>
-#include <new>
 
 namespace {
 
@@ -37,6 +36,22 @@ void map_window(const std::uint8_t *from, const img_buffer_def &from_def, std::u
             out += sizeof(Out);
         }
     }
+}
+
+// Maps two bytes to one along a line, if the table is one and the window is worth finding out.
+// Returns false when it was not done.
+bool map_along_line(const std::uint16_t *table, std::int32_t size, const std::uint8_t *from,
+                    const img_buffer_def &from_def, std::uint8_t *to, const img_buffer_def &to_def)
+{
+    constexpr std::int64_t worth_it = 4;  // samples for each entry
+    img_chain_line line;
+    if (std::int64_t{from_def.nlines} * from_def.nsamps < worth_it * size ||
+        !img_chain_find_line(table, size, &line))
+        return false;
+    for (std::int64_t row = 0; row < from_def.nlines; ++row)
+        img_chain_map_line(from + row * from_def.stride * 2, to + row * to_def.stride,
+                           static_cast<std::size_t>(from_def.nsamps), line);
+    return true;
 }
 
 }  // namespace
@@ -86,23 +101,29 @@ std::int32_t img_chain_lut_remap(void *record, const std::uint8_t *in_buffer,
     if (in_def->nbits < 0 || in_def->nbits > IMG_CHAIN_MAX_BITS) return -1;
     const std::int32_t size = std::int32_t{1} << in_def->nbits;
     const std::uint16_t *table = own.lut;
-    std::unique_ptr<std::uint16_t[]> converted;
+    img_scratch converted;
     if (in_def->nbits != own.bits_in) {
-        converted.reset(new (std::nothrow) std::uint16_t[static_cast<std::size_t>(size)]);
+        converted = img_take_scratch(static_cast<std::size_t>(size) * sizeof(std::uint16_t));
         if (!converted) return -1;
         img_chain_lut widths = own;
         widths.bits_in = static_cast<std::uint8_t>(in_def->nbits);
         widths.size = size;
-        img_chain_convert_lut(own.lut, &own, converted.get(), &widths);
-        table = converted.get();
+        auto *const entries = reinterpret_cast<std::uint16_t *>(converted.get());
+        img_chain_convert_lut(own.lut, &own, entries, &widths);
+        table = entries;
     }
+    // A buffer of bytes gets bytes, whatever width the data before is said to have.
+    const bool to_bytes = in_def->nbytes != 1 && out_def->nbytes == 1;
+    if (to_bytes && pending == 0 &&
+        map_along_line(table, size, in_buffer, *in_def, out_buffer, *out_def))
+        return 0;
     const auto map = [=](std::uint32_t sample) {
         return img_chain_entry(table, size,
                                pending != 0 ? img_chain_entry(lut, size, sample) : sample);
     };
     if (in_def->nbytes == 1 && out_def->nbytes == 2)
         map_window<std::uint8_t, std::uint16_t>(in_buffer, *in_def, out_buffer, *out_def, map);
-    else if (in_def->nbytes == 2 && out_def->nbytes == 1)
+    else if (to_bytes)
         map_window<std::uint16_t, std::uint8_t>(in_buffer, *in_def, out_buffer, *out_def, map);
     else if (in_def->nbytes != 1)
         map_window<std::uint16_t, std::uint16_t>(in_buffer, *in_def, out_buffer, *out_def, map);

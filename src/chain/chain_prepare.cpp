@@ -4,7 +4,6 @@
 #include "chain/chain.h"
 
 #include <algorithm>
-#include <new>
 
 namespace {
 
@@ -50,7 +49,8 @@ bool take_work_buffer(img_chain &chain, img_buffer_def *def)
 {
     def->stride = def->nsamps;
     if (def->nbytes > chain.final_def->nbytes) def->fill = chain.final_def->fill;
-    chain.work_buffer = img_chain_new_buffer(def->nlines, def->nsamps, def->nbytes).release();
+    chain.work_memory = img_chain_new_buffer(def->nlines, def->nsamps, def->nbytes);
+    chain.work_buffer = chain.work_memory.get();
     return chain.work_buffer != nullptr;
 }
 
@@ -130,12 +130,10 @@ std::uint8_t *img_chain_prepare_operations(img_handle handle, std::uint8_t *buff
     return chain.work_buffer;
 }
 
-std::unique_ptr<std::uint8_t[]> img_chain_new_buffer(std::int32_t nlines, std::int32_t stride,
-                                                     std::int32_t nbytes)
+img_scratch img_chain_new_buffer(std::int32_t nlines, std::int32_t stride, std::int32_t nbytes)
 {
     if (nlines < 0 || stride < 0 || nbytes < 0) return nullptr;
     const auto samples =
         std::uint64_t{static_cast<std::uint32_t>(nlines)} * static_cast<std::uint32_t>(stride);
-    return std::unique_ptr<std::uint8_t[]>(
-        new (std::nothrow) std::uint8_t[samples * static_cast<std::uint32_t>(nbytes)]);
+    return img_take_scratch(samples * static_cast<std::uint32_t>(nbytes));
 }

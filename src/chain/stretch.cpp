@@ -1,11 +1,10 @@
 // The linear contrast stretch: a histogram, its cuts, and the table that spreads what is between.
+#include "api/multiversion.h"
 #include "api/report.h"
 #include "chain/chain.h"
 
 #include <algorithm>
 #include <cstring>
-#include <memory>
-#include <new>
 
 namespace {
 
@@ -59,7 +58,31 @@ cut find_cut(const std::uint32_t *histogram, std::size_t size)
     return {low, advance_to(low, 0.99)};
 }
 
+// To more bits than there were: the values are spread over the wider range.
+void fill_widening_stretch(std::uint16_t *lut, std::size_t size, double low, double gain,
+                           std::int64_t top)
+{
+    for (std::size_t i = 0; i < size; ++i) {
+        const auto stretched = static_cast<std::int64_t>((static_cast<double>(i) - low) * gain);
+        const std::int64_t value = stretched * (top + 1) / static_cast<std::int64_t>(size);
+        lut[i] = static_cast<std::uint16_t>(std::clamp<std::int64_t>(value, 0, top));
+    }
+}
+
 }  // namespace
+
+IMG_MULTIVERSION void img_chain_fill_stretch(std::uint16_t *lut, std::int32_t size, double low,
+                                             double gain, std::int32_t shift, std::int32_t top)
+{
+    const double end = size;  // what reaches it is at the top whatever it is
+    for (std::int32_t i = 0; i < size; ++i) {
+        double stretched = (static_cast<double>(i) - low) * gain;
+        stretched = stretched > 0.0 ? stretched : 0.0;
+        stretched = stretched < end ? stretched : end;
+        const std::int32_t value = static_cast<std::int32_t>(stretched) >> shift;
+        lut[i] = static_cast<std::uint16_t>(value < top ? value : top);
+    }
+}
 
 std::int32_t img_chain_create_16to8_lut(void * /*arg*/, const std::uint8_t *buffer,
                                         const img_buffer_def *def, std::uint16_t *lut)
@@ -80,14 +103,16 @@ std::int32_t img_chain_create_stretch_lut_from_buffer(const std::uint8_t *buffer
                                    .size = static_cast<std::int32_t>(size),
                                    .lut = lut,
                                    .owned = 0};
-    const std::unique_ptr<std::uint32_t[]> histogram(new (std::nothrow) std::uint32_t[size]{});
-    if (!histogram) return img_fail_errno("img_chain_create_stretch_lut_from_buffer:calloc");
+    const img_scratch counters = img_take_scratch(size * sizeof(std::uint32_t));
+    if (!counters) return img_fail_errno("img_chain_create_stretch_lut_from_buffer:calloc");
+    auto *const histogram = reinterpret_cast<std::uint32_t *>(counters.get());
+    std::fill_n(histogram, size, 0U);
     if (def->nbytes == 2)
-        count_samples<std::uint16_t>(buffer, *def, histogram.get(), size);
+        count_samples<std::uint16_t>(buffer, *def, histogram, size);
     else
-        count_samples<std::uint8_t>(buffer, *def, histogram.get(), size);
+        count_samples<std::uint8_t>(buffer, *def, histogram, size);
     if (def->fill < size) histogram[def->fill] = 0;
-    img_chain_compute_stretch_lut(histogram.get(), bits_in, &descriptor, lut);
+    img_chain_compute_stretch_lut(histogram, bits_in, &descriptor, lut);
     return 0;
 }
 
@@ -105,14 +130,11 @@ std::int32_t img_chain_compute_stretch_lut(const std::uint32_t *histogram, std::
     const auto [low, high] = find_cut(histogram, size);
     const double gain =
         high != low ? static_cast<double>(size) / static_cast<double>(high - low) : 1.0;
-    const std::int64_t top = (std::int64_t{1} << bits_out) - 1;
-    for (std::size_t i = 0; i < size; ++i) {
-        const double above_low = static_cast<double>(i) - static_cast<double>(low);
-        const auto stretched = static_cast<std::int64_t>(above_low * gain);
-        const std::int64_t value = bits_out <= bits_in
-                                       ? stretched >> (bits_in - bits_out)
-                                       : stretched * (top + 1) / static_cast<std::int64_t>(size);
-        lut[i] = static_cast<std::uint16_t>(std::clamp<std::int64_t>(value, 0, top));
-    }
+    const std::int32_t top = (std::int32_t{1} << bits_out) - 1;
+    if (bits_out <= bits_in)
+        img_chain_fill_stretch(lut, static_cast<std::int32_t>(size), static_cast<double>(low), gain,
+                               bits_in - bits_out, top);
+    else
+        fill_widening_stretch(lut, size, static_cast<double>(low), gain, top);
     return 0;
 }

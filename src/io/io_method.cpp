@@ -40,7 +40,7 @@ std::int32_t img_register_io_method(const char *name, std::int32_t (*init_op)(co
                                     img_io_write_fn write, img_io_seek_fn seek,
                                     img_io_unlink_fn unlink, img_io_value_fn get_value)
 {
-    if (img_find_io_method(name) != -1 || img_io_method_count == IMG_MAX_IO_METHODS) return -1;
+    if (name == nullptr || img_find_io_method(name) != -1 || img_io_method_count == IMG_MAX_IO_METHODS) return -1;
     const auto slot = static_cast<std::size_t>(img_io_method_count++);
     img_io_method_table[slot] = {
         .name = name,
@@ -52,7 +52,16 @@ std::int32_t img_register_io_method(const char *name, std::int32_t (*init_op)(co
         .seek = given_or_refusal(seek),
         .unlink = given_or_refusal(unlink),
         .get_value = given_or_refusal(get_value),
+        .lend = nullptr,
     };
+    return 0;
+}
+
+std::int32_t img_offer_lending(const char *name, img_io_lend_fn lend)
+{
+    const std::int32_t slot = img_find_io_method(name);
+    if (slot == -1) return -1;
+    img_io_method_table[static_cast<std::size_t>(slot)].lend = lend;
     return 0;
 }
 

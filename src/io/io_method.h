@@ -22,6 +22,13 @@ using img_io_write_fn = std::int32_t (*)(std::int32_t fd, const void *buffer, st
 using img_io_seek_fn = std::int32_t (*)(std::int32_t fd, std::int32_t offset, std::int32_t whence);
 using img_io_unlink_fn = std::int32_t (*)(const char *filename);
 using img_io_value_fn = double (*)();
+// Reads lent bytes; they are valid until it returns.
+using img_io_use_fn = void (*)(void *arg, const std::uint8_t *bytes);
+// Calls `use` once with the bytes [offset, offset + count) of an open file as they lie in memory.
+// Returns 0 when the file had all of them until `use` came back. Else -1, quietly: they cannot be
+// lent, and `use` was not called or what it did is worth nothing.
+using img_io_lend_fn = std::int32_t (*)(std::int32_t fd, std::int32_t offset, std::int32_t count,
+                                        img_io_use_fn use, void *arg);
 
 // One access method. Its operations have the meaning of the low-level file calls of those names;
 // all of them return -1 for failure and leave the reason in errno.
@@ -36,6 +43,9 @@ struct img_io_method {
                               // write after a seek past the end fills the gap with zero bytes
     img_io_unlink_fn unlink;  // removes a file by name
     img_io_value_fn get_value;  // never called by the library
+    // Null: not offered. A method that offers it leaves it to the library into how many calls a
+    // transfer is cut; all others see one seek and one transfer for each line or run of tiles.
+    img_io_lend_fn lend;
 };
 
 // Methods in the order of their registration; entry i is in use for i < img_io_method_count.
@@ -44,11 +54,15 @@ inline std::int32_t img_io_method_count = 0;
 
 // Appends a method. An operation that is null is replaced by one that fails. `init_op`, if given,
 // decides whether the method is enabled: it returns 0 if so. Returns 0, or -1 quietly when an
-// enabled method has that name or the table is full.
+// enabled method has that name, it is null, or the table is full.
 std::int32_t img_register_io_method(const char *name, std::int32_t (*init_op)(const char *name),
                                     img_io_open_fn open, img_io_close_fn close, img_io_read_fn read,
                                     img_io_write_fn write, img_io_seek_fn seek,
                                     img_io_unlink_fn unlink, img_io_value_fn get_value);
+
+// Lets the enabled method of that name offer to lend its bytes. Returns 0, or -1 quietly when there
+// is none.
+std::int32_t img_offer_lending(const char *name, img_io_lend_fn lend);
 
 // Returns the index of the enabled method of that name, compared byte for byte, or -1.
 std::int32_t img_find_io_method(const char *name);

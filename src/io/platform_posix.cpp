@@ -1,11 +1,14 @@
 #include "io/platform.h"
 
 #include "api/img.h"
+#include "io/lend_posix.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <cstddef>
 #include <ctime>
 #include <limits>
+#include <utility>
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -14,6 +17,39 @@
 static_assert(sizeof(off_t) >= 8, "lengths beyond 31 bits must be seen to be refused");
 
 namespace {
+
+// What a file held when it was opened: enough to tell its type and geometry without asking the
+// system for each word.
+struct first_look {
+    std::int64_t length;       // -1: no longer known
+    std::int32_t head_length;  // bytes in `head`; -1: not read yet
+    std::array<std::byte, 512> head;
+};
+
+// A file that is open. Its position is kept here, and seeks need no call of the system.
+struct open_file {
+    std::int32_t fd;  // FREE_PLACE: no file
+    std::int32_t position;
+    img_file_mapping mapping;
+    first_look look;  // until the length is asked for, or something is written
+};
+
+constexpr std::int32_t FREE_PLACE = 0;  // a standard stream's, and never that of a file here
+std::array<open_file, 64> open_files{};
+
+open_file *find_place(std::int32_t fd)
+{
+    const auto found = std::ranges::find(open_files, fd, &open_file::fd);
+    return found != open_files.end() ? &*found : nullptr;
+}
+
+// Returns the open file of a descriptor, or null with errno set.
+open_file *find_file(std::int32_t fd)
+{
+    open_file *const file = fd != FREE_PLACE ? find_place(fd) : nullptr;
+    if (file == nullptr) errno = EBADF;
+    return file;
+}
 
 constexpr std::int32_t ACCESS_MODE = 3;  // the bits of the open flags that hold the access mode
 
@@ -42,6 +78,28 @@ int system_flags(std::int32_t oflags)
     return flags;
 }
 
+constexpr std::int32_t MAX_POSITION = std::numeric_limits<std::int32_t>::max();
+
+// Reads from the head of a file that was just opened. Returns the bytes read, or -1 when they are
+// not to be had there.
+std::int32_t read_head(open_file *file, void *buffer, std::uint32_t count)
+{
+    first_look &look = file->look;
+    const auto size = static_cast<std::int32_t>(look.head.size());
+    if (look.length == -1 || file->position > size ||
+        count > static_cast<std::uint32_t>(size - file->position))
+        return -1;
+    if (look.head_length == -1)
+        look.head_length =
+            static_cast<std::int32_t>(::pread(file->fd, look.head.data(), look.head.size(), 0));
+    if (look.head_length == -1) return -1;
+    const auto got =
+        std::clamp(look.head_length - file->position, 0, static_cast<std::int32_t>(count));
+    std::copy_n(look.head.data() + file->position, got, static_cast<std::byte *>(buffer));
+    file->position += got;
+    return got;
+}
+
 std::int32_t close_and_fail(int fd, int error)
 {
     ::close(fd);
@@ -49,21 +107,23 @@ std::int32_t close_and_fail(int fd, int error)
     return -1;
 }
 
-// Calls `transfer(done)` until `count` bytes are moved, nothing more comes, or an error occurs.
+// Calls `transfer(done, position)` at the file's position until `count` bytes are moved, nothing
+// more comes, or an error occurs.
 template <typename Transfer>
-std::int32_t transfer_whole(std::uint32_t count, Transfer transfer)
+std::int32_t transfer_whole(open_file *file, std::uint32_t count, Transfer transfer)
 {
-    if (count > std::numeric_limits<std::int32_t>::max()) {
+    if (count > static_cast<std::uint32_t>(MAX_POSITION - file->position)) {
         errno = EINVAL;
         return -1;
     }
-    std::size_t done = 0;
+    std::uint32_t done = 0;
     while (done < count) {
-        const ssize_t moved = transfer(done);
+        const ssize_t moved = transfer(done, off_t{file->position});
         if (moved == -1 && errno == EINTR) continue;
         if (moved == -1 && done == 0) return -1;
         if (moved <= 0) break;
-        done += static_cast<std::size_t>(moved);
+        done += static_cast<std::uint32_t>(moved);
+        file->position += static_cast<std::int32_t>(moved);
     }
     return static_cast<std::int32_t>(done);
 }
@@ -93,42 +153,72 @@ std::int32_t img_platform_open(const char *filename, std::int32_t oflags, std::i
     struct stat status;
     if (::fstat(fd, &status) == -1) return close_and_fail(fd, errno);
     if (!S_ISREG(status.st_mode) && !S_ISBLK(status.st_mode)) return close_and_fail(fd, EINVAL);
+    open_file *const place = find_place(FREE_PLACE);
+    if (place == nullptr) return close_and_fail(fd, EMFILE);
+    place->fd = fd;
+    place->position = 0;
+    place->mapping = {};
+    place->look.length = S_ISREG(status.st_mode) ? status.st_size : -1;
+    place->look.head_length = -1;
     return fd;
 }
 
 std::int32_t img_platform_close(std::int32_t fd)
 {
+    open_file *const file = find_file(fd);
+    if (file == nullptr) return -1;
+    file->mapping.drop();
+    file->fd = FREE_PLACE;
     // An interrupted close is not repeated: the descriptor may be in use again by then.
     return ::close(fd);
 }
 
 std::int32_t img_platform_read(std::int32_t fd, void *buffer, std::uint32_t count)
 {
-    return transfer_whole(count, [=](std::size_t done) {
-        return ::read(fd, static_cast<std::byte *>(buffer) + done, count - done);
+    open_file *const file = find_file(fd);
+    if (file == nullptr) return -1;
+    if (const std::int32_t got = read_head(file, buffer, count); got != -1) return got;
+    return transfer_whole(file, count, [=](std::uint32_t done, off_t position) {
+        return ::pread(fd, static_cast<std::byte *>(buffer) + done, count - done, position);
     });
 }
 
 std::int32_t img_platform_write(std::int32_t fd, const void *buffer, std::uint32_t count)
 {
-    return transfer_whole(count, [=](std::size_t done) {
-        return ::write(fd, static_cast<const std::byte *>(buffer) + done, count - done);
+    open_file *const file = find_file(fd);
+    if (file == nullptr) return -1;
+    file->look.length = -1;
+    file->mapping.note_change();
+    return transfer_whole(file, count, [=](std::uint32_t done, off_t position) {
+        return ::pwrite(fd, static_cast<const std::byte *>(buffer) + done, count - done, position);
     });
 }
 
 std::int32_t img_platform_seek(std::int32_t fd, std::int32_t offset, std::int32_t whence)
 {
-    constexpr std::array<int, 3> system_whence{SEEK_SET, SEEK_CUR, SEEK_END};
-    if (whence < 0 || whence > 2) {
-        errno = EINVAL;
+    open_file *const file = find_file(fd);
+    if (file == nullptr) return -1;
+    std::int64_t base = 0;
+    if (whence == IMG_SEEK_CURRENT) base = file->position;
+    if (whence == IMG_SEEK_END) {
+        base = std::exchange(file->look.length, -1);
+        if (base == -1) base = ::lseek(fd, 0, SEEK_END);
+        if (base == -1) return -1;
+    }
+    const std::int64_t at = base + offset;
+    if (whence < IMG_SEEK_START || whence > IMG_SEEK_END || at < 0 || at > MAX_POSITION) {
+        errno = at > MAX_POSITION ? EOVERFLOW : EINVAL;
         return -1;
     }
-    const off_t at = ::lseek(fd, offset, system_whence[static_cast<std::size_t>(whence)]);
-    if (at > std::numeric_limits<std::int32_t>::max()) {
-        errno = EOVERFLOW;
-        return -1;
-    }
-    return static_cast<std::int32_t>(at);
+    file->position = static_cast<std::int32_t>(at);
+    return file->position;
+}
+
+std::int32_t img_platform_lend(std::int32_t fd, std::int32_t offset, std::int32_t count,
+                               img_io_use_fn use, void *arg)
+{
+    open_file *const file = find_file(fd);
+    return file != nullptr ? file->mapping.lend(fd, offset, count, use, arg) : -1;
 }
 
 std::int32_t img_platform_unlink(const char *filename)

@@ -5,6 +5,7 @@
 #define IMG_STD_H
 
 #include "api/types.h"
+#include "io/io_method.h"
 
 #include <array>
 #include <cstddef>
@@ -78,6 +79,21 @@ std::int32_t img_std_update_veof(img_desc *desc);
 std::int32_t img_std_read_at(img_desc *desc, std::int64_t offset, void *buffer, std::int32_t count);
 std::int32_t img_std_write_at(img_desc *desc, std::int64_t offset, const void *buffer,
                               std::int32_t count);
+// Calls `use` with the `count` bytes at `offset` where they lie: in memory, or in a file whose
+// access method lends them. Returns true when all of them are there. Else what `use` did, if it
+// was called, is worth nothing, and the bytes are to be asked for one transfer at a time.
+bool img_std_lend(const img_desc *desc, std::int64_t offset, std::int64_t count, img_io_use_fn use,
+                  void *arg);
+template <typename Use>
+bool img_std_lend(const img_desc *desc, std::int64_t offset, std::int64_t count, Use use)
+{
+    const img_io_use_fn call = [](void *arg, const std::uint8_t *lent) {
+        (*static_cast<Use *>(arg))(lent);
+    };
+    return img_std_lend(desc, offset, count, call, &use);
+}
+// True when nobody counts the calls by which the image's file is reached. Not for images in memory.
+bool img_std_joins_calls(const img_desc *desc);
 
 // --- Samples ---
 
@@ -99,6 +115,18 @@ bool img_std_exchanges_bytes(const img_desc *desc);
 void img_std_copy_samples(const std::uint8_t *from, std::size_t from_step, std::uint8_t *to,
                           std::size_t to_step, std::size_t count, std::int32_t nbytes,
                           bool exchange);
+// The kernel of these copies: exchanges the bytes of `count` samples that lie side by side.
+void img_std_exchange_bytes(const std::uint8_t *from, std::uint8_t *to, std::size_t count);
+
+// Rows of samples in memory: sample k of row i lies at `first` + i * `pitch` + k * `step` bytes.
+struct img_std_rows {
+    const std::uint8_t *first;
+    std::size_t pitch, step;
+};
+// Copies `nrows` rows of `nsamps` samples to rows that are `to_pitch` bytes apart, in which the
+// samples lie side by side.
+void img_std_copy_rows(const img_std_rows &from, std::uint8_t *to, std::size_t to_pitch,
+                       std::size_t nrows, std::size_t nsamps, std::int32_t nbytes, bool exchange);
 // Writes `count` copies of the sample at `value`.
 void img_fill_samples(std::uint8_t *buffer, std::size_t count, std::int32_t nbytes,
                       const std::uint8_t *value);
@@ -185,6 +213,17 @@ inline std::int32_t img_whole_tiles(std::int32_t extent, std::int32_t tile_exten
 
 // Bytes of one tile plane, in every layout.
 std::size_t img_std_plane_size(const img_desc *desc);
+
+// How the samples of a band lie in a stored tile: byte of the first, bytes from one to the next.
+struct img_std_plane {
+    std::size_t first, step;
+};
+img_std_plane img_std_plane_in_tile(const img_desc *desc, std::int32_t band);
+
+// Copies a run out of the tiles where they lie. Returns false when they are not lent; then
+// `buffer` may have been written.
+bool img_std_read_lent_tiles(const img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,
+                             std::int32_t band, std::uint8_t *buffer);
 
 // Copy the samples of each band between one pixel-interleaved tile and the bands' planes; sample
 // i of a pixel belongs to band `band_map`[i]. Bands whose plane is null are passed over.

@@ -200,20 +200,21 @@ std::int32_t open_file(img_desc *desc)
 // completed, a file opened read-only for one, stays as it is: there is nobody to tell.
 void complete(img_desc *desc)
 {
+    if (img_access_mode(desc) == IMG_OPEN_READ_ONLY && img_std_joins_calls(desc)) return;
     const img_std_file *const file = desc->std_file;
     const std::int32_t expected = desc->nbands * file->band_size + file->data_offset;
     const std::int32_t length = seek(desc, 0, IMG_SEEK_END);
-    if (length != -1 && length < expected) append_zeros(desc, length, expected - length);
+    if (length >= 0 && length < expected) append_zeros(desc, length, expected - length);
 }
 
 // Tells a read that failed, or stopped although the file goes on, from one that met its end.
-void note_bytes_not_read(img_desc *desc, std::int64_t offset, std::int32_t got)
+void note_bytes_not_read(img_desc *desc, std::int64_t offset, std::int32_t got, std::int32_t count)
 {
     img_std_file *const file = desc->std_file;
     if (got == -1) {
         file->read_error = errno != 0 ? errno : EIO;
     } else if (const std::int32_t end = seek(desc, 0, IMG_SEEK_END);
-               end == -1 || end > offset + got) {
+               got < 0 || got > count || end < 0 || end > offset + got) {
         file->read_error = EIO;
     }
 }
@@ -340,7 +341,8 @@ std::int32_t img_std_read_at(img_desc *desc, std::int64_t offset, void *buffer, 
     if (got == 0)
         got = desc->io_method->read(desc->std_file->data_fd, buffer,
                                     static_cast<std::uint32_t>(count));
-    if (got != count && desc->std_file->pre_reads > 0) note_bytes_not_read(desc, offset, got);
+    if (got != count && desc->std_file->pre_reads > 0)
+        note_bytes_not_read(desc, offset, got, count);
     return got;
 }
 
@@ -355,4 +357,23 @@ std::int32_t img_std_write_at(img_desc *desc, std::int64_t offset, const void *b
     if (written == count) return updated == 0 ? written : -1;
     errno = error;
     return written;
+}
+
+bool img_std_lend(const img_desc *desc, std::int64_t offset, std::int64_t count, img_io_use_fn use,
+                  void *arg)
+{
+    const img_std_file *const file = desc->std_file;
+    if (desc->mem_image) {
+        if (offset + count - 1 > file->veof) return false;
+        use(arg, desc->mem_image.get() + offset);
+        return true;
+    }
+    return img_std_joins_calls(desc) &&
+           desc->io_method->lend(file->data_fd, static_cast<std::int32_t>(offset),
+                                 static_cast<std::int32_t>(count), use, arg) == 0;
+}
+
+bool img_std_joins_calls(const img_desc *desc)
+{
+    return desc->io_method->lend != nullptr;
 }

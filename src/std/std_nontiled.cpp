@@ -1,11 +1,10 @@
 // Regions of untiled images, line by line.
 #include "api/img_desc.h"
 #include "api/report.h"
-#include "io/io_method.h"
+#include "api/scratch.h"
 #include "std/std.h"
 
 #include <algorithm>
-#include <new>
 
 namespace {
 
@@ -26,13 +25,6 @@ void copy_row(const img_desc *desc, const std::uint8_t *from, std::uint8_t *to, 
     const std::size_t step = bytes_of(desc, 1);
     img_std_copy_samples(from, step, to, step, static_cast<std::size_t>(nsamps), desc->nbytes,
                          exchange);
-}
-
-// One row of working memory; null when memory is short.
-std::unique_ptr<std::uint8_t[]> new_row(std::int32_t row_length)
-{
-    return std::unique_ptr<std::uint8_t[]>(new (std::nothrow)
-                                               std::uint8_t[static_cast<std::size_t>(row_length)]);
 }
 
 // Writes this band's samples of one line of pixels into the file, from offset `at` on, and steps
@@ -73,6 +65,18 @@ std::int32_t write_interleaved_line(img_desc *desc, std::int64_t at, std::int32_
     return result;
 }
 
+// How many lines of a region one call may write: all, or as many as fit the processor's cache where
+// they have to be gathered first, when they lie side by side in the file and nobody counts the
+// calls.
+std::int32_t lines_at_once(const img_desc *desc, std::int32_t nlines, std::int32_t nsamps,
+                           bool gathered)
+{
+    constexpr std::int32_t cached_bytes = 1 << 18;
+    if (desc->mem_image || !img_std_joins_calls(desc) || nsamps != desc->std_file->padded_nsamps)
+        return 1;
+    return gathered ? std::clamp(cached_bytes / (desc->nbytes * nsamps), 1, nlines) : nlines;
+}
+
 }  // namespace
 
 bool img_std_exchanges_bytes(const img_desc *desc)
@@ -84,6 +88,18 @@ std::int32_t img_std_read_lines(img_desc *desc, std::int32_t line, std::int32_t 
                                 std::int32_t nlines, std::int32_t nsamps, std::int32_t band,
                                 std::uint8_t *buffer, std::int32_t stride, bool exchange)
 {
+    if (nlines < 1) return 0;
+    const std::int64_t begin = img_std_line_offset(desc, line, samp, band);
+    const std::int64_t end =
+        img_std_line_offset(desc, std::int64_t{line} + nlines - 1, samp + nsamps, band);
+    if (img_std_lend(desc, begin, end - begin, [&](const std::uint8_t *bytes) {
+            img_std_copy_rows(
+                {bytes, bytes_of(desc, desc->std_file->padded_nsamps), bytes_of(desc, 1)}, buffer,
+                bytes_of(desc, stride), static_cast<std::size_t>(nlines),
+                static_cast<std::size_t>(nsamps), desc->nbytes, exchange);
+        }))
+        return 0;
+
     const std::int32_t row_length = desc->nbytes * nsamps;
     for (std::int32_t i = 0; i < nlines; ++i) {
         const std::int64_t offset = img_std_line_offset(desc, std::int64_t{line} + i, samp, band);
@@ -117,12 +133,27 @@ std::int32_t img_std_read_nontiled_interleaved(img_desc *desc, std::int32_t line
                                                std::int32_t band, std::uint8_t *buffer,
                                                std::int32_t stride)
 {
+    if (nlines < 1) return 0;
     const std::size_t pixel_length = bytes_of(desc, desc->nbands);
-    const std::int32_t row_length = desc->nbands * desc->nbytes * nsamps;
-    std::unique_ptr<std::uint8_t[]> row;  // an in-memory image is read where it lies
-    if (!desc->mem_image && !(row = new_row(row_length)))
-        return img_fail_errno("img_std_read_nontiled_interleaved:malloc");
+    const std::int64_t begin = img_std_pixel_offset(desc, line, samp);
+    const std::int64_t end =
+        img_std_pixel_offset(desc, std::int64_t{line} + nlines - 1, samp + nsamps);
+    const auto copy_rows = [&](const std::uint8_t *pixels, std::int32_t first, std::int32_t count) {
+        img_std_copy_rows({pixels + bytes_of(desc, band),
+                           pixel_length * static_cast<std::size_t>(desc->std_file->padded_nsamps),
+                           pixel_length},
+                          buffer + row_start(desc, first, stride), bytes_of(desc, stride),
+                          static_cast<std::size_t>(count), static_cast<std::size_t>(nsamps),
+                          desc->nbytes, img_std_exchanges_bytes(desc));
+    };
+    if (img_std_lend(desc, begin, end - begin,
+                     [&](const std::uint8_t *bytes) { copy_rows(bytes, 0, nlines); }))
+        return 0;
 
+    const std::int32_t row_length = desc->nbands * desc->nbytes * nsamps;
+    img_scratch row;  // an in-memory image is read where it lies
+    if (!desc->mem_image && !(row = img_take_scratch(static_cast<std::size_t>(row_length))))
+        return img_fail_errno("img_std_read_nontiled_interleaved:malloc");
     for (std::int32_t i = 0; i < nlines; ++i) {
         const std::int64_t offset = img_std_pixel_offset(desc, std::int64_t{line} + i, samp);
         const std::uint8_t *pixels = row.get();
@@ -137,10 +168,7 @@ std::int32_t img_std_read_nontiled_interleaved(img_desc *desc, std::int32_t line
                 return img_fail("img_std_read_nontiled_interleaved: %d of %d bytes read!!\n", got,
                                 row_length);
         }
-        img_std_copy_samples(pixels + bytes_of(desc, band), pixel_length,
-                             buffer + row_start(desc, i, stride), bytes_of(desc, 1),
-                             static_cast<std::size_t>(nsamps), desc->nbytes,
-                             img_std_exchanges_bytes(desc));
+        copy_rows(pixels, i, 1);
     }
     return 0;
 }
@@ -149,32 +177,50 @@ std::int32_t img_std_write_lines(img_desc *desc, std::int32_t line, std::int32_t
                                  std::int32_t nlines, std::int32_t nsamps, std::int32_t band,
                                  const std::uint8_t *buffer, std::int32_t stride, bool exchange)
 {
-    const std::int32_t row_length = desc->nbytes * nsamps;
-    std::unique_ptr<std::uint8_t[]> exchanged;  // the caller's rows are not to be modified
-    if (exchange && !desc->mem_image && !(exchanged = new_row(row_length)))
+    // The caller's rows are not to be modified.
+    bool gathers = exchange || stride != nsamps;
+    std::int32_t count = lines_at_once(desc, nlines, nsamps, gathers);
+    img_scratch gathered;
+    if (gathers && !desc->mem_image)
+        gathered = img_take_scratch(bytes_of(desc, nsamps) * static_cast<std::size_t>(count));
+    if (exchange && !desc->mem_image && !gathered)
         return img_fail_errno("img_std_write_nontiled:malloc");
+    if (!gathered && gathers) count = 1;
 
     img_std_file *const file = desc->std_file;
-    for (std::int32_t i = 0; i < nlines; ++i) {
+    const std::int32_t row_length = desc->nbytes * nsamps;
+    for (std::int32_t i = 0; i < nlines;) {
+        count = std::min(count, nlines - i);
         const std::int64_t offset = img_std_line_offset(desc, std::int64_t{line} + i, samp, band);
-        const std::uint8_t *row = buffer + row_start(desc, i, stride);
+        const std::uint8_t *rows = buffer + row_start(desc, i, stride);
         if (desc->mem_image) {
             const std::int64_t last = offset + row_length - 1;
             if (last > file->veof_max)
                 return img_fail("img_write_nontiled: Write past virtual eof!!\n");
-            copy_row(desc, row, desc->mem_image.get() + offset, nsamps, exchange);
+            copy_row(desc, rows, desc->mem_image.get() + offset, nsamps, exchange);
             file->veof = std::max(file->veof, static_cast<std::int32_t>(last));
+            ++i;
             continue;
         }
-        if (exchange) {
-            copy_row(desc, row, exchanged.get(), nsamps, exchange);
-            row = exchanged.get();
+        if (gathered) {
+            img_std_copy_rows({rows, bytes_of(desc, stride), bytes_of(desc, 1)}, gathered.get(),
+                              bytes_of(desc, nsamps), static_cast<std::size_t>(count),
+                              static_cast<std::size_t>(nsamps), desc->nbytes, exchange);
+            rows = gathered.get();
         }
-        const std::int32_t written = img_std_write_at(desc, offset, row, row_length);
-        if (written == -1) return img_fail_errno("img_std_write_nontiled:write");
-        if (written != row_length)
+        const std::int32_t written = img_std_write_at(desc, offset, rows, count * row_length);
+        if (written == count * row_length) {
+            i += count;
+        } else if (count >
+                   1) {  // once more, line by line from the first that was not written whole
+            i += std::max(written, 0) / row_length;
+            count = 1;
+        } else if (written == -1) {
+            return img_fail_errno("img_std_write_nontiled:write");
+        } else {
             return img_fail("img_std_write_nontiled: %d of %d bytes written!!\n", written,
                             row_length);
+        }
     }
     return 0;
 }

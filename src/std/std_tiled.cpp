@@ -2,11 +2,11 @@
 #include "api/img.h"
 #include "api/img_desc.h"
 #include "api/report.h"
+#include "api/scratch.h"
 #include "std/std.h"
 
 #include <algorithm>
 #include <cerrno>
-#include <new>
 
 namespace {
 
@@ -39,18 +39,24 @@ private:
     std::int32_t m_begin, m_last, m_tile_extent;
 };
 
-// A region of a tiled image together with the run buffer, which holds the region's part of one
-// row of tiles at a time.
+// The part of a region that lies in one tile.
+struct tile_part {
+    std::int32_t index;  // of the tile in the run of its row of tiles
+    std::size_t nlines, nsamps;
+    std::size_t first_sample;  // in the tile
+    std::size_t run_byte;      // where it begins in a run of planes
+    std::size_t buffer_byte;   // where it begins in the caller's buffer
+};
+
+// A region of a tiled image, which covers a run of tiles in each row of tiles.
 class tiled_region {
 public:
-    tiled_region(img_desc *desc, std::int32_t line, std::int32_t samp, std::int32_t nlines,
+    tiled_region(const img_desc *desc, std::int32_t line, std::int32_t samp, std::int32_t nlines,
                  std::int32_t nsamps, std::int32_t stride)
         : m_desc(desc), m_lines(line, nlines, desc->tile_nlines),
-          m_samps(samp, nsamps, desc->tile_nsamps), m_stride(stride),
-          m_run(new (std::nothrow) std::uint8_t[run_length()])
+          m_samps(samp, nsamps, desc->tile_nsamps), m_stride(stride)
     {
     }
-    std::uint8_t *run() const { return m_run.get(); }  // null: memory is short
     std::size_t run_length() const
     {
         return static_cast<std::size_t>(ntiles()) * img_std_plane_size(m_desc);
@@ -62,48 +68,77 @@ public:
         return (m_lines.first_tile() + tile_row) * m_desc->std_file->tiles_across +
                m_samps.first_tile();
     }
+    // True when the region has all samples of a run.
+    bool covers_run(std::int32_t tile_row) const
+    {
+        return m_lines.in_tile(tile_row).count == m_desc->tile_nlines &&
+               m_samps.in_tile(0).count == m_desc->tile_nsamps &&
+               m_samps.in_tile(ntiles() - 1).count == m_desc->tile_nsamps;
+    }
 
-    // Calls `copy(run_byte, buffer_byte, count)` for every tile line of the region in a row of
-    // tiles: `count` samples that lie at these bytes of the run and of the caller's buffer.
-    template <typename Copy>
-    void for_each_tile_line(std::int32_t tile_row, Copy copy) const
+    // Calls `visit(tile_part)` for each tile of a run.
+    template <typename Visit>
+    void for_each_tile(std::int32_t tile_row, Visit visit) const
     {
         const tile_span::part lines = m_lines.in_tile(tile_row);
         for (std::int32_t tile = 0; tile < ntiles(); ++tile) {
             const tile_span::part samps = m_samps.in_tile(tile);
-            for (std::int32_t i = 0; i < lines.count; ++i)
-                copy(run_byte(tile, lines.first + i, samps.first),
-                     buffer_byte(lines.place + i, samps.place),
-                     static_cast<std::size_t>(samps.count));
+            const std::size_t first_sample =
+                extent(lines.first) * extent(m_desc->tile_nsamps) + extent(samps.first);
+            visit(tile_part{
+                .index = tile,
+                .nlines = extent(lines.count),
+                .nsamps = extent(samps.count),
+                .first_sample = first_sample,
+                .run_byte = extent(tile) * img_std_plane_size(m_desc) +
+                            first_sample * extent(m_desc->nbytes),
+                .buffer_byte = extent(lines.place) * buffer_pitch() +
+                               extent(samps.place) * extent(m_desc->nbytes),
+            });
         }
     }
+    // Bytes from one row of the caller's buffer to the next, and from one line of a plane.
+    std::size_t buffer_pitch() const { return extent(m_stride) * extent(m_desc->nbytes); }
+    std::size_t plane_pitch() const { return extent(m_desc->tile_nsamps) * extent(m_desc->nbytes); }
 
 private:
-    std::size_t nbytes() const { return static_cast<std::size_t>(m_desc->nbytes); }
-    std::size_t run_byte(std::int32_t tile, std::int32_t line, std::int32_t samp) const
-    {
-        const std::int32_t sample = line * m_desc->tile_nsamps + samp;
-        return static_cast<std::size_t>(tile) * img_std_plane_size(m_desc) +
-               static_cast<std::size_t>(sample) * nbytes();
-    }
-    std::size_t buffer_byte(std::int32_t row, std::int32_t samp) const
-    {
-        return (static_cast<std::size_t>(row) * static_cast<std::size_t>(m_stride) +
-                static_cast<std::size_t>(samp)) *
-               nbytes();
-    }
+    static std::size_t extent(std::int32_t count) { return static_cast<std::size_t>(count); }
 
-    img_desc *m_desc;
+    const img_desc *m_desc;
     tile_span m_lines, m_samps;
     std::int32_t m_stride;
-    std::unique_ptr<std::uint8_t[]> m_run;
 };
 
-void copy_tile_line(const img_desc *desc, const std::uint8_t *from, std::uint8_t *to,
-                    std::size_t count)
+// True when nothing stands between the region and the stored tiles: no cache, as there is for all
+// virtual tiles, and nobody who counts the calls.
+bool reaches_stored_tiles(const img_desc *desc)
 {
-    const auto step = static_cast<std::size_t>(desc->nbytes);
-    img_std_copy_samples(from, step, to, step, count, desc->nbytes, img_std_exchanges_bytes(desc));
+    return !desc->mem_image && desc->tile_cache == nullptr && desc->cache_mb == 0 &&
+           img_std_joins_calls(desc);
+}
+
+// Copies the region out of the tiles where they lie. Returns false when they are not lent.
+bool read_lent_tiles(const img_desc *desc, const tiled_region &region, std::int32_t band,
+                     std::uint8_t *buffer)
+{
+    const std::int32_t last_row = region.tile_rows() - 1;
+    const std::int32_t last_tile = region.first_tile(last_row) + region.ntiles() - 1;
+    const std::int64_t begin = img_std_tile_offset(desc, region.first_tile(0), band);
+    const std::int64_t end = img_std_tile_offset(desc, last_tile, band) + desc->std_file->tile_size;
+    const img_std_plane plane = img_std_plane_in_tile(desc, band);
+    const std::size_t line_length = plane.step * static_cast<std::size_t>(desc->tile_nsamps);
+    const bool exchange = img_std_exchanges_bytes(desc);
+    return img_std_lend(desc, begin, end - begin, [&](const std::uint8_t *bytes) {
+        for (std::int32_t row = 0; row <= last_row; ++row)
+            region.for_each_tile(row, [&](const tile_part &part) {
+                const std::int64_t tile =
+                    img_std_tile_offset(desc, region.first_tile(row) + part.index, band) - begin;
+                img_std_copy_rows({bytes + tile + plane.first + part.first_sample * plane.step,
+                                   line_length, plane.step},
+                                  buffer + part.buffer_byte, region.buffer_pitch(), part.nlines,
+                                  part.nsamps, desc->nbytes, exchange);
+            });
+    });
 }
 
 // Lays what the image holds of a run over what is in `run`. Returns 0, or -1 after a message
@@ -135,17 +170,22 @@ std::int32_t img_read_tiled(img_desc *desc, std::int32_t line, std::int32_t samp
                             std::uint8_t *buffer, std::int32_t stride)
 {
     const tiled_region region(desc, line, samp, nlines, nsamps, stride);
-    if (region.run() == nullptr) return img_fail_errno("img_read_tiled:malloc");
+    if (reaches_stored_tiles(desc) && read_lent_tiles(desc, region, band, buffer)) return 0;
+
+    const img_scratch run = img_take_scratch(region.run_length());
+    if (!run) return img_fail_errno("img_read_tiled:malloc");
     // Virtual tiles at the edges have no samples for all of their plane, but are cached whole.
-    if (desc->virtual_tiled != 0) std::fill_n(region.run(), region.run_length(), std::uint8_t{0});
+    if (desc->virtual_tiled != 0) std::fill_n(run.get(), region.run_length(), std::uint8_t{0});
+    const auto width = static_cast<std::size_t>(desc->nbytes);
     for (std::int32_t row = 0; row < region.tile_rows(); ++row) {
         if (img_load_tiles(desc->handle, region.first_tile(row), region.ntiles(), band,
-                           region.run()) == -1)
+                           run.get()) == -1)
             return -1;
-        region.for_each_tile_line(
-            row, [&](std::size_t run_byte, std::size_t buffer_byte, std::size_t count) {
-                copy_tile_line(desc, region.run() + run_byte, buffer + buffer_byte, count);
-            });
+        region.for_each_tile(row, [&](const tile_part &part) {
+            img_std_copy_rows({run.get() + part.run_byte, region.plane_pitch(), width},
+                              buffer + part.buffer_byte, region.buffer_pitch(), part.nlines,
+                              part.nsamps, desc->nbytes, img_std_exchanges_bytes(desc));
+        });
     }
     return 0;
 }
@@ -156,18 +196,27 @@ std::int32_t img_std_write_tiled(img_desc *desc, std::int32_t line, std::int32_t
                                  const std::uint8_t *fill)
 {
     const tiled_region region(desc, line, samp, nlines, nsamps, stride);
-    if (region.run() == nullptr) return img_fail_errno("img_std_write_tiled:malloc");
-    const std::size_t run_samples = region.run_length() / static_cast<std::size_t>(desc->nbytes);
+    const img_scratch run = img_take_scratch(region.run_length());
+    if (!run) return img_fail_errno("img_std_write_tiled:malloc");
+    const bool direct = reaches_stored_tiles(desc);
+    const auto width = static_cast<std::size_t>(desc->nbytes);
     for (std::int32_t row = 0; row < region.tile_rows(); ++row) {
         const std::int32_t first_tile = region.first_tile(row);
-        img_fill_samples(region.run(), run_samples, desc->nbytes,
-                         fill != nullptr ? fill : img_zero_sample.data());
-        if (read_stored_run(desc, first_tile, region.ntiles(), band, region.run()) == -1) return -1;
-        region.for_each_tile_line(
-            row, [&](std::size_t run_byte, std::size_t buffer_byte, std::size_t count) {
-                copy_tile_line(desc, buffer + buffer_byte, region.run() + run_byte, count);
-            });
-        if (img_dump_tiles(desc->handle, first_tile, region.ntiles(), band, region.run()) == -1)
+        const bool has_old_samples = !direct || !region.covers_run(row);
+        if (has_old_samples &&
+            !(direct &&
+              img_std_read_lent_tiles(desc, first_tile, region.ntiles(), band, run.get()))) {
+            img_fill_samples(run.get(), region.run_length() / width, desc->nbytes,
+                             fill != nullptr ? fill : img_zero_sample.data());
+            if (read_stored_run(desc, first_tile, region.ntiles(), band, run.get()) == -1)
+                return -1;
+        }
+        region.for_each_tile(row, [&](const tile_part &part) {
+            img_std_copy_rows({buffer + part.buffer_byte, region.buffer_pitch(), width},
+                              run.get() + part.run_byte, region.plane_pitch(), part.nlines,
+                              part.nsamps, desc->nbytes, img_std_exchanges_bytes(desc));
+        });
+        if (img_dump_tiles(desc->handle, first_tile, region.ntiles(), band, run.get()) == -1)
             return -1;
     }
     return 0;

@@ -2,17 +2,15 @@
 #include "access/tile_cache.h"
 #include "api/img_desc.h"
 #include "api/report.h"
+#include "api/scratch.h"
 #include "std/std.h"
 
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
-#include <new>
 #include <utility>
 
 namespace {
-
-using tile_buffer = std::unique_ptr<std::uint8_t[]>;
 
 // Sets the image's cache aside, so that reads go to the file alone, and puts it back.
 class without_cache {
@@ -46,23 +44,24 @@ std::int32_t run_bytes(const img_desc *desc, std::int32_t ntiles)
     return ntiles * desc->std_file->tile_size;
 }
 
-tile_buffer new_run(std::int32_t length)
+img_scratch new_run(std::int32_t length)
 {
-    return tile_buffer(new (std::nothrow) std::uint8_t[static_cast<std::size_t>(length)]);
+    return img_take_scratch(static_cast<std::size_t>(length));
 }
 
-tile_buffer new_zero_plane(const img_desc *desc)
+img_scratch new_zero_plane(const img_desc *desc)
 {
-    return tile_buffer(new (std::nothrow) std::uint8_t[img_std_plane_size(desc)]{});
+    const std::size_t size = img_std_plane_size(desc);
+    img_scratch plane = img_take_scratch(size);
+    if (plane) std::memset(plane.get(), 0, size);
+    return plane;
 }
 
-// True when `length` bytes at `offset` of an in-memory image are there; a message says that they
-// are not.
-bool is_in_memory(const img_desc *desc, std::int64_t offset, std::int32_t length)
+// Fails a read of an in-memory image that does not have all of what it was asked for.
+std::int32_t fail_beyond_virtual_eof()
 {
-    if (offset + length - 1 <= desc->std_file->veof) return true;
-    if (img_std_report_errors != 0) img_fail("img_std_read_tiles: read beyond virtual eof!!\n");
-    return false;
+    return img_std_report_errors != 0 ? img_fail("img_std_read_tiles: read beyond virtual eof!!\n")
+                                      : -1;
 }
 
 // Reads `length` bytes of tiles. Returns how many came; fewer than `length` is a failure that
@@ -71,8 +70,8 @@ std::int32_t read_bytes(img_desc *desc, std::int64_t offset, std::uint8_t *buffe
                         std::int32_t length)
 {
     if (desc->mem_image) {
-        if (!is_in_memory(desc, offset, length)) return -1;
-        std::copy_n(desc->mem_image.get() + offset, length, buffer);
+        if (offset + length - 1 > desc->std_file->veof) return fail_beyond_virtual_eof();
+        std::memcpy(buffer, desc->mem_image.get() + offset, static_cast<std::size_t>(length));
         return length;
     }
     const std::int32_t got = img_std_read_at(desc, offset, buffer, length);
@@ -137,7 +136,7 @@ void split_bytes(const std::uint8_t *tile, std::size_t length, std::int32_t nbyt
 void split_tile_into_cache(const img_desc *desc, const std::uint8_t *pixels, std::int32_t tile,
                            std::int32_t band, std::uint8_t *plane)
 {
-    std::array<tile_buffer, 3> others;
+    std::array<img_scratch, 3> others;
     std::array<std::uint8_t *, 3> planes{};
     for (std::int32_t each = 0; each < desc->nbands; ++each) {
         const auto at = static_cast<std::size_t>(each);
@@ -156,24 +155,16 @@ void split_tile_into_cache(const img_desc *desc, const std::uint8_t *pixels, std
 std::int32_t read_interleaved(img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,
                               std::int32_t band, std::uint8_t *buffer)
 {
+    if (desc->mem_image) return fail_beyond_virtual_eof();  // else it had been split where it lies
     const std::int32_t length = run_bytes(desc, ntiles);
-    const std::int64_t offset = img_std_tile_offset(desc, first_tile, band);
-    tile_buffer run;  // an in-memory image is split where it lies
-    const std::uint8_t *pixels;
-    std::int32_t got = length;
-    if (desc->mem_image) {
-        if (!is_in_memory(desc, offset, length)) return -1;
-        pixels = desc->mem_image.get() + offset;
-    } else {
-        run = new_run(length);
-        if (!run) {
-            desc->std_file->read_error = ENOMEM;  // what the file holds stays unknown
-            return -1;
-        }
-        got = read_bytes(desc, offset, run.get(), length);
-        pixels = run.get();
+    const img_scratch run = new_run(length);
+    if (!run) {
+        desc->std_file->read_error = ENOMEM;  // what the file holds stays unknown
+        return -1;
     }
-
+    const std::int32_t got =
+        read_bytes(desc, img_std_tile_offset(desc, first_tile, band), run.get(), length);
+    const std::uint8_t *pixels = run.get();
     const auto tile_size = static_cast<std::size_t>(desc->std_file->tile_size);
     auto left = static_cast<std::size_t>(std::clamp(got, 0, length));
     for (std::int32_t tile = first_tile; left >= tile_size; ++tile) {
@@ -194,7 +185,7 @@ std::int32_t read_interleaved(img_desc *desc, std::int32_t first_tile, std::int3
 std::int32_t merge_with_other_bands(img_desc *desc, std::int32_t tile, std::int32_t band,
                                     const std::uint8_t *plane, std::uint8_t *pixels)
 {
-    std::array<tile_buffer, 3> others;
+    std::array<img_scratch, 3> others;
     std::array<const std::uint8_t *, 3> planes{};
     const without_cache from_the_file(desc);
     const img_std_pre_read pre_read(desc);
@@ -217,7 +208,7 @@ std::int32_t write_interleaved(img_desc *desc, std::int32_t first_tile, std::int
                                std::int32_t band, const std::uint8_t *buffer)
 {
     const std::int32_t length = run_bytes(desc, ntiles);
-    const tile_buffer run = new_run(length);
+    const img_scratch run = new_run(length);
     if (!run) return -1;
     for (std::int32_t i = 0; i < ntiles; ++i) {
         const auto at = static_cast<std::size_t>(i);
@@ -272,12 +263,39 @@ std::size_t img_std_plane_size(const img_desc *desc)
            static_cast<std::size_t>(desc->tile_nsamps) * static_cast<std::size_t>(desc->nbytes);
 }
 
+img_std_plane img_std_plane_in_tile(const img_desc *desc, std::int32_t band)
+{
+    const auto width = static_cast<std::size_t>(desc->nbytes);
+    if (!is_interleaved(desc)) return {0, width};
+    const auto position = std::ranges::find(desc->band_map, band) - desc->band_map.begin();
+    return {static_cast<std::size_t>(position) * width,
+            static_cast<std::size_t>(desc->nbands) * width};
+}
+
+bool img_std_read_lent_tiles(const img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,
+                             std::int32_t band, std::uint8_t *buffer)
+{
+    const std::int64_t begin = img_std_tile_offset(desc, first_tile, band);
+    const std::int64_t next = img_std_tile_offset(desc, std::int64_t{first_tile} + 1, band);
+    const std::int64_t end = begin + (next - begin) * (ntiles - 1) + desc->std_file->tile_size;
+    const img_std_plane plane = img_std_plane_in_tile(desc, band);
+    return img_std_lend(desc, begin, end - begin, [&](const std::uint8_t *bytes) {
+        img_std_copy_rows({bytes + plane.first, static_cast<std::size_t>(next - begin), plane.step},
+                          buffer, img_std_plane_size(desc), static_cast<std::size_t>(ntiles),
+                          img_std_plane_size(desc) / static_cast<std::size_t>(desc->nbytes),
+                          desc->nbytes, false);
+    });
+}
+
 std::int32_t img_std_read_tiles(img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,
                                 std::int32_t band, std::uint8_t *buffer)
 {
     if (ntiles < 1 || desc->std_file->tile_size == 0) return 0;
     if (desc->virtual_tiled != 0)
         return img_std_read_virtual_tiles(desc, first_tile, ntiles, band, buffer);
+    // A read of one band of interleaved tiles leaves the others in the cache.
+    const bool for_cache = is_interleaved(desc) && desc->tile_cache != nullptr;
+    if (!for_cache && img_std_read_lent_tiles(desc, first_tile, ntiles, band, buffer)) return 0;
     if (is_interleaved(desc)) return read_interleaved(desc, first_tile, ntiles, band, buffer);
 
     const std::int32_t pieces = has_planes_between(desc) ? ntiles : 1;

@@ -40,12 +40,15 @@ std::size_t memory_requested()
     return requested;
 }
 
-// The linker puts these in place of the non-throwing operator new and operator new[], which the
-// library alone uses, and calls the originals __real_.
+// The linker puts these in place of the non-throwing operators new and new[], the latter also with
+// an alignment, which the library alone uses, and calls the originals __real_.
 extern "C" {
 
 void *__real__ZnwmRKSt9nothrow_t(std::size_t size, const std::nothrow_t &tag) noexcept;
 void *__real__ZnamRKSt9nothrow_t(std::size_t size, const std::nothrow_t &tag) noexcept;
+
+void *__real__ZnamSt11align_val_tRKSt9nothrow_t(std::size_t size, std::align_val_t alignment,
+                                                const std::nothrow_t &tag) noexcept;
 
 void *__wrap__ZnwmRKSt9nothrow_t(std::size_t size, const std::nothrow_t &tag) noexcept
 {
@@ -55,5 +58,11 @@ void *__wrap__ZnwmRKSt9nothrow_t(std::size_t size, const std::nothrow_t &tag) no
 void *__wrap__ZnamRKSt9nothrow_t(std::size_t size, const std::nothrow_t &tag) noexcept
 {
     return denies(size) ? nullptr : __real__ZnamRKSt9nothrow_t(size, tag);
+}
+
+void *__wrap__ZnamSt11align_val_tRKSt9nothrow_t(std::size_t size, std::align_val_t alignment,
+                                                const std::nothrow_t &tag) noexcept
+{
+    return denies(size) ? nullptr : __real__ZnamSt11align_val_tRKSt9nothrow_t(size, alignment, tag);
 }
 }

@@ -60,8 +60,18 @@ std::int32_t fault_close(std::int32_t fd)
     return goes_wrong(io_call::close) ? -1 : result;
 }
 
+// True for a call whose answer is beyond reason; `answer` is that.
+bool goes_mad(io_call call, std::int32_t *answer)
+{
+    const bool mad = plan.what == fault::answers_min || plan.what == fault::answers_max;
+    *answer = plan.what == fault::answers_min ? INT32_MIN : INT32_MAX;
+    return mad && goes_wrong(call);
+}
+
 std::int32_t fault_read(std::int32_t fd, void *buffer, std::uint32_t count)
 {
+    std::int32_t answer;
+    if (goes_mad(io_call::read, &answer)) return answer;
     const auto asked = static_cast<std::int32_t>(count);
     const bool wrong = goes_wrong(io_call::read);
     const bool fails = wrong && plan.what == fault::fails;
@@ -85,6 +95,8 @@ std::int32_t fault_write(std::int32_t fd, const void *buffer, std::uint32_t coun
 
 std::int32_t fault_seek(std::int32_t fd, std::int32_t offset, std::int32_t whence)
 {
+    std::int32_t answer;
+    if (goes_mad(io_call::seek, &answer)) return answer;
     if (!goes_wrong(io_call::seek)) return img_platform_seek(fd, offset, whence);
     bad_call &bad = plan.bad_calls.back();
     bad.asked = whence;

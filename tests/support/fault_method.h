@@ -14,6 +14,8 @@ enum class fault {
     moves_one,   // read, write: 1 byte
     moves_half,  // read, write: half of what was asked
     stands_off,  // seek: the file stands, and is said to stand, one byte further
+    answers_min,
+    answers_max,  // read, seek: INT_MIN or INT_MAX, nothing done
 };
 
 // A call that failed, fell short or went elsewhere.

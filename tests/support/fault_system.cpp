@@ -26,9 +26,10 @@ ssize_t interruptible(std::size_t count, Transfer transfer)
 extern "C" {
 
 int __real_open(const char *name, int flags, ...);
-ssize_t __real_read(int fd, void *buffer, std::size_t count);
-ssize_t __real_write(int fd, const void *buffer, std::size_t count);
+ssize_t __real_pread(int fd, void *buffer, std::size_t count, off_t position);
+ssize_t __real_pwrite(int fd, const void *buffer, std::size_t count, off_t position);
 int __real_fstat(int fd, struct stat *status);
+int __real_clock_gettime(clockid_t clock, std::timespec *now);
 std::time_t __real_time(std::time_t *now);
 std::tm *__real_localtime_r(const std::time_t *time, std::tm *local);
 
@@ -38,18 +39,19 @@ int __wrap_open(const char *name, int flags, mode_t mode)
     return static_cast<int>(interruptible(0, open));
 }
 
-ssize_t __wrap_read(int fd, void *buffer, std::size_t count)
+ssize_t __wrap_pread(int fd, void *buffer, std::size_t count, off_t position)
 {
     if (host.reads_left > 0 && (host.reads_left == 1 || --host.reads_left == 1)) {
         errno = EIO;
         return -1;
     }
-    return interruptible(count, [=](std::size_t part) { return __real_read(fd, buffer, part); });
+    return interruptible(
+        count, [=](std::size_t part) { return __real_pread(fd, buffer, part, position); });
 }
 
-ssize_t __wrap_write(int fd, const void *buffer, std::size_t count)
+ssize_t __wrap_pwrite(int fd, const void *buffer, std::size_t count, off_t position)
 {
-    const auto write = [=](std::size_t part) { return __real_write(fd, buffer, part); };
+    const auto write = [=](std::size_t part) { return __real_pwrite(fd, buffer, part, position); };
     if (host.writes_left > 0 && --host.writes_left == 0)
         ::_exit(write(host.half_done ? count / 2 : count) == -1 ? -1 : host.last_words);
     if (host.disk_size == -1) return interruptible(count, write);
@@ -60,6 +62,13 @@ int __wrap_fstat(int fd, struct stat *status)
 {
     const int result = host.has_no_status ? -1 : __real_fstat(fd, status);
     if (host.block_devices) status->st_mode = S_IFBLK;
+    return result;
+}
+
+int __wrap_clock_gettime(clockid_t clock, std::timespec *now)
+{
+    const int result = __real_clock_gettime(clock, now);
+    now->tv_sec += host.seconds_later;
     return result;
 }
 

@@ -15,6 +15,7 @@ struct fault_host {
     int writes_left = 0;         // the process ends at the last of them; 0: it does not
     bool half_done = false;      // that one moves half of what it should
     int last_words = 0;          // what the process returns then
+    int seconds_later = 1;       // than it is: what others wrote a moment ago counts as old
 };
 inline fault_host host;
 

@@ -1,0 +1,26 @@
+// Lookup tables to 8 bits that are straight lines, as those of the stretch are: computing a line
+// takes several samples at once, which looking them up does not.
+#ifndef IMG_LINE_H
+#define IMG_LINE_H
+
+#include <cstddef>
+#include <cstdint>
+
+// Maps a sample to the bits from `shift` on of (sample - low) * multiplier, from 0 at most to
+// 255. Samples beyond `last` map as it does.
+struct img_chain_line {
+    std::uint16_t last, low;
+    std::uint16_t rise;  // (sample - low) above which it stays 255
+    std::uint32_t multiplier;
+    std::uint32_t shift;
+};
+
+// Finds the line that equals all of the `size` entries of a table, at most 4096. Returns false when
+// there is none.
+bool img_chain_find_line(const std::uint16_t *table, std::int32_t size, img_chain_line *line);
+
+// Maps `count` two-byte samples, of any alignment, to bytes.
+void img_chain_map_line(const std::uint8_t *from, std::uint8_t *to, std::size_t count,
+                        const img_chain_line &line);
+
+#endif

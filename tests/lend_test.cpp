@@ -1,0 +1,379 @@
+// Bytes that are read where they lie, what may become of them meanwhile, and the kernels that
+// move and map them.
+#include "api/scratch.h"
+#include "chain/line.h"
+#include "io/platform.h"
+#include "std/std.h"
+#include "support/effort.h"
+#include "support/fault_memory.h"
+#include "support/fault_system.h"
+#include "support/file_test.h"
+#include "support/random.h"
+#include "support/stretch_model.h"
+
+#include <functional>
+#include <thread>
+
+#include <fcntl.h>
+#include <pthread.h>
+#include <sys/mman.h>
+#include <sys/prctl.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+namespace {
+
+class Lending : public FileTest {
+protected:
+    Lending() { write_file(m_file, m_content); }
+    ~Lending() override
+    {
+        ::close(m_other);
+        host = {};
+    }
+
+    void open(std::int32_t oflags) { m_fd = img_platform_open(m_file.c_str(), oflags, 0600); }
+    // Lends bytes to `use`. Returns the result; 1: refused without a use.
+    std::int32_t lend(std::int32_t offset, std::int32_t count,
+                      std::function<void(const std::uint8_t *)> use)
+    {
+        bool used = false;
+        const std::function<void(const std::uint8_t *)> noted = [&](const std::uint8_t *lent) {
+            used = true;
+            use(lent);
+        };
+        const img_io_use_fn call = [](void *arg, const std::uint8_t *lent) {
+            (*static_cast<const std::function<void(const std::uint8_t *)> *>(arg))(lent);
+        };
+        const std::int32_t result = img_platform_lend(
+            m_fd, offset, count, call, const_cast<void *>(static_cast<const void *>(&noted)));
+        return used ? result : result == -1 ? 1 : -2;
+    }
+    std::int32_t lend_and_compare(std::int32_t offset, std::int32_t count)
+    {
+        return lend(offset, count, [&](const std::uint8_t *lent) {
+            EXPECT_TRUE(std::equal(lent, lent + count, &m_content[0] + offset));
+        });
+    }
+    void cut(std::size_t length) const
+    {
+        ASSERT_EQ(::ftruncate(m_other, static_cast<off_t>(length)), 0);
+    }
+    void restore() const { ASSERT_NE(::pwrite(m_other, &m_content[0], m_content.size(), 0), -1); }
+
+    static constexpr std::int32_t SIZE = 300'000;
+    bytes m_content = numbered(bytes(SIZE), 0, SIZE);
+    std::int32_t m_fd = -1;
+    int m_other = ::open((m_folder / "scene").c_str(), O_RDWR | O_CREAT, 0600);
+};
+
+TEST_F(Lending, GivesWhatTheFileHasNow)
+{
+    for (const std::int32_t oflags : {0, 2}) {
+        open(oflags);
+        for (const auto &[offset, count] : {std::pair{0, 1}, {0, SIZE}, {4095, 2}, {SIZE - 1, 1}})
+            EXPECT_EQ(lend_and_compare(offset, count), 0);
+        for (const auto &[offset, count] : {std::pair{0, SIZE + 1},
+                                            {SIZE, 1},
+                                            {-1, 2},
+                                            {0, 0},
+                                            {5, -1},
+                                            {INT32_MAX, INT32_MAX},
+                                            {INT32_MIN, 1}})
+            EXPECT_EQ(lend_and_compare(offset, count), 1);
+        m_content[5] ^= 1;
+        cut(10);
+        EXPECT_EQ(lend(10, 1, [](const std::uint8_t *) {}), -1);
+        EXPECT_EQ(lend_and_compare(10, 1), 1);
+        restore();
+        EXPECT_EQ(lend_and_compare(0, SIZE), 0);
+        m_content.resize(3 * SIZE, 77);
+        restore();
+        EXPECT_EQ(lend_and_compare(0, 3 * SIZE), 0);
+        m_content.resize(SIZE);
+        cut(SIZE);
+        img_platform_close(m_fd);
+        EXPECT_EQ(lend_and_compare(0, 1), 1);
+    }
+    open(1);
+    EXPECT_EQ(lend_and_compare(0, 1), 1);
+    img_platform_close(m_fd);
+    open(2);
+    host.has_no_status = true;
+    EXPECT_EQ(lend_and_compare(0, 1), 1);
+    host = {.block_devices = true};
+    EXPECT_EQ(lend_and_compare(0, 1), 1);
+    host = {.seconds_later = 0};
+    EXPECT_EQ(lend_and_compare(0, 1), -1);  // others have just changed it
+    EXPECT_EQ(img_platform_write(m_fd, &m_content[0], 1), 1);
+    EXPECT_EQ(lend_and_compare(0, 1), 0);  // the last change was this process's own
+    EXPECT_EQ(img_platform_write(m_fd, &m_content[1], 1), 1);
+    host.has_no_status = true;
+    EXPECT_EQ(lend_and_compare(0, 1), -1);
+    host = {};
+    img_platform_close(m_fd);
+}
+
+TEST_F(Lending, EndsWellWhateverBecomesOfTheFile)
+{
+    sigset_t all, mask, bus_errors;
+    ::sigfillset(&all);
+    ::sigemptyset(&bus_errors);
+    ::sigaddset(&bus_errors, SIGBUS);
+    open(0);
+    for (const bool blocked : {false, true}) {
+        ::pthread_sigmask(blocked ? SIG_SETMASK : SIG_UNBLOCK, blocked ? &all : &bus_errors, &mask);
+        for (const std::size_t length : {std::size_t{0}, std::size_t{299'990}}) {
+            for (const bool mended : {false, true}) {
+                host.seconds_later = mended ? 0 : 2;
+                const auto use = [&](const std::uint8_t *lent) {
+                    EXPECT_EQ(lent[5], m_content[105]);
+                    cut(length);
+                    EXPECT_EQ(lent[SIZE - 101], 0);
+                    if (mended) restore();
+                };
+                EXPECT_EQ(lend(100, SIZE - 100, use), -1);
+                restore();
+            }
+            host = {};
+            EXPECT_EQ(lend_and_compare(0, SIZE), 0);
+        }
+        sigset_t after;
+        ::pthread_sigmask(SIG_SETMASK, &mask, &after);
+        EXPECT_EQ(::sigismember(&after, SIGBUS), blocked ? 1 : 0);
+    }
+    img_platform_close(m_fd);
+}
+
+// --- Bus errors that are the host's ---
+
+volatile std::uint8_t *hosts_page = nullptr;
+int hosts_errors = 0;
+
+void mend_hosts_page()
+{
+    ++hosts_errors;
+    ::mmap(const_cast<std::uint8_t *>(hosts_page), 4096, PROT_READ,
+           MAP_PRIVATE | MAP_ANONYMOUS | MAP_FIXED, -1, 0);
+}
+
+TEST_F(Lending, LeavesTheHostItsBusErrors)
+{
+    open(0);
+    const int empty = ::open((m_folder / "empty").c_str(), O_RDWR | O_CREAT, 0600);
+    struct sigaction plain = {}, informed = {}, found;
+    plain.sa_handler = [](int) { mend_hosts_page(); };
+    informed.sa_flags = SA_SIGINFO;
+    informed.sa_sigaction = [](int, siginfo_t *info, void *context) {
+        EXPECT_TRUE(info->si_addr == hosts_page && context != nullptr);
+        mend_hosts_page();
+    };
+    // A page of the host below the bytes that are lent, or above them; in this thread or another.
+    for (const std::ptrdiff_t distance : {-(1 << 22), 1 << 22})
+        for (const bool elsewhere : {false, true})
+            for (const auto *const action : {&plain, &informed}) {
+                ::sigaction(SIGBUS, action, nullptr);
+                const std::int32_t result = lend(0, SIZE, [&](const std::uint8_t *lent) {
+                    void *const hint = const_cast<std::uint8_t *>(lent + distance);
+                    hosts_page = static_cast<std::uint8_t *>(
+                        ::mmap(hint, 4096, PROT_READ, MAP_SHARED, empty, 0));
+                    const auto touch = [] { EXPECT_EQ(*hosts_page, 0); };
+                    if (elsewhere)
+                        std::thread(touch).join();
+                    else
+                        touch();
+                });
+                EXPECT_EQ(result, 0);
+                ::sigaction(SIGBUS, nullptr, &found);
+                EXPECT_TRUE(found.sa_handler == action->sa_handler);
+                ::munmap(const_cast<std::uint8_t *>(hosts_page), 4096);
+            }
+    EXPECT_EQ(hosts_errors, 8);
+
+    // A signal that another program sends, and an error of the host that nobody handles.
+    const auto end_of_child = [&](auto handler, bool sent) {
+        const pid_t child = ::fork();
+        if (child == 0) {
+            ::signal(SIGBUS, handler);
+            hosts_page =
+                static_cast<std::uint8_t *>(::mmap(nullptr, 4096, PROT_READ, MAP_SHARED, empty, 0));
+            const std::int32_t result = lend(0, SIZE, [&](const std::uint8_t *) {
+                if (sent)
+                    ::raise(SIGBUS);
+                else
+                    hosts_errors += *hosts_page;
+            });
+            ::_exit(result);
+        }
+        int status = -1;
+        ::waitpid(child, &status, 0);
+        return WIFSIGNALED(status) ? -WTERMSIG(status) : WEXITSTATUS(status);
+    };
+    EXPECT_EQ(end_of_child(SIG_DFL, true), -SIGBUS);
+    EXPECT_EQ(end_of_child(SIG_IGN, true), 0);
+    EXPECT_EQ(end_of_child(SIG_DFL, false), -SIGBUS);
+    EXPECT_EQ(end_of_child(SIG_IGN, false), -SIGBUS);
+    ::signal(SIGBUS, SIG_IGN);
+    EXPECT_EQ(lend(0, SIZE, [](const std::uint8_t *) { ::raise(SIGBUS); }), 0);
+    ::signal(SIGBUS, SIG_DFL);
+    ::close(empty);
+    img_platform_close(m_fd);
+}
+
+// Another program cuts the file short and puts back what was there, all the time.
+TEST_F(Lending, WindowsAreExactOrFailWhileAFileIsCutAndMended)
+{
+    for (const std::int32_t tile : {0, 64}) {
+        const test_geometry image{
+            500, 500, 1, 1, tile, tile, tile == 0 ? IMG_LAYOUT_BSQ : IMG_LAYOUT_TILED};
+        img_handle handle = create_test_file(m_file, image);
+        bytes all(500 * 500), window(100 * 100);
+        for (std::size_t i = 0; i < all.size(); ++i)
+            all[i] = static_cast<std::uint8_t>(i % 251 + 1);
+        ASSERT_EQ(img_dump_buffer(handle, 0, 0, 500, 500, 0, &all[0], 500, nullptr), 0);
+        m_content = read_file(m_file);
+        const pid_t child = ::fork();
+        if (child == 0) ::prctl(PR_SET_PDEATHSIG, SIGKILL);
+        std::size_t length = 0;
+        while (child == 0) {
+            length = (length + 7919) % m_content.size();
+            cut(length);
+            restore();
+        }
+        const stderr_capture quiet;
+        random_numbers random(1);
+        host.seconds_later = 0;
+        int exact = 0, foreign = 0;
+        for (int i = rounds(300'000); i > 0; --i) {
+            const std::int32_t line = random.within(0, 400), samp = random.within(0, 400);
+            const std::int32_t size = random.within(1, 100);
+            if (img_load_buffer(handle, line, samp, size, size, 0, &window[0], 100, nullptr) == -1)
+                continue;
+            ++exact;
+            for (std::int32_t k = 0; k < size; ++k)
+                foreign += std::equal(&window[0] + k * 100, &window[0] + k * 100 + size,
+                                      &all[0] + (line + k) * 500 + samp)
+                               ? 0
+                               : 1;
+        }
+        EXPECT_GT(exact, 0);
+        EXPECT_EQ(foreign, 0);
+        host = {};
+        ::kill(child, SIGKILL);
+        ::waitpid(child, nullptr, 0);
+        restore();
+        img_closefile(handle);
+    }
+}
+
+// Many lines in one call end on a full disk as one by one they do.
+TEST_F(Lending, JoinedLinesFailAsSingleLinesDo)
+{
+    for (const std::int32_t swap : {0, 1})
+        for (const std::int32_t stride : {6, 8})
+            for (host.disk_size = 36; host.disk_size < 36 + 70; host.disk_size += 5) {
+                outcome seen[2];
+                bytes file[2];
+                for (const bool joined : {false, true}) {
+                    const img_handle image = create_test_file(
+                        joined ? m_file : m_name, {5, 6, 1, 2, 0, 0, IMG_LAYOUT_BSQ, swap});
+                    seen[joined] = outcome_of([&] {
+                        return img_dump_buffer(image, 0, 0, 5, 6, 0, &m_content[0], stride,
+                                               nullptr);
+                    });
+                    file[joined] = read_file(m_file);
+                    EXPECT_EQ(img_find_image(image)->std_file->veof, std::ssize(file[joined]));
+                    img_closefile(image);
+                }
+                EXPECT_EQ(seen[true], seen[false]);
+                EXPECT_EQ(file[true], file[false]);
+            }
+    host = {};
+}
+
+TEST(Scratch, KeepsALittleOfWhatWasTaken)
+{
+    constexpr std::size_t page = IMG_SCRATCH_ALIGNMENT, limit = IMG_SCRATCH_LIMIT;
+    const auto fresh_bytes = [](std::initializer_list<std::size_t> sizes) {
+        memory_arm(0);
+        std::vector<img_scratch> taken;
+        for (const std::size_t size : sizes) {
+            taken.push_back(img_take_scratch(size));
+            EXPECT_EQ(reinterpret_cast<std::uintptr_t>(taken.back().get()) % page, 0U);
+            std::fill_n(taken.back().get(), size, std::uint8_t{1});
+        }
+        return memory_requested();
+    };
+    img_free_scratch();
+    EXPECT_EQ(fresh_bytes({1, page + 1, limit / 2}), 3 * page + limit / 2);
+    EXPECT_EQ(fresh_bytes({page, 2 * page - 1, limit / 2}), 0U);
+    EXPECT_EQ(fresh_bytes({limit + 1}), limit + 1);  // which is not kept
+    EXPECT_EQ(fresh_bytes({limit / 2}), 0U);
+    EXPECT_EQ(fresh_bytes({limit}), limit);  // which leaves no room for the others
+    EXPECT_EQ(fresh_bytes({1}), page);
+    for (int i = 0; i < 2; ++i)
+        EXPECT_EQ(fresh_bytes({1, 1, 1, 1, 1, 1, 1, 1, 1}), (i == 0 ? 8 : 1) * page);
+    EXPECT_EQ(img_take_scratch(SIZE_MAX), nullptr);
+    img_mgr_cleanup();
+    EXPECT_EQ(fresh_bytes({1}), page);
+}
+
+TEST(Kernels, CopyRowsAsSampleAfterSampleDoes)
+{
+    random_numbers random(1);
+    const bytes from = numbered(bytes(40'000), 0, 40'000);
+    for (int i = rounds(20'000); i > 0; --i) {
+        const auto below = [&](std::uint32_t count) { return std::size_t{random.below(count)}; };
+        const std::size_t width = 1 + below(2), first = below(5);
+        const std::size_t step = width * (1 + below(3)), nsamps = below(i % 9 == 0 ? 300 : 40);
+        const std::size_t pitch = step * (nsamps + below(2) * 7),
+                          to_pitch = width * (nsamps + below(2));
+        const std::size_t nrows = below(18);
+        const bool exchange = width == 2 && below(2) == 0;
+        bytes to(to_pitch * nrows + nsamps * width + 1, 0xEE), expected = to;
+        for (std::size_t row = 0; row < nrows; ++row)
+            for (std::size_t samp = 0; samp < nsamps; ++samp)
+                for (std::size_t k = 0; k < width; ++k)
+                    expected[row * to_pitch + samp * width + k] =
+                        from[first + row * pitch + samp * step + (exchange ? 1 - k : k)];
+        img_std_copy_rows({&from[first], pitch, step}, &to[0], to_pitch, nrows, nsamps,
+                          static_cast<std::int32_t>(width), exchange);
+        ASSERT_EQ(to, expected);
+    }
+}
+
+TEST(Kernels, MapAlongALineAsTheTableDoes)
+{
+    random_numbers random(1);
+    samples given(70'000);
+    for (std::size_t i = 0; i < given.size(); ++i) given[i] = static_cast<std::uint16_t>(i);
+    const img_buffer_def from{7, 10'000, 0, 0, 10'000, 2, 12, 0},
+        to{7, 10'000, 0, 0, 10'000, 1, 8, 0};
+    int lines = 0, tables = 0;
+    for (; tables < 40 + rounds(1000); ++tables) {
+        const std::int32_t bits = tables % 4 == 0 ? random.within(1, 13) : 12, size = 1 << bits;
+        counters histogram(static_cast<std::size_t>(size));
+        for (int k = random.within(0, 3); k > 0; --k)
+            histogram[random.below(static_cast<std::uint32_t>(size))] += random.below(1000);
+        samples table = expected_stretch(histogram, bits, 8);
+        if (tables % 7 == 0)
+            std::ranges::fill(table,
+                              samples{0, 1, 255, 256, 300}[static_cast<std::size_t>(tables % 5)]);
+        if (tables % 5 == 0) table[random.below(static_cast<std::uint32_t>(size))] ^= 1;
+        img_chain_line line;
+        lines += img_chain_find_line(table.data(), size, &line) ? 1 : 0;
+        img_chain_lut record{static_cast<std::uint8_t>(bits), 8, size, table.data(), 0};
+        bytes mapped(given.size());
+        img_buffer_def narrow = from;
+        narrow.nbits = bits;
+        ASSERT_EQ(img_chain_lut_remap(&record, reinterpret_cast<const std::uint8_t *>(&given[0]),
+                                      &narrow, &mapped[0], &to, 0, nullptr),
+                  0);
+        for (std::size_t i = 0; i < given.size(); ++i)
+            ASSERT_EQ(mapped[i], table[std::min<std::size_t>(given[i], table.size() - 1)] % 256);
+    }
+    EXPECT_GT(lines, tables / 4);
+    EXPECT_LT(lines, tables);
+}
+
+}  // namespace
