@@ -117,7 +117,7 @@ template <typename Copy>
 void for_each_row(const std::uint8_t *from, std::size_t pitch, std::size_t nrows,
                   std::size_t length, Copy copy)
 {
-    const std::size_t ahead = length < 1024 ? 8 : 4;
+    const std::size_t ahead = length < 1024 ? 8 : 4;  // more would drive each other out
     for (std::size_t i = 0; i < nrows; ++i) {
         if (i + ahead < nrows)
             for (std::size_t at = 0; at < std::min<std::size_t>(length, 2048); at += 64)

@@ -1,5 +1,4 @@
-// libtiff, with the files of the scene as TIFF: strips and tiles as the tasks have them, read whole
-// and cut to the window, for it keeps none.
+// libtiff, where whole strips and tiles move; it keeps none that windows could be cut from.
 #include "task.h"
 
 #include <algorithm>
@@ -80,10 +79,10 @@ candidate creating(const scene &at, bool tiled)
             .samples = count_of(at.side) * count_of(at.side)};
 }
 
-std::string make_file(const scene &at, bool tiled)
+std::string make_tiles(const scene &at)
 {
-    const std::string path = at.path(tiled ? "tiles.tif" : "strips.tif");
-    const image out = create(at, path, tiled ? at.tile : 0, at.tile);
+    const std::string path = at.path("tiles.tif");
+    const image out = create(at, path, at.tile, 0);
     std::vector<std::uint8_t> strip;
     for (std::int32_t line = 0; line < at.side; line += at.tile) {
         strip.clear();
@@ -91,59 +90,21 @@ std::string make_file(const scene &at, bool tiled)
             const auto samples = line_of_bytes(at, line + i);
             strip.insert(strip.end(), samples.begin(), samples.end());
         }
-        write(out, at, tiled, {line, 0, at.tile, at.side}, strip.data());
+        write(out, at, true, {line, 0, at.tile, at.side}, strip.data());
     }
     return path;
-}
-
-// Reads all tiles that a window touches, and copies what it needs of them.
-void read_tiles(const image &in, const scene &at, const window &each, std::uint8_t *to)
-{
-    const std::int32_t width = at.tile;
-    static std::vector<std::uint8_t> tile;
-    tile.resize(count_of(width) * count_of(width));
-    for (std::int32_t top = each.line / width * width; top < each.line + each.nlines; top += width)
-        for (std::int32_t left = each.samp / width * width; left < each.samp + each.nsamps;
-             left += width) {
-            TIFFReadTile(in.get(), tile.data(), static_cast<std::uint32_t>(left),
-                         static_cast<std::uint32_t>(top), 0, 0);
-            const std::int32_t first = std::max(left, each.samp);
-            const std::int32_t count = std::min(left + width, each.samp + each.nsamps) - first;
-            for (std::int32_t line = std::max(top, each.line);
-                 line < std::min(top + width, each.line + each.nlines); ++line)
-                std::memcpy(to + count_of(line - each.line) * count_of(each.nsamps) +
-                                count_of(first - each.samp),
-                            &tile[count_of(line - top) * count_of(width) + count_of(first - left)],
-                            count_of(count));
-        }
-}
-
-void read_lines(const image &in, const window &each, std::uint8_t *to)
-{
-    for (std::int32_t i = 0; i < each.nlines; ++i)
-        TIFFReadScanline(in.get(), to + count_of(i) * count_of(each.nsamps),
-                         static_cast<std::uint32_t>(each.line + i), 0);
 }
 
 }  // namespace
 
 void add_libtiff(const scene &at, std::vector<task> &tasks)
 {
-    const image strips = open(make_file(at, false), "r"), tiles = open(make_file(at, true), "r");
-    tasks[2].candidates.push_back(
-        {.name = "libtiff", .move = [=](const window &each, std::uint8_t *buffer) {
-             read_lines(strips, each, buffer);
-         }});
-    for (const std::size_t i : {3U, 4U})
-        tasks[i].candidates.push_back(
-            {.name = "libtiff", .move = [=](const window &each, std::uint8_t *buffer) {
-                 read_tiles(tiles, at, each, buffer);
-             }});
     tasks[7].candidates.push_back(creating(at, false));
     tasks[8].candidates.push_back(creating(at, true));
     tasks[10].candidates.push_back(
-        {.name = "libtiff", .move = [=](const window &run, std::uint8_t *buffer) {
-             const std::size_t size = count_of(at.tile) * count_of(at.tile);
+        {.name = "libtiff",
+         .move = [tiles = open(make_tiles(at), "r"), size = count_of(at.tile) * count_of(at.tile)](
+                     const window &run, std::uint8_t *buffer) {
              for (std::int32_t i = 0; i < run.nlines; ++i)
                  TIFFReadRawTile(tiles.get(), static_cast<std::uint32_t>(run.line + i),
                                  buffer + count_of(i) * size, static_cast<tmsize_t>(size));

@@ -3,8 +3,8 @@
 // imgfile_bench [--small] [--dir=FOLDER] [--json=FILE] [--scaling | TASK...]
 //   TASK      T1 to T12; all of them when none is named
 //   --small   tiny images and two rounds: does everything work, and do all agree?
-//   --dir     where the images are made, some 800 MB of them; they are removed at the end. Without
-//             it the folder for temporary files.
+//   --dir     where the images are made, 1 GB of them and half as much for peers; they are removed
+//             at the end. Without it the folder for temporary files.
 //   --json    where the medians are written to, beside the table
 //   --scaling how the costs of the library alone grow with images, windows, tiles and bands
 // Options of Google Benchmark are taken, too. Exit status 1 when candidates differ in what they

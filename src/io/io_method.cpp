@@ -40,7 +40,9 @@ std::int32_t img_register_io_method(const char *name, std::int32_t (*init_op)(co
                                     img_io_write_fn write, img_io_seek_fn seek,
                                     img_io_unlink_fn unlink, img_io_value_fn get_value)
 {
-    if (name == nullptr || img_find_io_method(name) != -1 || img_io_method_count == IMG_MAX_IO_METHODS) return -1;
+    if (name == nullptr || img_find_io_method(name) != -1 ||
+        img_io_method_count == IMG_MAX_IO_METHODS)
+        return -1;
     const auto slot = static_cast<std::size_t>(img_io_method_count++);
     img_io_method_table[slot] = {
         .name = name,
