@@ -291,6 +291,29 @@ TEST_F(Lending, JoinedLinesFailAsSingleLinesDo)
     host = {};
 }
 
+// Where only some lines of stored tiles would have to be written and a write fails, all is as if
+// whole tiles had been written from the start.
+TEST_F(Lending, TouchedLinesFailAsWholeTilesDo)
+{
+    for (int limit = 36; limit <= 36 + 2 * 64; limit += 4) {
+        outcome seen[2];
+        bytes file[2];
+        for (const bool touched : {false, true}) {
+            const img_handle image = create_test_file(touched ? m_file : m_name,
+                                                      {16, 16, 1, 1, 8, 8, IMG_LAYOUT_TILED, 0});
+            EXPECT_EQ(img_dump_tiles(image, 0, 4, 0, &m_content[7]), 0);
+            host.disk_size = limit;
+            seen[touched] = outcome_of(
+                [&] { return img_dump_buffer(image, 3, 4, 5, 10, 0, &m_content[0], 10, nullptr); });
+            host = {};
+            img_closefile(image);
+            file[touched] = read_file(m_file);
+        }
+        EXPECT_EQ(seen[true], seen[false]);
+        EXPECT_EQ(file[true], file[false]);
+    }
+}
+
 TEST(Scratch, KeepsALittleOfWhatWasTaken)
 {
     constexpr std::size_t page = IMG_SCRATCH_ALIGNMENT, limit = IMG_SCRATCH_LIMIT;

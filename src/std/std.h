@@ -220,10 +220,12 @@ struct img_std_plane {
 };
 img_std_plane img_std_plane_in_tile(const img_desc *desc, std::int32_t band);
 
-// Copies a run out of the tiles where they lie. Returns false when they are not lent; then
-// `buffer` may have been written.
+// Copies a run out of the tiles where they lie, of each plane the `nsamps` samples from
+// `first_sample` on. Returns false when the run is not lent whole; then `buffer` may have been
+// written.
 bool img_std_read_lent_tiles(const img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,
-                             std::int32_t band, std::uint8_t *buffer);
+                             std::int32_t band, std::size_t first_sample, std::size_t nsamps,
+                             std::uint8_t *buffer);
 
 // Copy the samples of each band between one pixel-interleaved tile and the bands' planes; sample
 // i of a pixel belongs to band `band_map`[i]. Bands whose plane is null are passed over.

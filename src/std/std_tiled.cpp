@@ -97,6 +97,8 @@ public:
             });
         }
     }
+    // The lines of its tiles that the region touches.
+    tile_span::part lines_in_tile(std::int32_t tile_row) const { return m_lines.in_tile(tile_row); }
     // Bytes from one row of the caller's buffer to the next, and from one line of a plane.
     std::size_t buffer_pitch() const { return extent(m_stride) * extent(m_desc->nbytes); }
     std::size_t plane_pitch() const { return extent(m_desc->tile_nsamps) * extent(m_desc->nbytes); }
@@ -139,6 +141,44 @@ bool read_lent_tiles(const img_desc *desc, const tiled_region &region, std::int3
                                   part.nsamps, desc->nbytes, exchange);
             });
     });
+}
+
+// Lays the part of the region that lies in a row of tiles over what is in `run`.
+void lay_over(const img_desc *desc, const tiled_region &region, std::int32_t row,
+              const std::uint8_t *buffer, std::uint8_t *run)
+{
+    region.for_each_tile(row, [&](const tile_part &part) {
+        img_std_copy_rows({buffer + part.buffer_byte, region.buffer_pitch(),
+                           static_cast<std::size_t>(desc->nbytes)},
+                          run + part.run_byte, region.plane_pitch(), part.nlines, part.nsamps,
+                          desc->nbytes, img_std_exchanges_bytes(desc));
+    });
+}
+
+// Writes those lines of a run that the region touches, without the rest of its tiles. Returns
+// false when the file does not hold the run yet, or not all could be written: then the run is to be
+// stored whole.
+bool write_touched_lines(img_desc *desc, const tiled_region &region, std::int32_t row,
+                         std::int32_t band, const std::uint8_t *buffer, std::uint8_t *run)
+{
+    const std::int32_t first_tile = region.first_tile(row);
+    const auto width = static_cast<std::size_t>(desc->nbytes);
+    const tile_span::part lines = region.lines_in_tile(row);
+    const std::size_t skipped = static_cast<std::size_t>(lines.first) * region.plane_pitch();
+    const std::size_t length = static_cast<std::size_t>(lines.count) * region.plane_pitch();
+    if (!img_std_read_lent_tiles(desc, first_tile, region.ntiles(), band, skipped / width,
+                                 length / width, run))
+        return false;
+    lay_over(desc, region, row, buffer, run);
+    for (std::int32_t i = 0; i < region.ntiles(); ++i) {
+        const std::int64_t offset =
+            img_std_tile_offset(desc, first_tile + i, band) + static_cast<std::int64_t>(skipped);
+        if (img_std_write_at(desc, offset, run + skipped, static_cast<std::int32_t>(length)) !=
+            static_cast<std::int32_t>(length))
+            return false;
+        run += img_std_plane_size(desc);
+    }
+    return true;
 }
 
 // Lays what the image holds of a run over what is in `run`. Returns 0, or -1 after a message
@@ -199,23 +239,21 @@ std::int32_t img_std_write_tiled(img_desc *desc, std::int32_t line, std::int32_t
     const img_scratch run = img_take_scratch(region.run_length());
     if (!run) return img_fail_errno("img_std_write_tiled:malloc");
     const bool direct = reaches_stored_tiles(desc);
-    const auto width = static_cast<std::size_t>(desc->nbytes);
+    const bool in_planes =
+        img_std_plane_in_tile(desc, band).step == static_cast<std::size_t>(desc->nbytes);
     for (std::int32_t row = 0; row < region.tile_rows(); ++row) {
         const std::int32_t first_tile = region.first_tile(row);
-        const bool has_old_samples = !direct || !region.covers_run(row);
-        if (has_old_samples &&
-            !(direct &&
-              img_std_read_lent_tiles(desc, first_tile, region.ntiles(), band, run.get()))) {
-            img_fill_samples(run.get(), region.run_length() / width, desc->nbytes,
-                             fill != nullptr ? fill : img_zero_sample.data());
+        if (!direct || !region.covers_run(row)) {
+            if (direct && in_planes &&
+                write_touched_lines(desc, region, row, band, buffer, run.get()))
+                continue;
+            img_fill_samples(run.get(),
+                             region.run_length() / static_cast<std::size_t>(desc->nbytes),
+                             desc->nbytes, fill != nullptr ? fill : img_zero_sample.data());
             if (read_stored_run(desc, first_tile, region.ntiles(), band, run.get()) == -1)
                 return -1;
         }
-        region.for_each_tile(row, [&](const tile_part &part) {
-            img_std_copy_rows({buffer + part.buffer_byte, region.buffer_pitch(), width},
-                              run.get() + part.run_byte, region.plane_pitch(), part.nlines,
-                              part.nsamps, desc->nbytes, img_std_exchanges_bytes(desc));
-        });
+        lay_over(desc, region, row, buffer, run.get());
         if (img_dump_tiles(desc->handle, first_tile, region.ntiles(), band, run.get()) == -1)
             return -1;
     }

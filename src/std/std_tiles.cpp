@@ -39,6 +39,12 @@ bool has_planes_between(const img_desc *desc)
     return desc->layout == IMG_LAYOUT_TILED && desc->nbands > 1;
 }
 
+std::size_t plane_samples(const img_desc *desc)
+{
+    return static_cast<std::size_t>(desc->tile_nlines) *
+           static_cast<std::size_t>(desc->tile_nsamps);
+}
+
 std::int32_t run_bytes(const img_desc *desc, std::int32_t ntiles)
 {
     return ntiles * desc->std_file->tile_size;
@@ -259,8 +265,7 @@ std::int32_t img_std_pre_read::result() const
 
 std::size_t img_std_plane_size(const img_desc *desc)
 {
-    return static_cast<std::size_t>(desc->tile_nlines) *
-           static_cast<std::size_t>(desc->tile_nsamps) * static_cast<std::size_t>(desc->nbytes);
+    return plane_samples(desc) * static_cast<std::size_t>(desc->nbytes);
 }
 
 img_std_plane img_std_plane_in_tile(const img_desc *desc, std::int32_t band)
@@ -273,16 +278,18 @@ img_std_plane img_std_plane_in_tile(const img_desc *desc, std::int32_t band)
 }
 
 bool img_std_read_lent_tiles(const img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,
-                             std::int32_t band, std::uint8_t *buffer)
+                             std::int32_t band, std::size_t first_sample, std::size_t nsamps,
+                             std::uint8_t *buffer)
 {
     const std::int64_t begin = img_std_tile_offset(desc, first_tile, band);
     const std::int64_t next = img_std_tile_offset(desc, std::int64_t{first_tile} + 1, band);
     const std::int64_t end = begin + (next - begin) * (ntiles - 1) + desc->std_file->tile_size;
     const img_std_plane plane = img_std_plane_in_tile(desc, band);
     return img_std_lend(desc, begin, end - begin, [&](const std::uint8_t *bytes) {
-        img_std_copy_rows({bytes + plane.first, static_cast<std::size_t>(next - begin), plane.step},
-                          buffer, img_std_plane_size(desc), static_cast<std::size_t>(ntiles),
-                          img_std_plane_size(desc) / static_cast<std::size_t>(desc->nbytes),
+        img_std_copy_rows({bytes + plane.first + first_sample * plane.step,
+                           static_cast<std::size_t>(next - begin), plane.step},
+                          buffer + first_sample * static_cast<std::size_t>(desc->nbytes),
+                          img_std_plane_size(desc), static_cast<std::size_t>(ntiles), nsamps,
                           desc->nbytes, false);
     });
 }
@@ -295,7 +302,9 @@ std::int32_t img_std_read_tiles(img_desc *desc, std::int32_t first_tile, std::in
         return img_std_read_virtual_tiles(desc, first_tile, ntiles, band, buffer);
     // A read of one band of interleaved tiles leaves the others in the cache.
     const bool for_cache = is_interleaved(desc) && desc->tile_cache != nullptr;
-    if (!for_cache && img_std_read_lent_tiles(desc, first_tile, ntiles, band, buffer)) return 0;
+    if (!for_cache &&
+        img_std_read_lent_tiles(desc, first_tile, ntiles, band, 0, plane_samples(desc), buffer))
+        return 0;
     if (is_interleaved(desc)) return read_interleaved(desc, first_tile, ntiles, band, buffer);
 
     const std::int32_t pieces = has_planes_between(desc) ? ntiles : 1;
