@@ -83,7 +83,6 @@ TEST_F(Lending, GivesWhatTheFileHasNow)
             EXPECT_EQ(lend_and_compare(offset, count), 1);
         m_content[5] ^= 1;
         cut(10);
-        EXPECT_EQ(lend(10, 1, [](const std::uint8_t *) {}), -1);
         EXPECT_EQ(lend_and_compare(10, 1), 1);
         restore();
         EXPECT_EQ(lend_and_compare(0, SIZE), 0);
@@ -101,17 +100,59 @@ TEST_F(Lending, GivesWhatTheFileHasNow)
     open(2);
     host.has_no_status = true;
     EXPECT_EQ(lend_and_compare(0, 1), 1);
-    host = {.block_devices = true};
-    EXPECT_EQ(lend_and_compare(0, 1), 1);
-    host = {.seconds_later = 0};
-    EXPECT_EQ(lend_and_compare(0, 1), -1);  // others have just changed it
-    EXPECT_EQ(img_platform_write(m_fd, &m_content[0], 1), 1);
-    EXPECT_EQ(lend_and_compare(0, 1), 0);  // the last change was this process's own
-    EXPECT_EQ(img_platform_write(m_fd, &m_content[1], 1), 1);
-    host.has_no_status = true;
-    EXPECT_EQ(lend_and_compare(0, 1), -1);
+    struct kind_of_file {
+        fault_host host;
+        std::int32_t result;
+    };
+    for (const auto &[kind, result] : {kind_of_file{{.block_devices = true}, 1},
+                                       {{.remote = true}, 1},
+                                       {{.memory = true, .holes = true}, 1},
+                                       {{.memory = true}, 0},
+                                       {{.holes = true}, 0}}) {
+        host = kind;
+        EXPECT_EQ(lend_and_compare(0, 1), result);
+        EXPECT_EQ(lend_and_compare(0, 1), result);
+        img_platform_close(m_fd);
+        open(2);
+    }
     host = {};
+    EXPECT_EQ(lend_and_compare(0, 1), 0);
+    EXPECT_EQ(lend(0, 1, [](const std::uint8_t *) { host.has_no_status = true; }), -1);
+    host = {};
+    EXPECT_EQ(lend_and_compare(0, 1), 0);
+    ASSERT_NE(::dup2(m_other, m_fd), -1);  // the file now is another one of the same content
+    write_file((m_folder / "other").c_str(), bytes(SIZE, 9));
+    const int another = ::open((m_folder / "other").c_str(), O_RDWR);
+    ASSERT_NE(::dup2(another, m_fd), -1);
+    EXPECT_EQ(lend(0, 1, [](const std::uint8_t *lent) { EXPECT_EQ(*lent, 9); }), 0);
+    host.stamp = 1;
+    EXPECT_EQ(lend(0, 1, [&](auto) { EXPECT_EQ(::ftruncate(another, 5), 0); }), -1);
+    EXPECT_EQ(lend(0, 1, [&](auto) { ASSERT_NE(::dup2(m_other, m_fd), -1); }), -1);
+    host = {};
+    ::close(another);
     img_platform_close(m_fd);
+}
+
+// Bytes are lent only when a change meanwhile would get another stamp than the last one.
+TEST_F(Lending, WaitsUntilChangesShow)
+{
+    constexpr long second = 1'000'000'000, start = 100 * second;
+    const auto at = [&](long stamp, long now) {
+        host.stamp = stamp;
+        host.now = now;
+        return lend_and_compare(0, SIZE);
+    };
+    open(0);
+    EXPECT_EQ(at(start + 1, start + 9'000'000), 1);  // the clock may still say what it said then
+    EXPECT_EQ(at(start + 1, start - second), 1);     // another clock
+    EXPECT_EQ(at(start + 1, start + 21'000'000), 0);
+    EXPECT_EQ(at(start + second, start + 2 * second), 1);  // a clock that counts seconds
+    EXPECT_EQ(at(start + second, start + 4 * second), 0);
+    EXPECT_EQ(at(start + 5 * second + 6'000'000, start + 5 * second), 1);
+    EXPECT_EQ(at(start + 5 * second + 7'000'000, start + 5 * second), 1);
+    EXPECT_EQ(at(start + 5 * second + 7'000'100, start + 5 * second), 0);  // one that never stands
+    img_platform_close(m_fd);
+    host = {};
 }
 
 TEST_F(Lending, EndsWellWhateverBecomesOfTheFile)
@@ -125,12 +166,13 @@ TEST_F(Lending, EndsWellWhateverBecomesOfTheFile)
         ::pthread_sigmask(blocked ? SIG_SETMASK : SIG_UNBLOCK, blocked ? &all : &bus_errors, &mask);
         for (const std::size_t length : {std::size_t{0}, std::size_t{299'990}}) {
             for (const bool mended : {false, true}) {
-                host.seconds_later = mended ? 0 : 2;
+                host.stamp = 1;
                 const auto use = [&](const std::uint8_t *lent) {
                     EXPECT_EQ(lent[5], m_content[105]);
                     cut(length);
                     EXPECT_EQ(lent[SIZE - 101], 0);
                     if (mended) restore();
+                    host.stamp = 2;
                 };
                 EXPECT_EQ(lend(100, SIZE - 100, use), -1);
                 restore();
@@ -189,6 +231,30 @@ TEST_F(Lending, LeavesTheHostItsBusErrors)
                 ::munmap(const_cast<std::uint8_t *>(hosts_page), 4096);
             }
     EXPECT_EQ(hosts_errors, 8);
+
+    // Another thread has a handler of its own for a while, which ends at the wrong time.
+    struct sigaction during;
+    ::sigaction(SIGBUS, &plain, nullptr);
+    EXPECT_EQ(lend(0, SIZE, [&](auto) { ::sigaction(SIGBUS, &informed, &during); }), 0);
+    ::sigaction(SIGBUS, &during, &found);
+    EXPECT_TRUE(found.sa_sigaction == informed.sa_sigaction);
+    ::raise(SIGBUS);
+    EXPECT_EQ(hosts_errors, 9);
+    EXPECT_EQ(lend(0, SIZE, [](auto) { ::raise(SIGBUS); }), 0);
+    EXPECT_EQ(hosts_errors, 10);
+    ::sigaction(SIGBUS, nullptr, &found);
+    EXPECT_TRUE(found.sa_handler == plain.sa_handler);
+
+    // Another thread reads what is cut off.
+    EXPECT_EQ(lend(0, SIZE,
+                   [&](const std::uint8_t *lent) {
+                       hosts_page = const_cast<std::uint8_t *>(lent);
+                       cut(0);
+                       std::thread([=] { EXPECT_EQ(*hosts_page, 0); }).join();
+                   }),
+              -1);
+    EXPECT_EQ(hosts_errors, 11);
+    restore();
 
     // A signal that another program sends, and an error of the host that nobody handles.
     const auto end_of_child = [&](auto handler, bool sent) {
@@ -277,6 +343,9 @@ TEST_F(Lending, JoinedLinesFailAsSingleLinesDo)
                 for (const bool joined : {false, true}) {
                     const img_handle image = create_test_file(
                         joined ? m_file : m_name, {5, 6, 1, 2, 0, 0, IMG_LAYOUT_BSQ, swap});
+                    EXPECT_EQ(img_std_write_nontiled(img_find_image(image), 0, 0, -5, 6, 0,
+                                                     &m_content[0], 6, nullptr),
+                              0);
                     seen[joined] = outcome_of([&] {
                         return img_dump_buffer(image, 0, 0, 5, 6, 0, &m_content[0], stride,
                                                nullptr);
@@ -295,16 +364,17 @@ TEST_F(Lending, JoinedLinesFailAsSingleLinesDo)
 // whole tiles had been written from the start.
 TEST_F(Lending, TouchedLinesFailAsWholeTilesDo)
 {
-    for (int limit = 36; limit <= 36 + 2 * 64; limit += 4) {
+    for (int limit = 36; limit <= 36 + 2 * 16384; limit += 1024) {
         outcome seen[2];
         bytes file[2];
         for (const bool touched : {false, true}) {
-            const img_handle image = create_test_file(touched ? m_file : m_name,
-                                                      {16, 16, 1, 1, 8, 8, IMG_LAYOUT_TILED, 0});
+            const img_handle image = create_test_file(
+                touched ? m_file : m_name, {256, 256, 1, 1, 128, 128, IMG_LAYOUT_TILED, 0});
             EXPECT_EQ(img_dump_tiles(image, 0, 4, 0, &m_content[7]), 0);
             host.disk_size = limit;
-            seen[touched] = outcome_of(
-                [&] { return img_dump_buffer(image, 3, 4, 5, 10, 0, &m_content[0], 10, nullptr); });
+            seen[touched] = outcome_of([&] {
+                return img_dump_buffer(image, 70, 4, 58, 190, 0, &m_content[0], 190, nullptr);
+            });
             host = {};
             img_closefile(image);
             file[touched] = read_file(m_file);
@@ -312,6 +382,22 @@ TEST_F(Lending, TouchedLinesFailAsWholeTilesDo)
         EXPECT_EQ(seen[true], seen[false]);
         EXPECT_EQ(file[true], file[false]);
     }
+}
+
+// A window that has all of a tile does not make up for the right to read it.
+TEST_F(Lending, WritingAloneDoesNotReplaceTiles)
+{
+    outcome seen[2];
+    for (const bool lends : {false, true}) {
+        const img_handle image =
+            create_test_file(lends ? m_file : m_name, {8, 8, 1, 1, 8, 8, IMG_LAYOUT_TILED, 0});
+        img_find_image(image)->oflags ^= IMG_OPEN_READ_WRITE ^ IMG_OPEN_WRITE_ONLY;
+        seen[lends] = outcome_of(
+            [&] { return img_dump_buffer(image, 0, 0, 8, 8, 0, &m_content[0], 8, nullptr); });
+        img_closefile(image);
+    }
+    EXPECT_EQ(seen[true], seen[false]);
+    EXPECT_EQ(seen[true].result, -1);
 }
 
 TEST(Scratch, KeepsALittleOfWhatWasTaken)

@@ -1,19 +1,32 @@
 #include "api/report.h"
 
+#include <array>
+#include <cerrno>
 #include <cstdarg>
 #include <cstdio>
+#include <cstring>
 
 std::int32_t img_fail(const char *format, ...)
 {
     std::va_list arguments;
     va_start(arguments, format);
-    std::vfprintf(stderr, format, arguments);
+    if (img_message_sink != nullptr) {
+        std::array<char, 512> text;
+        std::vsnprintf(text.data(), text.size(), format, arguments);
+        text[std::strcspn(text.data(), "\n")] = '\0';
+        img_message_sink(text.data(), 0);
+    } else {
+        std::vfprintf(stderr, format, arguments);
+    }
     va_end(arguments);
     return -1;
 }
 
 std::int32_t img_fail_errno(const char *prefix)
 {
-    std::perror(prefix);
+    if (img_message_sink != nullptr)
+        img_message_sink(prefix, errno);
+    else
+        std::perror(prefix);
     return -1;
 }

@@ -1,6 +1,7 @@
 #include "io/lend_posix.h"
 
 #include <algorithm>
+#include <array>
 #include <bit>
 #include <csignal>
 #include <ctime>
@@ -8,6 +9,7 @@
 #include <pthread.h>
 #include <sys/mman.h>
 #include <sys/stat.h>
+#include <sys/vfs.h>
 #include <unistd.h>
 
 namespace {
@@ -16,7 +18,7 @@ namespace {
 struct {
     pthread_t thread;
     std::uint8_t *begin;
-    std::size_t size;
+    std::size_t size;                 // 0: nobody uses it
     struct sigaction found;           // what the host does about bus errors
     volatile std::sig_atomic_t torn;  // 1: some of the bytes were not there
 } in_use;
@@ -25,8 +27,8 @@ struct {
 bool is_torn(const siginfo_t *info)
 {
     const auto *const address = static_cast<const std::uint8_t *>(info->si_addr);
-    return info->si_code > 0 && ::pthread_equal(::pthread_self(), in_use.thread) != 0 &&
-           address >= in_use.begin && address < in_use.begin + in_use.size;
+    return info->si_code > 0 && address >= in_use.begin && address < in_use.begin + in_use.size &&
+           ::pthread_equal(::pthread_self(), in_use.thread) != 0;
 }
 
 // Does what would have happened without this library.
@@ -58,88 +60,149 @@ void on_bus_error(int signal, siginfo_t *info, void *context)
         leave_to_host(signal, info, context);
         return;
     }
-    static_cast<void>(::mmap(in_use.begin, in_use.size, PROT_READ,
-                             MAP_PRIVATE | MAP_ANONYMOUS | MAP_FIXED, -1, 0));
+    const void *const zeros = ::mmap(in_use.begin, in_use.size, PROT_READ,
+                                     MAP_PRIVATE | MAP_ANONYMOUS | MAP_FIXED, -1, 0);
     in_use.torn = 1;
+    // unreachable: what takes the place of a mapping finds room
+    if (zeros == MAP_FAILED) leave_to_host(signal, info, context);
 }
 
-img_file_time time_of(const std::timespec &time)
+bool is_ours(const struct sigaction &action)
 {
-    return img_file_time{time.tv_sec} * 1'000'000'000 + time.tv_nsec;
+    return (action.sa_flags & SA_SIGINFO) != 0 && action.sa_sigaction == on_bus_error;
 }
 
-// A blocked bus error ends the process. To ask whether it is blocked takes a tenth of the time of a
-// small window, and the answer holds for a thread until that changes its mind.
-class unblocked_bus_errors {
+// Takes bus errors from the host while it lives.
+class bus_error_guard {
 public:
-    explicit unblocked_bus_errors(img_file_time now)
+    bus_error_guard()
     {
-        if (::pthread_equal(::pthread_self(), thread_asked) != 0 && now >= asked &&
-            now < asked + validity)
-            return;
-        sigset_t bus_errors;
+        struct sigaction ours;
+        ours.sa_sigaction = on_bus_error;
+        ours.sa_flags = SA_SIGINFO | SA_NODEFER | SA_ONSTACK;
+        ::sigemptyset(&ours.sa_mask);
+        struct sigaction found;
+        ::sigaction(SIGBUS, &ours, &found);
+        // Ours is found where a handler of the host has jumped out of an earlier use.
+        if (!is_ours(found)) in_use.found = found;
+
+        sigset_t bus_errors;  // a blocked one ends the process
         ::sigemptyset(&bus_errors);
         ::sigaddset(&bus_errors, SIGBUS);
         ::pthread_sigmask(SIG_UNBLOCK, &bus_errors, &m_mask);
-        m_were_blocked = ::sigismember(&m_mask, SIGBUS) != 0;
-        thread_asked = ::pthread_self();
-        asked = m_were_blocked ? 0 : now;
     }
-    ~unblocked_bus_errors()
+    ~bus_error_guard()
     {
-        if (m_were_blocked) ::pthread_sigmask(SIG_SETMASK, &m_mask, nullptr);
+        if (::sigismember(&m_mask, SIGBUS) != 0) ::pthread_sigmask(SIG_SETMASK, &m_mask, nullptr);
+        struct sigaction last;
+        ::sigaction(SIGBUS, &in_use.found, &last);
+        // What another thread has installed meanwhile is to stay.
+        if (!is_ours(last)) ::sigaction(SIGBUS, &last, nullptr);
     }
-    unblocked_bus_errors(const unblocked_bus_errors &) = delete;
-    unblocked_bus_errors &operator=(const unblocked_bus_errors &) = delete;
+    bus_error_guard(const bus_error_guard &) = delete;
+    bus_error_guard &operator=(const bus_error_guard &) = delete;
 
 private:
-    static constexpr img_file_time validity = 1'000'000;
-    static inline pthread_t thread_asked{};
-    static inline img_file_time asked = 0;  // and found not blocked
-
-    bool m_were_blocked = false;
     sigset_t m_mask;
 };
 
 // Calls `use` while bus errors in the mapping are caught. Returns false when there was one.
-bool use_guarded(std::uint8_t *mapping, std::size_t size, img_file_time now, std::int32_t offset,
-                 img_io_use_fn use, void *arg)
+bool use_guarded(std::uint8_t *mapping, std::size_t size, std::int32_t offset, img_io_use_fn use,
+                 void *arg)
 {
     in_use.thread = ::pthread_self();
     in_use.begin = mapping;
     in_use.size = size;
     in_use.torn = 0;
-    struct sigaction action;
-    action.sa_sigaction = on_bus_error;
-    action.sa_flags = SA_SIGINFO | SA_NODEFER | SA_ONSTACK;
-    ::sigemptyset(&action.sa_mask);
-    ::sigaction(SIGBUS, &action, &in_use.found);
     {
-        const unblocked_bus_errors meanwhile(now);
+        const bus_error_guard guard;
         use(arg, mapping + offset);
     }
-    ::sigaction(SIGBUS, &in_use.found, nullptr);
+    in_use.size = 0;
     return in_use.torn == 0;
 }
 
+constexpr img_file_time SECOND = 1'000'000'000;
+
+img_file_time time_of(const std::timespec &time)
+{
+    return img_file_time{time.tv_sec} * SECOND + time.tv_nsec;
+}
+
+constexpr std::uint32_t TMPFS = 0x01021994;
+
+// Returns the kind of a file system whose stamps are of this machine's clock; 0: it may not be one.
+std::uint32_t local_file_system(int fd)
+{
+    constexpr std::array<std::uint32_t, 6> known{0xEF53,      // ext2, ext3, ext4
+                                                 0x58465342,  // XFS
+                                                 0x9123683E,  // Btrfs
+                                                 0xF2F52010,  // F2FS
+                                                 0x794C7630,  // overlay
+                                                 TMPFS};
+    struct statfs system = {};
+    ::fstatfs(fd, &system);
+    const auto kind = static_cast<std::uint32_t>(system.f_type);
+    return std::ranges::count(known, kind) != 0 ? kind : 0;
+}
+
 }  // namespace
+
+bool img_file_mapping::is_same_file(const state &a, const state &b)
+{
+    return a.device == b.device && a.inode == b.inode;
+}
+
+// Returns false when there is nothing to be seen.
+bool img_file_mapping::look_at(int fd)
+{
+    struct stat status;
+    if (::fstat(fd, &status) == -1) return false;
+    const state now{.length = status.st_size,
+                    .change = time_of(status.st_ctim),
+                    .device = status.st_dev,
+                    .inode = status.st_ino,
+                    .has_holes = status.st_blocks * 512 < status.st_size};
+    // Where stamps come from a clock that stands still for a while, two that differ are a
+    // millisecond apart at least.
+    const img_file_time since = now.change - m_seen.change;
+    if (!is_same_file(now, m_seen))
+        m_has_fine_stamps = false;
+    else if (since > 0 && since < SECOND / 2'000)
+        m_has_fine_stamps = true;
+    m_seen = now;
+    return true;
+}
+
+// True when a change from now on gets another stamp than the last one did: a clock that stands
+// still for up to 10 milliseconds, or counts seconds alone, must have gone on since.
+bool img_file_mapping::shows_changes() const
+{
+    if (m_has_fine_stamps) return true;
+    std::timespec now;
+    ::clock_gettime(CLOCK_REALTIME, &now);
+    const bool counts_seconds = m_seen.change % SECOND == 0;
+    return m_seen.change < time_of(now) - (counts_seconds ? 2 * SECOND : SECOND / 50);
+}
 
 // Makes the mapping reach `end`, which lies in the file. It is made larger than the file, so that
 // one that grows is not mapped anew for each of its lines.
 bool img_file_mapping::covers(int fd, std::int64_t end)
 {
-    if (end <= m_size) return true;
+    if (end <= m_size && is_same_file(m_mapped, m_seen)) return true;
     drop();
-    struct stat status;
-    if (::fstat(fd, &status) == -1 || !S_ISREG(status.st_mode)) return false;
+    const std::uint32_t kind = local_file_system(fd);
+    if (kind == 0) return false;
     constexpr std::uint64_t smallest = 1U << 16U;
     constexpr std::uint64_t largest = 1U << 31U;
     const std::uint64_t size =
-        std::bit_ceil(std::clamp(static_cast<std::uint64_t>(m_length), smallest, largest));
+        std::bit_ceil(std::clamp(static_cast<std::uint64_t>(m_seen.length), smallest, largest));
     void *const bytes = ::mmap(nullptr, size, PROT_READ, MAP_SHARED, fd, 0);
     if (bytes == MAP_FAILED) return false;
     m_bytes = static_cast<std::uint8_t *>(bytes);
     m_size = static_cast<std::int64_t>(size);
+    m_mapped = m_seen;
+    m_is_in_memory = kind == TMPFS;
     return true;
 }
 
@@ -151,33 +214,26 @@ void img_file_mapping::drop()
 }
 
 // The descriptor decides what there is: after the end of the file its last page goes on with zero
-// bytes, and so do pages that were cut off and written again meanwhile. The latter show in the time
-// of the last change alone. Files are stamped with a clock that stands still for up to 10
-// milliseconds.
+// bytes, and so do pages that are cut off and written again meanwhile. The latter show in the time
+// of the last change alone.
 std::int32_t img_file_mapping::lend(int fd, std::int32_t offset, std::int32_t count,
                                     img_io_use_fn use, void *arg)
 {
-    struct stat status;
-    if (m_changed && ::fstat(fd, &status) == 0) {
-        m_own_change = time_of(status.st_ctim);
-        m_changed = false;
-    }
     const std::int64_t end = std::int64_t{offset} + count;
-    if (end > m_length) m_length = ::lseek(fd, 0, SEEK_END);
-    if (offset < 0 || count < 1 || end > m_length || !covers(fd, end)) return -1;
+    if (m_unfit || offset < 0 || count < 1 || !look_at(fd) || end > m_seen.length ||
+        !shows_changes())
+        return -1;
+    m_unfit = !covers(fd, end);
+    // Reading a mapping takes room for what is missing of a file in memory.
+    if (m_unfit || (m_is_in_memory && m_seen.has_holes)) return -1;
 
-    std::timespec time;
-    ::clock_gettime(CLOCK_REALTIME, &time);
-    const img_file_time now = time_of(time);
-    if (!use_guarded(m_bytes, static_cast<std::size_t>(m_size), now, offset, use, arg)) {
+    const state before = m_seen;
+    if (!use_guarded(m_bytes, static_cast<std::size_t>(m_size), offset, use, arg)) {
         drop();
-        m_length = 0;
         return -1;
     }
-    if (::fstat(fd, &status) == -1) return -1;
-    m_length = status.st_size;
-    const img_file_time change = time_of(status.st_ctim);
-    constexpr img_file_time stamp_period = 20'000'000;
-    const bool unchanged = change < now - stamp_period || change == m_own_change;
-    return end <= m_length && unchanged ? 0 : -1;
+    return look_at(fd) && is_same_file(m_seen, before) && m_seen.change == before.change &&
+                   m_seen.length == before.length
+               ? 0
+               : -1;
 }

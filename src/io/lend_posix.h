@@ -6,6 +6,8 @@
 
 #include <cstdint>
 
+#include <sys/types.h>
+
 // Nanoseconds since 1970.
 using img_file_time = std::int64_t;
 
@@ -13,22 +15,34 @@ using img_file_time = std::int64_t;
 class img_file_mapping {
 public:
     // Calls `use` with the bytes [offset, offset + count) of the file. Returns 0 when the file had
-    // them until `use` came back, else -1. Also -1 while others than this process change the file.
+    // them until `use` came back, else -1. Also -1, before a use, where it could not be known.
     std::int32_t lend(int fd, std::int32_t offset, std::int32_t count, img_io_use_fn use,
                       void *arg);
-    // Tells that this process has changed the file.
-    void note_change() { m_changed = true; }
     void drop();
 
 private:
+    // What a descriptor says of its file.
+    struct state {
+        std::int64_t length;
+        img_file_time change;
+        dev_t device;
+        ino_t inode;
+        bool has_holes;
+    };
+
+    static bool is_same_file(const state &a, const state &b);
+    bool look_at(int fd);
+    bool shows_changes() const;
     bool covers(int fd, std::int64_t end);
 
-    std::int64_t m_length = 0;       // of the file when it was last looked at
-    bool m_changed = false;          // by this process, and `m_own_change` is not up to date
-    img_file_time m_own_change = 0;  // when this process changed it last
+    state m_seen = {};               // when it was last looked at
+    bool m_has_fine_stamps = false;  // each change after a look shows
+    bool m_unfit = false;            // it cannot be mapped, or is not to be
 
     std::uint8_t *m_bytes = nullptr;  // null: not mapped
     std::int64_t m_size = 0;          // the mapping may reach beyond the end of the file
+    state m_mapped = {};              // the file when it was mapped
+    bool m_is_in_memory = false;      // there is no disk under it
 };
 
 #endif

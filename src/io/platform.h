@@ -1,5 +1,5 @@
 // What the library asks of the operating system: ordinary files and the local time. A port
-// replaces the one file behind this header.
+// replaces the files behind this header, which end in _posix.
 #ifndef IMG_PLATFORM_H
 #define IMG_PLATFORM_H
 

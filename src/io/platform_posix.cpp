@@ -28,27 +28,29 @@ struct first_look {
 
 // A file that is open. Its position is kept here, and seeks need no call of the system.
 struct open_file {
-    std::int32_t fd;  // FREE_PLACE: no file
+    std::int32_t fd;
     std::int32_t position;
     img_file_mapping mapping;
     first_look look;  // until the length is asked for, or something is written
 };
 
 constexpr std::int32_t FREE_PLACE = 0;  // a standard stream's, and never that of a file here
-std::array<open_file, 64> open_files{};
+std::array<std::int32_t, 64> descriptors{};
+std::array<open_file, descriptors.size()> open_files{};  // place by place
 
-open_file *find_place(std::int32_t fd)
+// Returns the place of a descriptor; the number of places: it has none.
+std::size_t find_place(std::int32_t fd)
 {
-    const auto found = std::ranges::find(open_files, fd, &open_file::fd);
-    return found != open_files.end() ? &*found : nullptr;
+    return static_cast<std::size_t>(std::ranges::find(descriptors, fd) - descriptors.begin());
 }
 
 // Returns the open file of a descriptor, or null with errno set.
 open_file *find_file(std::int32_t fd)
 {
-    open_file *const file = fd != FREE_PLACE ? find_place(fd) : nullptr;
-    if (file == nullptr) errno = EBADF;
-    return file;
+    const std::size_t place = find_place(fd);
+    if (fd != FREE_PLACE && place < open_files.size()) return &open_files[place];
+    errno = EBADF;
+    return nullptr;
 }
 
 constexpr std::int32_t ACCESS_MODE = 3;  // the bits of the open flags that hold the access mode
@@ -92,7 +94,10 @@ std::int32_t read_head(open_file *file, void *buffer, std::uint32_t count)
     if (look.head_length == -1)
         look.head_length =
             static_cast<std::int32_t>(::pread(file->fd, look.head.data(), look.head.size(), 0));
-    if (look.head_length == -1) return -1;
+    if (look.head_length < std::min<std::int64_t>(look.length, size)) {
+        look.length = -1;  // what came is not what there is
+        return -1;
+    }
     const auto got =
         std::clamp(look.head_length - file->position, 0, static_cast<std::int32_t>(count));
     std::copy_n(look.head.data() + file->position, got, static_cast<std::byte *>(buffer));
@@ -153,13 +158,15 @@ std::int32_t img_platform_open(const char *filename, std::int32_t oflags, std::i
     struct stat status;
     if (::fstat(fd, &status) == -1) return close_and_fail(fd, errno);
     if (!S_ISREG(status.st_mode) && !S_ISBLK(status.st_mode)) return close_and_fail(fd, EINVAL);
-    open_file *const place = find_place(FREE_PLACE);
-    if (place == nullptr) return close_and_fail(fd, EMFILE);
-    place->fd = fd;
-    place->position = 0;
-    place->mapping = {};
-    place->look.length = S_ISREG(status.st_mode) ? status.st_size : -1;
-    place->look.head_length = -1;
+    const std::size_t place = find_place(FREE_PLACE);
+    if (place == open_files.size()) return close_and_fail(fd, EMFILE);
+    descriptors[place] = fd;
+    open_files[place] = {.fd = fd,
+                         .position = 0,
+                         .mapping = {},
+                         .look = {.length = S_ISREG(status.st_mode) ? status.st_size : -1,
+                                  .head_length = -1,
+                                  .head = {}}};
     return fd;
 }
 
@@ -168,7 +175,7 @@ std::int32_t img_platform_close(std::int32_t fd)
     open_file *const file = find_file(fd);
     if (file == nullptr) return -1;
     file->mapping.drop();
-    file->fd = FREE_PLACE;
+    descriptors[find_place(fd)] = FREE_PLACE;
     // An interrupted close is not repeated: the descriptor may be in use again by then.
     return ::close(fd);
 }
@@ -188,7 +195,6 @@ std::int32_t img_platform_write(std::int32_t fd, const void *buffer, std::uint32
     open_file *const file = find_file(fd);
     if (file == nullptr) return -1;
     file->look.length = -1;
-    file->mapping.note_change();
     return transfer_whole(file, count, [=](std::uint32_t done, off_t position) {
         return ::pwrite(fd, static_cast<const std::byte *>(buffer) + done, count - done, position);
     });

@@ -368,7 +368,8 @@ bool img_std_lend(const img_desc *desc, std::int64_t offset, std::int64_t count,
         use(arg, desc->mem_image.get() + offset);
         return true;
     }
-    return img_std_joins_calls(desc) &&
+    // What a refused use left in its buffer must not stand for what the file does not hold.
+    return file->pre_reads == 0 && img_std_joins_calls(desc) &&
            desc->io_method->lend(file->data_fd, static_cast<std::int32_t>(offset),
                                  static_cast<std::int32_t>(count), use, arg) == 0;
 }

@@ -77,6 +77,16 @@ std::int32_t lines_at_once(const img_desc *desc, std::int32_t nlines, std::int32
     return gathered ? std::clamp(cached_bytes / (desc->nbytes * nsamps), 1, nlines) : nlines;
 }
 
+// Returns room for `count` packed rows; for one, which `count` becomes, when memory is short; null
+// when there is none even for that.
+img_scratch room_for_rows(const img_desc *desc, std::int32_t nsamps, std::int32_t *count)
+{
+    img_scratch rows = img_take_scratch(bytes_of(desc, nsamps) * static_cast<std::size_t>(*count));
+    if (rows || *count == 1) return rows;
+    *count = 1;
+    return img_take_scratch(bytes_of(desc, nsamps));
+}
+
 }  // namespace
 
 bool img_std_exchanges_bytes(const img_desc *desc)
@@ -177,15 +187,13 @@ std::int32_t img_std_write_lines(img_desc *desc, std::int32_t line, std::int32_t
                                  std::int32_t nlines, std::int32_t nsamps, std::int32_t band,
                                  const std::uint8_t *buffer, std::int32_t stride, bool exchange)
 {
+    if (nlines < 1) return 0;
     // The caller's rows are not to be modified.
-    bool gathers = exchange || stride != nsamps;
-    std::int32_t count = lines_at_once(desc, nlines, nsamps, gathers);
-    img_scratch gathered;
-    if (gathers && !desc->mem_image)
-        gathered = img_take_scratch(bytes_of(desc, nsamps) * static_cast<std::size_t>(count));
-    if (exchange && !desc->mem_image && !gathered)
-        return img_fail_errno("img_std_write_nontiled:malloc");
-    if (!gathered && gathers) count = 1;
+    const bool has_gaps = stride != nsamps;
+    std::int32_t count = lines_at_once(desc, nlines, nsamps, exchange || has_gaps);
+    const bool gathers = !desc->mem_image && (exchange || (has_gaps && count > 1));
+    const img_scratch gathered = gathers ? room_for_rows(desc, nsamps, &count) : img_scratch();
+    if (exchange && gathers && !gathered) return img_fail_errno("img_std_write_nontiled:malloc");
 
     img_std_file *const file = desc->std_file;
     const std::int32_t row_length = desc->nbytes * nsamps;

@@ -120,8 +120,8 @@ bool reaches_stored_tiles(const img_desc *desc)
 }
 
 // Copies the region out of the tiles where they lie. Returns false when they are not lent.
-bool read_lent_tiles(const img_desc *desc, const tiled_region &region, std::int32_t band,
-                     std::uint8_t *buffer)
+bool read_lent_region(const img_desc *desc, const tiled_region &region, std::int32_t band,
+                      std::uint8_t *buffer)
 {
     const std::int32_t last_row = region.tile_rows() - 1;
     const std::int32_t last_tile = region.first_tile(last_row) + region.ntiles() - 1;
@@ -153,6 +153,19 @@ void lay_over(const img_desc *desc, const tiled_region &region, std::int32_t row
                           run + part.run_byte, region.plane_pitch(), part.nlines, part.nsamps,
                           desc->nbytes, img_std_exchanges_bytes(desc));
     });
+}
+
+// True when it pays to write the region's lines alone, in one call per tile: most of the planes is
+// not touched, and that is more bytes than a call is worth.
+bool touches_few_lines(const img_desc *desc, const tiled_region &region, std::int32_t row,
+                       std::int32_t band)
+{
+    constexpr std::size_t worth_a_call = 8192;
+    const bool lines_lie_together =
+        img_std_plane_in_tile(desc, band).step == static_cast<std::size_t>(desc->nbytes);
+    const auto touched = static_cast<std::size_t>(region.lines_in_tile(row).count);
+    return lines_lie_together &&
+           img_std_plane_size(desc) - touched * region.plane_pitch() >= worth_a_call;
 }
 
 // Writes those lines of a run that the region touches, without the rest of its tiles. Returns
@@ -210,7 +223,7 @@ std::int32_t img_read_tiled(img_desc *desc, std::int32_t line, std::int32_t samp
                             std::uint8_t *buffer, std::int32_t stride)
 {
     const tiled_region region(desc, line, samp, nlines, nsamps, stride);
-    if (reaches_stored_tiles(desc) && read_lent_tiles(desc, region, band, buffer)) return 0;
+    if (reaches_stored_tiles(desc) && read_lent_region(desc, region, band, buffer)) return 0;
 
     const img_scratch run = img_take_scratch(region.run_length());
     if (!run) return img_fail_errno("img_read_tiled:malloc");
@@ -238,17 +251,21 @@ std::int32_t img_std_write_tiled(img_desc *desc, std::int32_t line, std::int32_t
     const tiled_region region(desc, line, samp, nlines, nsamps, stride);
     const img_scratch run = img_take_scratch(region.run_length());
     if (!run) return img_fail_errno("img_std_write_tiled:malloc");
-    const bool direct = reaches_stored_tiles(desc);
-    const bool in_planes =
-        img_std_plane_in_tile(desc, band).step == static_cast<std::size_t>(desc->nbytes);
+    const std::size_t plane_samples =
+        img_std_plane_size(desc) / static_cast<std::size_t>(desc->nbytes);
+    // Who may not read a tile may not replace it either, even a whole one.
+    const bool direct = reaches_stored_tiles(desc) && img_access_mode(desc) == IMG_OPEN_READ_WRITE;
     for (std::int32_t row = 0; row < region.tile_rows(); ++row) {
         const std::int32_t first_tile = region.first_tile(row);
-        if (!direct || !region.covers_run(row)) {
-            if (direct && in_planes &&
-                write_touched_lines(desc, region, row, band, buffer, run.get()))
-                continue;
-            img_fill_samples(run.get(),
-                             region.run_length() / static_cast<std::size_t>(desc->nbytes),
+        if (direct && touches_few_lines(desc, region, row, band) &&
+            write_touched_lines(desc, region, row, band, buffer, run.get()))
+            continue;
+        const bool is_known =
+            direct &&
+            (region.covers_run(row) || img_std_read_lent_tiles(desc, first_tile, region.ntiles(),
+                                                               band, 0, plane_samples, run.get()));
+        if (!is_known) {
+            img_fill_samples(run.get(), plane_samples * static_cast<std::size_t>(region.ntiles()),
                              desc->nbytes, fill != nullptr ? fill : img_zero_sample.data());
             if (read_stored_run(desc, first_tile, region.ntiles(), band, run.get()) == -1)
                 return -1;

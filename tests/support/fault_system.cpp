@@ -5,6 +5,7 @@
 #include <ctime>
 
 #include <sys/stat.h>
+#include <sys/vfs.h>
 #include <unistd.h>
 
 namespace {
@@ -29,6 +30,7 @@ int __real_open(const char *name, int flags, ...);
 ssize_t __real_pread(int fd, void *buffer, std::size_t count, off_t position);
 ssize_t __real_pwrite(int fd, const void *buffer, std::size_t count, off_t position);
 int __real_fstat(int fd, struct stat *status);
+int __real_fstatfs(int fd, struct statfs *status);
 int __real_clock_gettime(clockid_t clock, std::timespec *now);
 std::time_t __real_time(std::time_t *now);
 std::tm *__real_localtime_r(const std::time_t *time, std::tm *local);
@@ -58,10 +60,28 @@ ssize_t __wrap_pwrite(int fd, const void *buffer, std::size_t count, off_t posit
     return limited(RLIMIT_FSIZE, host.disk_size, [=] { return write(count); });
 }
 
+static std::timespec to_timespec(long nanoseconds)
+{
+    return {nanoseconds / 1'000'000'000, nanoseconds % 1'000'000'000};
+}
+
 int __wrap_fstat(int fd, struct stat *status)
 {
     const int result = host.has_no_status ? -1 : __real_fstat(fd, status);
-    if (host.block_devices) status->st_mode = S_IFBLK;
+    if (host.block_devices) {
+        status->st_mode = S_IFBLK;
+        status->st_size = 0;
+    }
+    if (host.holes) status->st_blocks = 0;
+    if (host.stamp != 0) status->st_ctim = to_timespec(host.stamp);
+    return result;
+}
+
+int __wrap_fstatfs(int fd, struct statfs *status)
+{
+    const int result = __real_fstatfs(fd, status);
+    if (host.remote) status->f_type = 0x6969;
+    if (host.memory) status->f_type = 0x01021994;
     return result;
 }
 
@@ -69,6 +89,7 @@ int __wrap_clock_gettime(clockid_t clock, std::timespec *now)
 {
     const int result = __real_clock_gettime(clock, now);
     now->tv_sec += host.seconds_later;
+    if (host.now != 0) *now = to_timespec(host.now);
     return result;
 }
 

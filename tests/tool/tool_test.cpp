@@ -1,0 +1,538 @@
+// The command-line tool, run as its users run it.
+#include "img.h"
+
+#include <algorithm>
+#include <array>
+#include <cmath>
+#include <csignal>
+#include <cstring>
+#include <filesystem>
+#include <fstream>
+#include <gtest/gtest.h>
+#include <nlohmann/json.hpp>
+#include <random>
+#include <sstream>
+
+#include <fcntl.h>
+#include <sys/resource.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+namespace fs = std::filesystem;
+
+namespace {
+
+std::string content_of(const fs::path &file)
+{
+    std::ifstream in(file, std::ios::binary);
+    return {std::istreambuf_iterator<char>(in), {}};
+}
+
+void write_content(const fs::path &file, const std::string &bytes)
+{
+    std::ofstream(file, std::ios::binary) << bytes;
+}
+
+struct finished {
+    int status;  // below 0: the signal that ended it
+    std::string out, err;
+    long kilobytes;  // of memory that it had at most
+};
+
+// Samples in the order of PNM files.
+struct picture {
+    int nlines, nsamps, nbands, nbytes;
+    std::vector<int> samples;
+
+    int at(int line, int samp, int band) const
+    {
+        return samples[static_cast<std::size_t>((line * nsamps + samp) * nbands + band)];
+    }
+    std::string as_pnm(const std::vector<int> &bands) const
+    {
+        std::ostringstream out;
+        out << (bands.size() == 3 ? "P6\n" : "P5\n") << nsamps << ' ' << nlines << '\n'
+            << (nbytes == 2 ? 65535 : 255) << '\n';
+        for (int line = 0; line < nlines; ++line)
+            for (int samp = 0; samp < nsamps; ++samp)
+                for (const int band : bands) {
+                    if (nbytes == 2) out.put(static_cast<char>(at(line, samp, band) >> 8));
+                    out.put(static_cast<char>(at(line, samp, band) & 255));
+                }
+        return out.str();
+    }
+};
+
+picture random_picture(int nlines, int nsamps, int nbands, int nbytes, int highest)
+{
+    std::mt19937 random(static_cast<unsigned>(nlines * 31 + nsamps * 7 + nbands * 3 + nbytes));
+    picture made{nlines, nsamps, nbands, nbytes, {}};
+    made.samples.resize(static_cast<std::size_t>(nlines * nsamps * nbands));
+    for (int &sample : made.samples)
+        sample = static_cast<int>(random() % (static_cast<unsigned>(highest) + 1));
+    return made;
+}
+
+class Tool : public testing::Test {
+protected:
+    Tool()
+    {
+        std::string pattern = fs::temp_directory_path() / "imgfile_tool_XXXXXX";
+        m_folder = ::mkdtemp(pattern.data());
+        fs::current_path(m_folder);
+    }
+    ~Tool() override
+    {
+        fs::current_path("/");
+        fs::remove_all(m_folder);
+    }
+
+    // Runs the tool with arguments that are divided by blanks. `prepare` runs in the new process;
+    // `signal` is sent to it after so many milliseconds.
+    template <typename Prepare>
+    finished run(const std::string &arguments, Prepare prepare, int signal = 0, int after = 0)
+    {
+        std::istringstream words(arguments);
+        std::vector<std::string> list{IMGFILE_TOOL};
+        for (std::string word; words >> word;) list.push_back(word);
+        std::vector<char *> argv;
+        for (std::string &word : list) argv.push_back(word.data());
+        argv.push_back(nullptr);
+        const pid_t child = ::fork();
+        if (child == 0) {
+            redirect(m_folder.string() + ".out", STDOUT_FILENO);
+            redirect(m_folder.string() + ".err", STDERR_FILENO);
+            prepare();
+            ::execv(argv[0], argv.data());
+            ::_exit(127);
+        }
+        if (signal != 0) {
+            ::usleep(static_cast<useconds_t>(after) * 1000);
+            ::kill(child, signal);
+        }
+        int status = -1;
+        rusage used{};
+        ::wait4(child, &status, 0, &used);
+        finished end{WIFSIGNALED(status) ? -WTERMSIG(status) : WEXITSTATUS(status),
+                     content_of(m_folder.string() + ".out"), content_of(m_folder.string() + ".err"),
+                     used.ru_maxrss};
+        fs::remove(m_folder.string() + ".out");
+        fs::remove(m_folder.string() + ".err");
+        return end;
+    }
+    finished run(const std::string &arguments)
+    {
+        return run(arguments, [] {});
+    }
+    void expect_done(const std::string &arguments)
+    {
+        const finished end = run(arguments);
+        EXPECT_EQ(end.status, 0) << arguments << ": " << end.err;
+        EXPECT_EQ(end.err, "") << arguments;
+    }
+    std::vector<std::string> files() const
+    {
+        std::vector<std::string> names;
+        for (const auto &each : fs::directory_iterator(m_folder))
+            names.push_back(each.path().filename());
+        std::ranges::sort(names);
+        return names;
+    }
+
+    fs::path m_folder;
+
+private:
+    static void redirect(const std::string &file, int to)
+    {
+        ::dup2(::open(file.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0600), to);
+    }
+};
+
+struct kept_as {
+    const char *name, *options;
+    std::array<bool, 4> bands;  // [n]: it holds n of them
+    bool two_bytes;
+};
+const std::vector<kept_as> formats{
+    {"a.img", "", {false, true, true, true}, true},
+    {"tiled.img", "--tile 16x8", {false, true, true, true}, true},
+    {"a.d", "", {false, true, true, true}, false},
+    {"a.pnm", "", {false, true, false, true}, true},
+    {"a.png", "", {false, true, false, true}, true},
+    {"a.tif", "", {false, true, true, true}, true},
+    {"tiled.tif", "--tile 32x16", {false, true, true, true}, true},
+};
+
+TEST_F(Tool, KeepsEachSampleFromAnyFormatToAnyOther)
+{
+    for (const int nbands : {1, 2, 3})
+        for (const int nbytes : {1, 2}) {
+            const picture source =
+                random_picture(37, 53 + nbands, 3, nbytes, nbytes == 1 ? 255 : 4095);
+            const std::vector<int> bands = nbands == 3   ? std::vector{0, 1, 2}
+                                           : nbands == 2 ? std::vector{2, 0}
+                                                         : std::vector{1};
+            write_content("source.ppm", source.as_pnm({0, 1, 2}));
+            const std::string chosen = nbands == 3 ? "0,1,2" : nbands == 2 ? "2,0" : "1";
+            const auto holds = [=](const kept_as &format) {
+                return format.bands.at(static_cast<std::size_t>(nbands)) &&
+                       (nbytes == 1 || format.two_bytes);
+            };
+            for (const kept_as &from : formats) {
+                if (!holds(from)) continue;
+                const std::string first = std::string("from_") + from.name;
+                expect_done("convert source.ppm " + first + " --overwrite --band " + chosen + " " +
+                            from.options);
+                for (const kept_as &to : formats) {
+                    if (!holds(to)) continue;
+                    const std::string second = std::string("to_") + to.name;
+                    expect_done("convert " + first + " " + second + " --overwrite " + to.options);
+                    const int band = nbytes - 1 < nbands ? nbytes - 1 : 0;
+                    expect_done("convert " + second + " seen.pgm --overwrite --band " +
+                                std::to_string(band));
+                    EXPECT_EQ(content_of("seen.pgm"),
+                              source.as_pnm({bands[static_cast<std::size_t>(band)]}))
+                        << first << " to " << second << ", " << nbands << " bands of " << nbytes;
+                }
+                EXPECT_EQ(run("compare " + first + " to_a.img").status, 0);
+            }
+        }
+}
+
+TEST_F(Tool, CutsWindowsAndPassesPicturesThrough)
+{
+    const picture source = random_picture(40, 50, 3, 2, 65535);
+    write_content("a.ppm", source.as_pnm({0, 1, 2}));
+    for (const char *const name :
+         {"a.img --tile 8", "a.tif --tile 16", "a.png", "a.tif --overwrite"}) {
+        expect_done(std::string("convert --quiet a.ppm ") + name);
+        const std::string file = std::string(name).substr(0, 5);
+        expect_done("--quiet convert " + file + " w.pgm --overwrite --window 9,17,20,30 --band 2");
+        picture part{20, 30, 1, 2, {}};
+        for (int line = 0; line < 20; ++line)
+            for (int samp = 0; samp < 30; ++samp)
+                part.samples.push_back(source.at(line + 9, samp + 17, 2));
+        EXPECT_EQ(content_of("w.pgm"), part.as_pnm({0})) << name;
+    }
+    const finished piped =
+        run("convert - - --format ppm", [] { ::dup2(::open("a.ppm", O_RDONLY), STDIN_FILENO); });
+    EXPECT_EQ(piped.out, content_of("a.ppm"));
+    EXPECT_EQ(piped.err, "");
+}
+
+// What the tool stretches is what a host of the library sees.
+TEST_F(Tool, StretchesAsTheLibraryDoesAllAtOnce)
+{
+    const picture source = random_picture(70, 90, 1, 2, 6000);
+    write_content("a.pgm", source.as_pnm({0}));
+    const finished converted = run("convert a.pgm a.img");
+    EXPECT_NE(converted.err.find("imgfile: a.pgm: note: "), std::string::npos);
+    EXPECT_NE(converted.err.find(" samples lie beyond 12 bits; they were kept as they are\n"),
+              std::string::npos);
+    for (const auto &part : {std::array{0, 0, 70, 90}, std::array{3, 5, 60, 71}}) {
+        const auto [line, samp, nlines, nsamps] = part;
+        const finished end =
+            run("convert a.img s.pgm --stretch --overwrite --window " + std::to_string(line) + "," +
+                std::to_string(samp) + "," + std::to_string(nlines) + "," + std::to_string(nsamps));
+        EXPECT_NE(end.err.find(" beyond 12 bits; they were mapped as the highest value\n"),
+                  std::string::npos);
+        std::vector<std::uint8_t> seen(static_cast<std::size_t>(nlines * nsamps));
+        const img_handle image = img_openfile("a.img", IMG_OPEN_READ_ONLY);
+        ASSERT_EQ(
+            img_load_buffer(image, line, samp, nlines, nsamps, 0, seen.data(), nsamps, nullptr), 0);
+        img_closefile(image);
+        const std::string bytes = content_of("s.pgm");
+        EXPECT_EQ(bytes.substr(bytes.size() - seen.size()), std::string(seen.begin(), seen.end()));
+    }
+}
+
+TEST_F(Tool, RefusesInOneLineAndLeavesTheTargetAsItWas)
+{
+    write_content("rgb.ppm", random_picture(20, 30, 3, 1, 255).as_pnm({0, 1, 2}));
+    expect_done("create two.img --lines 20 --samples 30 --bytes 2 --pattern");
+    expect_done("create seven.d --lines 20 --samples 30 --bands 7 --pattern");
+    write_content("cut.pgm", random_picture(20, 30, 1, 1, 255).as_pnm({0}).substr(0, 400));
+    expect_done("convert rgb.ppm whole.img --tile 8 --band 0");
+    write_content("cut.img", content_of("whole.img").substr(0, 244 + 8 * 40));
+    write_content("junk", "nothing in particular, but long enough to hold a header of some kind");
+    write_content("old", "what was there before");
+    fs::create_hard_link("rgb.ppm", "twin.ppm");
+    fs::create_symlink("rgb.ppm", "link.ppm");
+    ASSERT_EQ(::mkfifo("pipe", 0600), 0);
+    struct refusal {
+        const char *arguments;
+        int status;
+        const char *message;
+    };
+    const std::string pixels = content_of("rgb.ppm");
+    for (const auto &[arguments, status, message] : {
+             refusal{"convert rgb.ppm old --format png", 1, "old: exists; --overwrite replaces it"},
+             {"convert rgb.ppm rgb.ppm --overwrite", 1, "rgb.ppm: is the input itself"},
+             {"convert rgb.ppm twin.ppm --overwrite", 1, "twin.ppm: is the input itself"},
+             {"convert link.ppm rgb.ppm --overwrite", 1, "rgb.ppm: is the input itself"},
+             {"convert missing.img old --format png --overwrite", 1,
+              "missing.img: No such file or directory"},
+             {"convert . old --format png --overwrite", 1, ".: is a folder"},
+             {"convert pipe old --format png --overwrite", 1, "pipe: is not a regular file"},
+             {"convert rgb.ppm pipe --format png --overwrite", 1,
+              "pipe: exists and is not a regular file"},
+             {"convert rgb.ppm nowhere/new.png", 1,
+              "nowhere/new.png: cannot be written: No such file or directory"},
+             {"convert junk old --format png --overwrite", 1,
+              "junk: is no image of a known format, or its header is damaged"},
+             {"convert cut.pgm old --format img --overwrite", 2, nullptr},
+             {"convert cut.pgm old --format vitec --overwrite", 1,
+              "cut.pgm: cut short: line 12 is missing"},
+             {"convert cut.img old --format png --overwrite", 1,
+              "cut.img: cut short: line 8 of band 0 is missing"},
+             {"convert two.img old --format helava --overwrite", 1,
+              "old: Helava files hold samples of one byte (imgfile convert --stretch makes such)"},
+             {"convert seven.d old --format vitec --overwrite", 1,
+              "old: VITec files hold at most 3 bands, not 7 (imgfile convert --band chooses some)"},
+             {"convert seven.d old --format png --overwrite", 1,
+              "old: PNG files hold 1 or 3 bands, not 7; --band chooses some"},
+             {"convert rgb.ppm old --format pgm --overwrite", 1,
+              "old: PGM files hold 1 band, not 3"},
+             {"convert rgb.ppm old --format vitec --tile 100 --overwrite", 1,
+              "old: tiles of VITec files are powers of two from 8 to 32768 high and wide"},
+             {"convert rgb.ppm old --format tiff --tile 8 --overwrite", 1,
+              "old: tiles of TIFF files are multiples of 16 high and wide"},
+             {"convert rgb.ppm old --format png --tile 16 --overwrite", 1,
+              "old: PNG files have no tiles"},
+             {"convert rgb.ppm old --format png --window 0,0,21,1 --overwrite", 1,
+              "rgb.ppm: has no window 0,0,21,1: it has 20 lines x 30 samples"},
+             {"convert rgb.ppm old --format png --band 3 --overwrite", 1,
+              "rgb.ppm: has no band 3: it has 3, counted from 0"},
+             {"convert rgb.ppm old --format png --window 0,0,1 --overwrite", 2, nullptr},
+             {"convert rgb.ppm old --format png --window 0,0,0,1 --overwrite", 2, nullptr},
+             {"convert rgb.ppm old --format png --tile 0 --overwrite", 2, nullptr},
+             {"convert rgb.ppm old --format png --band x --overwrite", 2, nullptr},
+             {"convert rgb.ppm old --overwrite", 2, nullptr},
+             {"convert rgb.ppm - --format png", 2, nullptr},
+             {"convert rgb.ppm", 2, nullptr},
+             {"preview junk old --overwrite", 1, nullptr},
+             {"preview rgb.ppm old --band 0,1 --overwrite", 2, nullptr},
+             {"stats rgb.ppm --histogram rgb.ppm --overwrite", 1, "rgb.ppm: is the input itself"},
+             {"create old --type vitec --lines 50000 --samples 50000 --overwrite", 1,
+              "old: cannot be created: the file would have 2 GiB or more"},
+             {"create old --type helava --lines 5 --samples 5 --tile 8 --overwrite", 1,
+              "old: Helava files have no tiles"},
+             {"create old.png --lines 5 --samples 5", 2, nullptr},
+             {"create old --type vitec --lines -1 --samples 5 --overwrite", 2, nullptr},
+             {"info junk", 1, nullptr},
+             {"compare rgb.ppm missing.img", 1, "missing.img: No such file or directory"},
+             {"nonsense", 2, "there is no command nonsense (see imgfile --help)"},
+             {"", 2, nullptr},
+         }) {
+        const auto before = files();
+        const finished end = run(arguments);
+        EXPECT_EQ(end.status, status) << arguments;
+        EXPECT_EQ(std::ranges::count(end.err, '\n'), 1) << arguments << ": " << end.err;
+        EXPECT_TRUE(end.err.starts_with("imgfile: ")) << arguments << ": " << end.err;
+        EXPECT_TRUE(message == nullptr || end.err == std::string("imgfile: ") + message + "\n")
+            << arguments << ": " << end.err;
+        EXPECT_EQ(end.out, "") << arguments;
+        EXPECT_EQ(files(), before) << arguments;
+        EXPECT_EQ(content_of("old"), "what was there before") << arguments;
+        EXPECT_EQ(content_of("rgb.ppm"), pixels) << arguments;
+    }
+}
+
+TEST_F(Tool, LeavesNothingWhereItsWorkCannotEnd)
+{
+    expect_done("create a.img --lines 900 --samples 700 --bands 3 --pattern");
+    for (const char *const name : {"b.img", "b.d", "b.ppm", "b.png", "b.tif"}) {
+        const finished end = run(std::string("convert a.img ") + name, [] {
+            const rlimit limit{2'000, 2'000};
+            ::setrlimit(RLIMIT_FSIZE, &limit);
+        });
+        EXPECT_EQ(end.status, 1) << name;
+        EXPECT_EQ(end.err,
+                  std::string("imgfile: ") + name + ": cannot be written: File too large\n");
+    }
+    for (const int signal : {SIGINT, SIGTERM, SIGKILL})
+        for (int delay = 5; delay < 60; delay += 10) {
+            const finished end = run(
+                "convert a.img c.png", [] {}, signal, delay);
+            if (end.status == 0) fs::remove("c.png");
+            EXPECT_TRUE(end.status == 0 || end.status == -signal);
+        }
+    EXPECT_EQ(files(), (std::vector<std::string>{"a.img"}));
+
+    for (const char *const arguments : {"info a.img", "--help", "convert a.img -", "stats a.img",
+                                        "compare a.img a.img", "--version"})
+        for (const bool closed : {false, true}) {
+            const finished end = run(arguments, [=] {
+                if (closed)
+                    ::close(STDOUT_FILENO);
+                else
+                    ::dup2(::open("/dev/full", O_WRONLY), STDOUT_FILENO);
+            });
+            EXPECT_EQ(end.status, 1) << arguments;
+            EXPECT_TRUE(end.err.starts_with("imgfile: standard output: cannot be written"))
+                << end.err;
+        }
+}
+
+TEST_F(Tool, TellsWhatFilesAre)
+{
+    expect_done("create a.img --lines 100 --samples 70 --bands 2 --bytes 2 --tile 16x32");
+    expect_done("create user@host.d --lines 3 --samples 5 --bands 4");
+    expect_done("convert a.img t.tif --tile 16x32");
+    const finished end = run("info a.img missing user@host.d t.tif --json");
+    EXPECT_EQ(end.status, 1);
+    EXPECT_EQ(end.err, "imgfile: missing: No such file or directory\n");
+    const auto facts = nlohmann::json::parse(end.out);
+    ASSERT_EQ(facts.size(), 3U);
+    const nlohmann::json expected{{"file", "a.img"},
+                                  {"type", "VITec"},
+                                  {"byte_order", "big"},
+                                  {"lines", 100},
+                                  {"samples", 70},
+                                  {"bands", 2},
+                                  {"bytes_per_sample", 2},
+                                  {"bits_per_sample", 12},
+                                  {"layout", "tiles of band planes"},
+                                  {"tile_size", {{"lines", 16}, {"samples", 32}}},
+                                  {"tile_grid", {{"down", 7}, {"across", 3}}},
+                                  {"data_offset", 244},
+                                  {"file_length", 244 + 21 * 2 * 1024},
+                                  {"expected_length", 244 + 21 * 2 * 1024}};
+    for (const auto &[key, value] : expected.items()) EXPECT_EQ(facts[0][key], value) << key;
+    EXPECT_EQ(facts[0]["created"].get<std::string>().size(), 19U);
+    EXPECT_EQ(facts[1]["type"], "Helava");
+    EXPECT_EQ(facts[1]["expected_length"], 3 * 5 * 4 + 16);
+    EXPECT_EQ(facts[1]["created"], nullptr);
+    EXPECT_EQ(facts[2]["tile_size"], facts[0]["tile_size"]);
+
+    write_content("a.img", content_of("a.img").substr(0, 1000));
+    EXPECT_NE(run("info a.img").out.find("1,000 bytes, CUT SHORT: 42,252 of 43,252 are missing"),
+              std::string::npos);
+}
+
+TEST_F(Tool, FindsWhatIsWrongWithFiles)
+{
+    expect_done("create a.img --lines 64 --samples 40 --pattern --tile 8");
+    expect_done("check a.img");
+    const std::string whole = content_of("a.img");
+    struct damage {
+        std::size_t at;
+        const char *byte;
+        std::vector<std::string> findings;
+    };
+    for (const auto &[at, byte, findings] : std::vector<damage>{
+             {7, "\x6d", {"image_block_link is 109, not 108", "has a header that"}},
+             {17, "\x0c", {"create_date is no date: "}},
+             {32, "v", {"signature is not VITec"}},
+             {115, "\x83", {"header_length is 131, not 132"}},
+             {119, "\x01", {"total_length is 2561, not 2692"}},
+             {139,
+              "\x08",
+              {"version is 8, not 7", "has a header that describes no readable image"}},
+             {151, "\x29", {"total_length is 2692, not 3204", "cut short: 512 of 3,316 bytes"}},
+             {159, "\x07", {"tile_nsamps is 7, neither 0 nor a power of two from 8 to 32768"}},
+             {159,
+              "",
+              {"only one of tile_nlines and tile_nsamps is 0: the image is untiled, but padded"}},
+             {167, "", {"band_flag is 0, not 1"}},
+             {171, "\x05", {"nbands is 5, not 0 to 3", "cut short: 10,240 of "}},
+             {175,
+              "\x03",
+              {"nbytes_code says 4 bytes per sample, not 1 or 2", "has a header that"}},
+             {148, "\xff", {"nsamps is -16777176", "has a header that"}},
+         }) {
+        std::string damaged = whole;
+        damaged[at] = *byte;
+        write_content("a.img", damaged);
+        const finished end = run("check a.img");
+        EXPECT_EQ(end.status, 1) << at;
+        for (const std::string &finding : findings)
+            EXPECT_NE(end.out.find("a.img: " + finding), std::string::npos)
+                << at << ": " << finding << "\n"
+                << end.out;
+    }
+    write_content("a.img", whole + "more");
+    EXPECT_EQ(run("check a.img").out, "a.img: 4 bytes more than the header asks for\n");
+    write_content("a.img", whole.substr(0, 244 + 5 * 64 * 3) +
+                               std::string(whole.size() - 244 - 5 * 64 * 3, '\0'));
+    EXPECT_EQ(run("check a.img").out, "a.img: band 0 is 0 from line 24 on, of 64\n");
+    write_content("b.pgm", random_picture(9, 9, 1, 2, 5000).as_pnm({0}));
+    run("convert b.pgm b.img");
+    EXPECT_NE(run("check b.img").out.find("samples beyond 12 bits\n"), std::string::npos);
+    expect_done("check b.pgm");
+    const finished none = run("check missing b.pgm");
+    EXPECT_EQ(none.status, 1);
+    EXPECT_EQ(none.err, "imgfile: missing: No such file or directory\n");
+}
+
+TEST_F(Tool, ComparesAndMeasuresSamples)
+{
+    picture source = random_picture(30, 20, 3, 1, 200);
+    source.samples[0] = 0;
+    write_content("a.ppm", source.as_pnm({0, 1, 2}));
+    expect_done("convert a.ppm a.img --tile 8");
+    EXPECT_EQ(run("compare a.ppm a.img").out, "a.ppm and a.img are equal: 1,800 samples\n");
+    source.samples[static_cast<std::size_t>((7 * 20 + 5) * 3 + 2)] ^= 64;
+    source.samples[static_cast<std::size_t>((7 * 20 + 6) * 3)] ^= 1;
+    write_content("b.ppm", source.as_pnm({0, 1, 2}));
+    const finished end = run("compare a.img b.ppm");
+    EXPECT_EQ(end.status, 1);
+    const int changed = source.at(7, 5, 2);
+    EXPECT_EQ(end.out,
+              "a.img and b.ppm differ: 2 of 1,800 samples; first at line 7, sample 5, band 2: " +
+                  std::to_string(changed ^ 64) + " and " + std::to_string(changed) +
+                  "; largest difference 64\n");
+    expect_done("convert a.ppm c.png --window 0,0,29,20");
+    EXPECT_EQ(run("compare a.ppm c.png").status, 1);
+
+    const auto facts = nlohmann::json::parse(run("stats b.ppm --json --histogram h.png").out);
+    for (int band = 0; band < 3; ++band) {
+        double sum = 0, squares = 0, zeros = 0;
+        int low = 255, high = 0;
+        for (std::size_t i = static_cast<std::size_t>(band); i < source.samples.size(); i += 3) {
+            const int value = source.samples[i];
+            sum += value;
+            squares += value * value;
+            zeros += value == 0 ? 1 : 0;
+            low = std::min(low, value);
+            high = std::max(high, value);
+        }
+        const auto &seen = facts["bands"][static_cast<std::size_t>(band)];
+        EXPECT_EQ(seen["minimum"], low);
+        EXPECT_EQ(seen["maximum"], high);
+        EXPECT_NEAR(seen["mean"], sum / 600, 1e-9);
+        EXPECT_NEAR(seen["standard_deviation"], std::sqrt(squares / 600 - sum / 600 * sum / 600),
+                    1e-6);
+        EXPECT_NEAR(seen["share_of_zero"], zeros / 600, 1e-12);
+        EXPECT_EQ(seen["beyond_stated_bits"], 0);
+    }
+    EXPECT_NE(run("info h.png").out.find("540 lines x 960 samples x 3 bands"), std::string::npos);
+
+    expect_done("preview a.img p.png --size 16 --raw");
+    const auto reduced = nlohmann::json::parse(run("info p.png --json").out);
+    EXPECT_EQ(reduced[0]["lines"], 15);
+    EXPECT_EQ(reduced[0]["samples"], 10);
+    expect_done("convert p.png p.ppm");
+    const std::string pixels = content_of("p.ppm");
+    const int mean =
+        (source.at(8, 4, 1) + source.at(8, 5, 1) + source.at(9, 4, 1) + source.at(9, 5, 1)) / 4;
+    EXPECT_EQ(static_cast<unsigned char>(pixels[pixels.size() - 450 + (4 * 10 + 2) * 3 + 1]), mean);
+}
+
+#ifndef IMGFILE_SANITIZED  // which takes memory of its own
+TEST_F(Tool, TakesLittleMemoryForLargeImages)
+{
+    expect_done("create a.img --lines 10000 --samples 15000");
+    for (const char *const arguments :
+         {"convert a.img b.img --tile 256", "convert b.img c.tif --tile 512", "convert a.img -",
+          "stats b.img", "preview b.img p.png", "check a.img", "compare a.img b.img"}) {
+        const finished end =
+            run(arguments, [] { ::dup2(::open("/dev/null", O_WRONLY), STDOUT_FILENO); });
+        EXPECT_LT(end.kilobytes, 64 * 1024) << arguments;
+        EXPECT_EQ(end.status, std::strncmp(arguments, "check", 5) == 0 ? 1 : 0) << arguments;
+    }
+}
+#endif
+
+}  // namespace

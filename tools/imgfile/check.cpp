@@ -1,0 +1,196 @@
+// imgfile check: all that can be wrong with an image file and can be found without looking at it.
+#include "commands.h"
+#include "failure.h"
+#include "header.h"
+#include "native.h"
+#include "walk.h"
+
+#include "std/std.h"
+
+#include <algorithm>
+#include <cstdio>
+#include <filesystem>
+
+namespace {
+
+class findings {
+public:
+    explicit findings(std::string name) : m_name(std::move(name)) {}
+    void add(const std::string &what)
+    {
+        std::printf("%s: %s\n", m_name.c_str(), what.c_str());
+        m_any = true;
+    }
+    template <typename Value>
+    void expect(const char *field, const Value &found, const Value &wanted)
+    {
+        if (found != wanted) add(text(field, " is ", found, ", not ", wanted));
+    }
+    bool any() const { return m_any; }
+
+private:
+    std::string m_name;
+    bool m_any = false;
+};
+
+bool is_all_zero(const std::uint8_t *bytes, std::size_t count)
+{
+    return std::all_of(bytes, bytes + count, [](std::uint8_t byte) { return byte == 0; });
+}
+
+void check_date(const vitec_header &header, findings &found)
+{
+    const auto *const date = &header.file.bytes[IMG_VITEC_AT_CREATE_DATE];
+    if (is_all_zero(date, 6)) return;  // of a clock that could not be read
+    if (date[1] > 11 || date[2] < 1 || date[2] > 31 || date[3] > 23 || date[4] > 59 || date[5] > 60)
+        found.add("create_date is no date: " + header.date());
+}
+
+void check_tile_sizes(std::int32_t tile_nlines, std::int32_t tile_nsamps, findings &found)
+{
+    for (const auto &[field, size] :
+         {std::pair{"tile_nlines", tile_nlines}, {"tile_nsamps", tile_nsamps}})
+        if (size < 0 || (size != 0 && (size < 8 || size > 32768 || (size & (size - 1)) != 0)))
+            found.add(text(field, " is ", size, ", neither 0 nor a power of two from 8 to 32768"));
+    if ((tile_nlines == 0) != (tile_nsamps == 0))
+        found.add("only one of tile_nlines and tile_nsamps is 0: the image is untiled, but padded");
+}
+
+// The fields against what a writer may put there, and against each other.
+void check_vitec_header(const vitec_header &header, findings &found)
+{
+    const auto field = [&header](std::size_t at) { return header.word(at); };
+    found.expect("image_block_link", header.file_word(IMG_VITEC_AT_IMAGE_BLOCK_LINK), 108);
+    if (std::memcmp(&header.file.bytes[IMG_VITEC_AT_SIGNATURE], "VITec", 6) != 0)
+        found.add("signature is not VITec");
+    check_date(header, found);
+    found.expect("version", field(IMG_VITEC_AT_VERSION), std::int32_t{IMG_VITEC_VERSION});
+    found.expect("header_length", field(IMG_VITEC_AT_HEADER_LENGTH), 132);
+
+    const std::int32_t nlines = field(IMG_VITEC_AT_NLINES), nsamps = field(IMG_VITEC_AT_NSAMPS);
+    const std::int32_t nbands = field(IMG_VITEC_AT_NBANDS);
+    const std::int32_t tile_nlines = field(IMG_VITEC_AT_TILE_NLINES);
+    const std::int32_t tile_nsamps = field(IMG_VITEC_AT_TILE_NSAMPS);
+    const std::int64_t nbytes = std::int64_t{field(IMG_VITEC_AT_NBYTES_CODE)} + 1;
+    for (const auto &[name, value] : {std::pair{"nlines", nlines}, {"nsamps", nsamps}})
+        if (value < 0) found.add(text(name, " is ", value));
+    if (nbands < 0 || nbands > 3) found.add(text("nbands is ", nbands, ", not 0 to 3"));
+    if (nbytes != 1 && nbytes != 2)
+        found.add(text("nbytes_code says ", nbytes, " bytes per sample, not 1 or 2"));
+    found.expect("band_flag", field(IMG_VITEC_AT_BAND_FLAG), nbands < 3 ? 1 : 0);
+    check_tile_sizes(tile_nlines, tile_nsamps, found);
+
+    std::int64_t width = nsamps;  // in the 32 bits that the word has, of whole tiles across
+    if (tile_nlines > 0 && tile_nsamps > 0)
+        width = (width + tile_nsamps - 1) / tile_nsamps * tile_nsamps;
+    const auto total = static_cast<std::uint32_t>(nlines) * static_cast<std::uint32_t>(width) *
+                           static_cast<std::uint32_t>(nbands) * static_cast<std::uint32_t>(nbytes) +
+                       static_cast<std::uint32_t>(field(IMG_VITEC_AT_HEADER_LENGTH));
+    found.expect("total_length", static_cast<std::uint32_t>(field(IMG_VITEC_AT_TOTAL_LENGTH)),
+                 total);
+}
+
+// What the samples of one band are like.
+struct band_state {
+    std::int32_t last_used = -1;  // the last line that is not all zero
+    std::int64_t beyond = 0;
+};
+
+void check_samples(image_reader &image, findings &found)
+{
+    const shape &form = image.form;
+    if (form.nsamples() == 0) {
+        found.add("has no samples");
+        return;
+    }
+    std::vector<band_state> bands(static_cast<std::size_t>(form.nbands));
+    try {
+        walk(image, whole(form), all_bands(form), nullptr,
+             [&](const window &place, const block &samples) {
+                 samples.for_each_row([&](std::int32_t band, std::int32_t line, const auto *row) {
+                     band_state &state = bands[static_cast<std::size_t>(band)];
+                     std::int32_t any = 0;
+                     std::int64_t beyond = 0;
+                     for (std::int32_t i = 0; i < samples.nsamps; ++i) {
+                         any |= row[i];
+                         beyond += row[i] > form.highest();
+                     }
+                     if (any != 0) state.last_used = std::max(state.last_used, place.line + line);
+                     state.beyond += beyond;
+                 });
+             });
+    } catch (const failure &failed) {
+        found.add(std::string(failed.what()).substr(image.name.size() + 2));
+        return;
+    }
+    for (std::int32_t band = 0; band < form.nbands; ++band) {
+        const auto &[last_used, beyond] = bands[static_cast<std::size_t>(band)];
+        if (last_used + 1 < form.nlines)
+            found.add(last_used == -1 ? text("band ", band, " is 0 throughout")
+                                      : text("band ", band, " is 0 from line ", last_used + 1,
+                                             " on, of ", form.nlines));
+        if (beyond != 0)
+            found.add(text("band ", band, " has ", grouped(beyond), " samples beyond ", form.nbits,
+                           " bits"));
+    }
+}
+
+void check_length(const std::string &name, findings &found)
+{
+    const native_image image(name);
+    const auto length = static_cast<std::int64_t>(std::filesystem::file_size(name));
+    const std::int64_t wanted = image.whole_length();
+    if (length < wanted)
+        found.add(text("cut short: ", grouped(wanted - length), " of ", grouped(wanted),
+                       " bytes are missing"));
+    if (length > wanted)
+        found.add(text(grouped(length - wanted), " bytes more than the header asks for"));
+}
+
+void check_header(const std::string &name, findings &found)
+{
+    if (const auto vitec = read_vitec_header(name)) {
+        check_vitec_header(*vitec, found);
+    } else if (const auto helava = read_helava_trailer(name)) {
+        for (const auto &[field, value] : {std::pair{"nbands", helava->nbands},
+                                           {"nsamps", helava->nsamps},
+                                           {"nlines", helava->nlines}})
+            if (value < 0) found.add(text(field, " is ", value));
+    }
+}
+
+bool check(const std::string &name)
+{
+    findings found(name);
+    std::unique_ptr<image_reader> image;
+    try {
+        image = open_image(name);
+    } catch (const failure &failed) {
+        if (!std::filesystem::is_regular_file(name)) throw;
+        check_header(name, found);
+        found.add(std::string(failed.what()).substr(name.size() + 2));
+        return false;
+    }
+    check_header(name, found);
+    if (image->format == file_format::vitec || image->format == file_format::helava)
+        check_length(name, found);
+    check_samples(*image, found);
+    return !found.any();
+}
+
+}  // namespace
+
+int run_check(const check_options &asked)
+{
+    int status = 0;
+    for (const std::string &name : asked.files) {
+        try {
+            if (!check(name)) status = 1;
+        } catch (const failure &failed) {
+            std::fflush(stdout);
+            std::fprintf(stderr, "imgfile: %s\n", failed.what());
+            status = 1;
+        }
+    }
+    return status;
+}

@@ -1,0 +1,60 @@
+// The sub-commands. Each does its work and returns the exit status, 0 or 1, or throws `failure` or
+// `wrong_usage`.
+#ifndef TOOL_COMMANDS_H
+#define TOOL_COMMANDS_H
+
+#include "image.h"
+
+#include <string>
+#include <vector>
+
+struct info_options {
+    std::vector<std::string> files;
+    bool json = false;
+};
+int run_info(const info_options &asked);
+
+struct check_options {
+    std::vector<std::string> files;
+};
+int run_check(const check_options &asked);
+
+struct convert_options {
+    std::string in, out, format, tile = "none", window, bands;
+    bool stretch = false, overwrite = false;
+};
+int run_convert(const convert_options &asked);
+
+struct preview_options {
+    std::string in, out, bands;
+    std::int32_t size = 1024;
+    bool raw = false, overwrite = false;
+};
+int run_preview(const preview_options &asked);
+
+struct stats_options {
+    std::string in, histogram;
+    bool json = false, overwrite = false;
+};
+int run_stats(const stats_options &asked);
+
+struct compare_options {
+    std::string a, b;
+};
+int run_compare(const compare_options &asked);
+
+struct create_options {
+    std::string out, type, tile = "none";
+    std::int32_t nlines = 0, nsamps = 0, nbands = 1, nbytes = 1;
+    bool pattern = false, overwrite = false;
+};
+int run_create(const create_options &asked);
+
+// "none", "256" or "128x256", lines first; throws `wrong_usage`.
+tile_size parse_tile(const std::string &text);
+
+// "0,2" as bands that the image has; "" as `otherwise`. Throws `wrong_usage` and `failure`.
+band_list parse_bands(const std::string &text, const image_reader &image,
+                      const band_list &otherwise);
+
+#endif

@@ -1,0 +1,72 @@
+// imgfile create: an image of zeros, or one to try things out with.
+#include "commands.h"
+#include "failure.h"
+#include "output.h"
+#include "walk.h"
+
+#include <algorithm>
+
+namespace {
+
+// A ramp from corner to corner, each band running its own way, with a line every 64 lines and
+// samples.
+std::int32_t pattern_at(const shape &form, std::int64_t line, std::int64_t samp, std::int32_t band)
+{
+    const std::int64_t highest = form.highest();
+    if (line % 64 == 0 || samp % 64 == 0) return static_cast<std::int32_t>(highest);
+    const std::int64_t from_left = band % 2 == 0 ? samp : form.nsamps - 1 - samp;
+    const std::int64_t from_top = band % 3 == 1 ? form.nlines - 1 - line : line;
+    return static_cast<std::int32_t>((from_left + from_top) * highest /
+                                     std::max<std::int64_t>(form.nsamps + form.nlines - 2, 1));
+}
+
+void write_pattern(image_writer &writer, const shape &form)
+{
+    const std::int64_t line_length = std::int64_t{form.nsamps} * form.nbands * form.nbytes;
+    const std::int64_t height = std::max<std::int64_t>(writer.tiles.nlines, 1);
+    const std::int64_t budget = std::max<std::int64_t>((std::int64_t{4} << 20U) / line_length, 1);
+    const auto step =
+        static_cast<std::int32_t>(std::max(budget / height * height, std::min(budget, height)));
+    progress shown(form.bytes());
+    for (std::int64_t top = 0; top < form.nlines; top += step) {
+        const auto nlines =
+            static_cast<std::int32_t>(std::min<std::int64_t>(step, form.nlines - top));
+        block samples(nlines, form.nsamps, form.nbands, form.nbytes);
+        for (std::int32_t band = 0; band < form.nbands; ++band)
+            for (std::int32_t line = 0; line < nlines; ++line) {
+                std::uint8_t *const row = samples.row(band, line);
+                for (std::int32_t samp = 0; samp < form.nsamps; ++samp) {
+                    const std::int32_t value = pattern_at(form, top + line, samp, band);
+                    if (form.nbytes == 1)
+                        row[samp] = static_cast<std::uint8_t>(value);
+                    else
+                        reinterpret_cast<std::uint16_t *>(row)[samp] =
+                            static_cast<std::uint16_t>(value);
+                }
+            }
+        writer.write({static_cast<std::int32_t>(top), 0, nlines, form.nsamps}, samples);
+        shown.add(static_cast<std::int64_t>(samples.bytes.size()));
+    }
+}
+
+}  // namespace
+
+int run_create(const create_options &asked)
+{
+    const file_format format = format_of_output(asked.out, asked.type);
+    if (format != file_format::vitec && format != file_format::helava)
+        throw wrong_usage(text(asked.out,
+                               ": only VITec and Helava files are created; \"imgfile "
+                               "convert\" makes ",
+                               name_of(format), " files of them"));
+    const shape form{asked.nlines, asked.nsamps, asked.nbands, asked.nbytes,
+                     asked.nbytes == 2 ? 12 : 8};
+    const tile_size tiles = parse_tile(asked.tile);
+    output_file out(asked.out, asked.overwrite, "");
+    auto writer = create_image(out, format, form, tiles);
+    if (asked.pattern && form.nsamples() > 0) write_pattern(*writer, form);
+    const std::int64_t length = writer->finish();
+    writer.reset();
+    out.commit(length);
+    return 0;
+}

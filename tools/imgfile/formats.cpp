@@ -1,0 +1,155 @@
+// Which format a file has, and which one it is to have.
+#include "failure.h"
+#include "image.h"
+#include "output.h"
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <filesystem>
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+namespace {
+
+struct ending {
+    const char *text;
+    file_format format;
+};
+constexpr std::array<ending, 9> endings{{{".img", file_format::vitec},
+                                         {".d", file_format::helava},
+                                         {".pgm", file_format::pgm},
+                                         {".ppm", file_format::ppm},
+                                         {".pnm", file_format::pnm},
+                                         {".png", file_format::png},
+                                         {".tif", file_format::tiff},
+                                         {".tiff", file_format::tiff},
+                                         {".btf", file_format::tiff}}};
+
+std::string in_lower_case(std::string text)
+{
+    std::ranges::transform(text, text.begin(), [](unsigned char c) { return std::tolower(c); });
+    return text;
+}
+
+// Standard input as a file that can be read twice.
+int spool_standard_input()
+{
+    std::FILE *const spool = std::tmpfile();
+    if (spool == nullptr)
+        throw failure("standard input", "no temporary file: " + system_text(errno));
+    const int fd = ::fcntl(::fileno(spool), F_DUPFD_CLOEXEC, 3);
+    std::fclose(spool);
+    std::array<char, 65536> bytes;
+    for (;;) {
+        const ssize_t got = ::read(STDIN_FILENO, bytes.data(), bytes.size());
+        if (got == 0) return fd;
+        if (got == -1 && errno == EINTR) continue;
+        if (got == -1 || ::write(fd, bytes.data(), static_cast<std::size_t>(got)) != got) {
+            const int error = errno;
+            ::close(fd);
+            throw failure("standard input", "cannot be read: " + system_text(error));
+        }
+    }
+}
+
+int open_to_read(const std::string &name)
+{
+    if (name == "-") {
+        static const int spool = spool_standard_input();
+        return ::fcntl(spool, F_DUPFD_CLOEXEC, 3);
+    }
+    const int fd = ::open(name.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK);
+    if (fd == -1) throw failure(name, system_text(errno));
+    struct stat status;
+    if (::fstat(fd, &status) == -1 || !(S_ISREG(status.st_mode) || S_ISBLK(status.st_mode))) {
+        ::close(fd);
+        throw failure(name, S_ISDIR(status.st_mode) ? "is a folder" : "is not a regular file");
+    }
+    return fd;
+}
+
+bool is_pnm(file_format format)
+{
+    return format == file_format::pgm || format == file_format::ppm || format == file_format::pnm;
+}
+
+std::string bytes_at(int fd, std::int64_t offset, std::size_t count)
+{
+    std::string bytes(count, '\0');
+    const ssize_t got = ::pread(fd, bytes.data(), count, std::max<std::int64_t>(offset, 0));
+    bytes.resize(static_cast<std::size_t>(std::max<ssize_t>(got, 0)));
+    return bytes;
+}
+
+}  // namespace
+
+const char *name_of(file_format format)
+{
+    constexpr std::array names{"VITec", "Helava", "PGM", "PPM", "PNM", "PNG", "TIFF"};
+    return names.at(static_cast<std::size_t>(format));
+}
+
+file_format format_of_output(const std::string &name, const std::string &wanted)
+{
+    if (name == "-" && wanted.empty()) return file_format::pnm;
+    const std::string end =
+        wanted.empty() ? in_lower_case(std::filesystem::path(name).extension()) : "." + wanted;
+    if (end == ".vitec") return file_format::vitec;
+    if (end == ".helava") return file_format::helava;
+    const auto *const found =
+        std::ranges::find_if(endings, [&end](const ending &each) { return end == each.text; });
+    if (found == endings.end())
+        throw wrong_usage(text(name, ": ", end.empty() ? "a name without an ending" : end,
+                               " tells no format that can be written; say --format"));
+    if (name == "-" && !is_pnm(found->format))
+        throw wrong_usage("only PGM and PPM can go to standard output");
+    return found->format;
+}
+
+std::unique_ptr<image_reader> open_image(const std::string &name)
+{
+    const int fd = open_to_read(name);
+    const std::string shown = name == "-" ? "standard input" : name;
+    const std::string start = bytes_at(fd, 0, 4);
+    // Samples of a Helava file come first, and may look like the beginning of anything.
+    const std::string end = bytes_at(fd, ::lseek(fd, 0, SEEK_END) - 4, 4);
+    const bool is_native = start == std::string("\x00\x5B\x07\x20", 4) ||
+                           start == std::string("\x20\x07\x5B\x00", 4) ||
+                           end == "\x48\x41\x14\x84" || end == "\x84\x14\x41\x48";
+    ::lseek(fd, 0, SEEK_SET);
+    if (!is_native) {
+        if (start.size() == 4 && start[0] == 'P' && start[1] >= '1' && start[1] <= '7')
+            return open_pnm(shown, fd);
+        if (start == "\x89PNG") return open_png(shown, fd);
+        if (start.starts_with("II*") || start.starts_with("II+") ||
+            start == std::string("MM\0*", 4) || start == std::string("MM\0+", 4))
+            return open_tiff(shown, fd);
+    }
+    ::close(fd);
+    if (name == "-") throw failure(shown, "is no PGM or PPM picture");
+    return open_native(name);
+}
+
+std::unique_ptr<image_writer> create_image(output_file &out, file_format format, const shape &form,
+                                           tile_size tiles)
+{
+    if (tiles.nlines != 0 && (is_pnm(format) || format == file_format::png))
+        throw failure(out.name(), text(name_of(format), " files have no tiles"));
+    switch (format) {
+    case file_format::pgm:
+    case file_format::ppm:
+    case file_format::pnm:
+        return create_pnm(out, format, form);
+    case file_format::png:
+        return create_png(out, form);
+    case file_format::tiff:
+        return create_tiff(out, form, tiles);
+    default:
+        return create_native(out, format, form, tiles);
+    }
+}

@@ -1,0 +1,191 @@
+// The histogram as a picture for a report.
+#include "failure.h"
+#include "histogram.h"
+#include "walk.h"
+
+#include <algorithm>
+#include <array>
+#include <cairo.h>
+#include <cmath>
+
+namespace {
+
+constexpr double WIDTH = 960, HEIGHT = 540;
+constexpr double LEFT = 90, RIGHT = 70, TOP = 64, BOTTOM = 64;  // margins
+constexpr double PLOT_WIDTH = WIDTH - LEFT - RIGHT, PLOT_HEIGHT = HEIGHT - TOP - BOTTOM;
+
+struct color {
+    double red, green, blue;
+};
+constexpr color ink{0.15, 0.17, 0.2}, faint{0.88, 0.89, 0.91};
+constexpr std::array colors{color{0.80, 0.22, 0.20}, color{0.16, 0.55, 0.25},
+                            color{0.13, 0.37, 0.75}};
+constexpr color gray{0.36, 0.45, 0.56};
+
+// A picture with a plot in it, of values in [low, high] and heights in [0, top].
+class plot {
+public:
+    plot(double low, double high, double top)
+        : m_surface(cairo_image_surface_create(CAIRO_FORMAT_RGB24, int(WIDTH), int(HEIGHT))),
+          m_cairo(cairo_create(m_surface)), m_low(low), m_high(high), m_top(top)
+    {
+        use({1, 1, 1});
+        cairo_paint(m_cairo);
+        cairo_select_font_face(m_cairo, "sans-serif", CAIRO_FONT_SLANT_NORMAL,
+                               CAIRO_FONT_WEIGHT_NORMAL);
+    }
+    ~plot()
+    {
+        cairo_destroy(m_cairo);
+        cairo_surface_destroy(m_surface);
+    }
+    plot(const plot &) = delete;
+    plot &operator=(const plot &) = delete;
+
+    double x(double value) const { return LEFT + (value - m_low) / (m_high - m_low) * PLOT_WIDTH; }
+    double y(double share) const
+    {
+        return TOP + (1 - share) * PLOT_HEIGHT;
+    }  // of the plot's height
+
+    void use(color what, double opacity = 1)
+    {
+        cairo_set_source_rgba(m_cairo, what.red, what.green, what.blue, opacity);
+    }
+    void write(const std::string &what, double at_x, double at_y, double align, double size)
+    {
+        cairo_set_font_size(m_cairo, size);
+        cairo_text_extents_t extents;
+        cairo_text_extents(m_cairo, what.c_str(), &extents);
+        cairo_move_to(m_cairo, at_x - align * extents.x_advance, at_y);
+        cairo_show_text(m_cairo, what.c_str());
+    }
+    void line(double x0, double y0, double x1, double y1, double width)
+    {
+        cairo_set_line_width(m_cairo, width);
+        cairo_move_to(m_cairo, x0, y0);
+        cairo_line_to(m_cairo, x1, y1);
+        cairo_stroke(m_cairo);
+    }
+
+    void axes(const std::string &title, const std::string &subtitle)
+    {
+        use(ink);
+        write(title, LEFT, 30, 0, 18);
+        write(subtitle, LEFT, 50, 0, 12);
+        const double step = rounded_step((m_high - m_low) / 8);
+        for (double value = std::ceil(m_low / step) * step; value <= m_high; value += step) {
+            use(faint);
+            line(x(value), y(0), x(value), y(1), 1);
+            use(ink);
+            write(grouped(static_cast<std::int64_t>(value)), x(value), y(0) + 18, 0.5, 12);
+        }
+        const double rise = rounded_step(m_top / 5);
+        for (double count = 0; count <= m_top; count += rise) {
+            use(faint);
+            line(LEFT, y(count / m_top), LEFT + PLOT_WIDTH, y(count / m_top), 1);
+            use(ink);
+            write(grouped(static_cast<std::int64_t>(count)), LEFT - 8, y(count / m_top) + 4, 1, 12);
+        }
+        for (const int byte : {0, 64, 128, 192, 255})
+            write(std::to_string(byte), LEFT + PLOT_WIDTH + 8, y(byte / 255.0) + 4, 0, 12);
+        write("sample value", LEFT + PLOT_WIDTH / 2, HEIGHT - 18, 0.5, 13);
+        write_upright("samples", 18);
+        write_upright("byte after the stretch (line)", WIDTH - 14);
+        line(LEFT, y(0), LEFT + PLOT_WIDTH, y(0), 1);
+    }
+
+    void draw(const band_histogram &of, color by, double bin)
+    {
+        cairo_move_to(m_cairo, x(m_low), y(0));
+        for (double first = m_low; first < m_high; first += bin) {
+            const double share = std::min(sum(of, first, bin) / m_top, 1.0);
+            cairo_line_to(m_cairo, x(first), y(share));
+            cairo_line_to(m_cairo, x(first + bin), y(share));
+        }
+        cairo_line_to(m_cairo, x(m_high), y(0));
+        cairo_close_path(m_cairo);
+        use(by, 0.45);
+        cairo_fill(m_cairo);
+
+        const auto &table = of.spread.table();
+        for (double value = m_low; value < m_high; value += bin) {
+            const auto index = std::min(static_cast<std::size_t>(value), table.size() - 1);
+            cairo_line_to(m_cairo, x(value), y(table[index] / 255.0));
+        }
+        use(by);
+        cairo_set_line_width(m_cairo, 2);
+        cairo_stroke(m_cairo);
+    }
+
+    std::string as_png() const
+    {
+        std::string bytes;
+        const auto append = [](void *to, const unsigned char *data, unsigned count) {
+            static_cast<std::string *>(to)->append(reinterpret_cast<const char *>(data), count);
+            return CAIRO_STATUS_SUCCESS;
+        };
+        if (cairo_surface_write_to_png_stream(m_surface, append, &bytes) != CAIRO_STATUS_SUCCESS)
+            throw std::bad_alloc();
+        return bytes;
+    }
+
+    // Samples with values in [first, first + bin).
+    static double sum(const band_histogram &of, double first, double bin)
+    {
+        const auto begin = static_cast<std::size_t>(first);
+        const auto end = std::min(static_cast<std::size_t>(first + bin), of.counts.size());
+        double all = 0;
+        for (std::size_t value = begin; value < end; ++value)
+            all += static_cast<double>(of.counts[value]);
+        return all;
+    }
+
+private:
+    // 1, 2 or 5 times a power of ten, at least 1.
+    static double rounded_step(double about)
+    {
+        const double power = std::pow(10, std::floor(std::log10(std::max(about, 1.0))));
+        for (const double factor : {1.0, 2.0, 5.0})
+            if (factor * power >= about) return factor * power;
+        return 10 * power;
+    }
+    void write_upright(const std::string &what, double at_x)
+    {
+        cairo_save(m_cairo);
+        cairo_translate(m_cairo, at_x, TOP + PLOT_HEIGHT / 2);
+        cairo_rotate(m_cairo, -std::acos(0.0));
+        write(what, 0, 0, 0.5, 13);
+        cairo_restore(m_cairo);
+    }
+
+    cairo_surface_t *m_surface;
+    cairo_t *m_cairo;
+    double m_low, m_high, m_top;
+};
+
+}  // namespace
+
+std::string draw_histograms(const std::vector<band_histogram> &of, const std::string &title)
+{
+    std::int32_t high = 0;
+    for (const band_histogram &each : of) high = std::max(high, each.highest() + 1);
+    const std::int32_t bin = std::max(high / 400, 1);
+    high = (high + bin - 1) / bin * bin;
+    // The fill, 0, often is most of an image: the rest decides how high the plot is.
+    double top = 1;
+    for (const band_histogram &each : of)
+        for (std::int32_t first = 0; first < high; first += bin)
+            top = std::max(
+                top, plot::sum(each, std::max(first, 1), first == 0 ? std::max(bin - 1, 0) : bin));
+    plot picture(0, high, top * 1.05);
+    std::string subtitle;
+    for (const band_histogram &each : of)
+        subtitle += text(subtitle.empty() ? "" : "    ", "band ", each.band, ": ", each.lowest(),
+                         " to ", each.highest(), ", mean ",
+                         static_cast<double>(std::lround(each.mean() * 10)) / 10);
+    picture.axes(title, subtitle);
+    for (std::size_t i = 0; i < of.size(); ++i)
+        picture.draw(of[i], of.size() > 1 ? colors.at(i % colors.size()) : gray, bin);
+    return picture.as_png();
+}

@@ -1,0 +1,180 @@
+// Binary PGM and PPM files: a header of text, then pixels, line by line, the high byte first.
+#include "failure.h"
+#include "image.h"
+#include "output.h"
+#include "samples.h"
+
+#include <bit>
+#include <cerrno>
+#include <climits>
+#include <optional>
+
+#include <sys/stat.h>
+#include <unistd.h>
+
+namespace {
+
+class descriptor {
+public:
+    explicit descriptor(int fd) : m_fd(fd) {}
+    ~descriptor() { ::close(m_fd); }
+    descriptor(const descriptor &) = delete;
+    descriptor &operator=(const descriptor &) = delete;
+    operator int() const { return m_fd; }
+
+private:
+    int m_fd;
+};
+
+bool is_blank(int byte)
+{
+    return byte == ' ' || (byte >= '\t' && byte <= '\r');
+}
+
+// Takes the header's numbers apart.
+class header_text {
+public:
+    explicit header_text(std::string bytes) : m_bytes(std::move(bytes)) {}
+    // The next number, after blanks and comments, if there is one below 2^31.
+    std::optional<std::int32_t> number()
+    {
+        while (is_blank(next()) || next() == '#') {
+            if (next() == '#')
+                m_at = std::min(m_bytes.find('\n', m_at), m_bytes.size());
+            else
+                ++m_at;
+        }
+        if (next() < '0' || next() > '9') return std::nullopt;
+        std::int64_t value = 0;
+        for (; next() >= '0' && next() <= '9'; ++m_at) {
+            value = value * 10 + (next() - '0');
+            if (value > INT_MAX) return std::nullopt;
+        }
+        return static_cast<std::int32_t>(value);
+    }
+    int next() const
+    {
+        return m_at < m_bytes.size() ? static_cast<unsigned char>(m_bytes[m_at]) : -1;
+    }
+    std::size_t m_at = 2;  // after the two letters that the file begins with
+
+private:
+    std::string m_bytes;
+};
+
+class pnm_reader : public image_reader {
+public:
+    pnm_reader(const std::string &path, int fd) : image_reader(path, file_format::pgm), m_file(fd)
+    {
+        std::string start(65536, '\0');  // comments may be long
+        start.resize(
+            static_cast<std::size_t>(std::max<ssize_t>(read_at(0, &start[0], start.size()), 0)));
+        if (start[1] != '5' && start[1] != '6')
+            throw failure(name, "is a PNM file of a kind that is not read: only binary PGM (P5) "
+                                "and PPM (P6) are");
+        form.nbands = start[1] == '6' ? 3 : 1;
+        if (form.nbands == 3) format = file_format::ppm;
+        header_text header(start);
+        const auto nsamps = header.number(), nlines = header.number(), highest = header.number();
+        if (!highest || *nsamps < 1 || *nlines < 1 || *highest < 1 || *highest > 65535 ||
+            !is_blank(header.next()))
+            throw failure(name, "has no usable PGM or PPM header");
+        form.nlines = *nlines;
+        form.nsamps = *nsamps;
+        form.nbytes = *highest > 255 ? 2 : 1;
+        form.nbits = form.nbytes == 1 ? 8 : static_cast<int>(std::bit_width(unsigned(*highest)));
+        m_first = static_cast<std::int64_t>(header.m_at) + 1;
+        m_line_length = std::int64_t{form.nsamps} * form.nbands * form.nbytes;
+    }
+
+    void read(const window &part, const band_list &bands, block &to) override
+    {
+        const std::int64_t pixel = std::int64_t{form.nbands} * form.nbytes;
+        m_pixels.resize(static_cast<std::size_t>(part.nsamps * pixel));
+        for (std::int32_t i = 0; i < part.nlines; ++i) {
+            const std::int64_t line = part.line + i;
+            const ssize_t got = read_at(m_first + line * m_line_length + part.samp * pixel,
+                                        m_pixels.data(), m_pixels.size());
+            if (got == -1)
+                throw failure(name, text("line ", line, " cannot be read: ", system_text(errno)));
+            if (static_cast<std::size_t>(got) != m_pixels.size())
+                throw failure(name, text("cut short: line ", line, " is missing"));
+            if (BIG_ENDIAN_IS_FOREIGN && form.nbytes == 2)
+                exchange_bytes(m_pixels.data(), m_pixels.size() / 2);
+            spread_pixels(m_pixels.data(), form.nbands, bands, {i, 0, part.nsamps, 0}, to);
+        }
+    }
+
+private:
+    // Returns the bytes that came; fewer than asked: the file ends.
+    ssize_t read_at(std::int64_t offset, void *to, std::size_t count) const
+    {
+        std::size_t done = 0;
+        while (done < count) {
+            const ssize_t got = ::pread(m_file, static_cast<char *>(to) + done, count - done,
+                                        offset + static_cast<std::int64_t>(done));
+            if (got == -1 && errno == EINTR) continue;
+            if (got == -1) return -1;
+            if (got == 0) break;
+            done += static_cast<std::size_t>(got);
+        }
+        return static_cast<ssize_t>(done);
+    }
+
+    descriptor m_file;
+    std::int64_t m_first = 0, m_line_length = 0;
+    std::vector<std::uint8_t> m_pixels;
+};
+
+// Samples of two bytes are said to reach 65535, whatever they do: so no program scales them.
+class pnm_writer : public image_writer {
+public:
+    pnm_writer(output_file &out, const shape &form) : m_out(out)
+    {
+        in_order = true;
+        const std::string header = text(form.nbands == 3 ? "P6" : "P5", "\n", form.nsamps, " ",
+                                        form.nlines, "\n", form.nbytes == 2 ? 65535 : 255, "\n");
+        m_length = static_cast<std::int64_t>(header.size()) + form.bytes();
+        if (!out.is_standard_output()) out.reserve(m_length);
+        out.write(header.data(), header.size());
+    }
+
+    void write(const window & /*at*/, const block &from) override
+    {
+        m_pixels.resize(from.bytes.size());
+        const std::size_t length = m_pixels.size() / static_cast<std::size_t>(from.nlines);
+        for (std::int32_t line = 0; line < from.nlines; ++line)
+            gather_pixels(from, {line, 0, from.nsamps, 0},
+                          &m_pixels[static_cast<std::size_t>(line) * length]);
+        if (BIG_ENDIAN_IS_FOREIGN && from.nbytes == 2)
+            exchange_bytes(m_pixels.data(), m_pixels.size() / 2);
+        m_out.write(m_pixels.data(), m_pixels.size());
+    }
+    std::int64_t finish() override { return m_length; }
+
+private:
+    output_file &m_out;
+    std::int64_t m_length;
+    std::vector<std::uint8_t> m_pixels;
+};
+
+}  // namespace
+
+std::unique_ptr<image_reader> open_pnm(const std::string &name, int fd)
+{
+    return std::make_unique<pnm_reader>(name, fd);
+}
+
+std::unique_ptr<image_writer> create_pnm(output_file &out, file_format format, const shape &form)
+{
+    if ((format == file_format::pgm && form.nbands != 1) ||
+        (format == file_format::ppm && form.nbands != 3))
+        throw failure(out.name(), text(name_of(format), " files hold ",
+                                       format == file_format::pgm ? "1 band" : "3 bands", ", not ",
+                                       form.nbands));
+    if (form.nbands != 1 && form.nbands != 3)
+        throw failure(out.name(), text("PGM and PPM files hold 1 or 3 bands, not ", form.nbands,
+                                       "; --band chooses some"));
+    if (form.nsamples() == 0) throw failure(out.name(), "an empty image is no PGM or PPM picture");
+    return std::make_unique<pnm_writer>(out, form);
+}

@@ -1,0 +1,31 @@
+#include "samples.h"
+
+#include "std/std.h"
+
+void spread_pixels(const std::uint8_t *pixels, std::int32_t nbands, const band_list &bands,
+                   const line_part &part, block &to)
+{
+    const auto width = static_cast<std::size_t>(to.nbytes);
+    for (std::size_t i = 0; i < bands.size(); ++i)
+        img_std_copy_samples(pixels + static_cast<std::size_t>(bands[i]) * width,
+                             static_cast<std::size_t>(nbands) * width,
+                             to.row(part.first_band + static_cast<std::int32_t>(i), part.line) +
+                                 static_cast<std::size_t>(part.samp) * width,
+                             width, static_cast<std::size_t>(part.count), to.nbytes, false);
+}
+
+void gather_pixels(const block &from, const line_part &part, std::uint8_t *to)
+{
+    const auto width = static_cast<std::size_t>(from.nbytes);
+    const auto nbands = static_cast<std::size_t>(from.nbands - part.first_band);
+    for (std::size_t i = 0; i < nbands; ++i)
+        img_std_copy_samples(from.row(part.first_band + static_cast<std::int32_t>(i), part.line) +
+                                 static_cast<std::size_t>(part.samp) * width,
+                             width, to + i * width, nbands * width,
+                             static_cast<std::size_t>(part.count), from.nbytes, false);
+}
+
+void exchange_bytes(std::uint8_t *samples, std::size_t count)
+{
+    img_std_exchange_bytes(samples, samples, count);
+}
