@@ -370,7 +370,8 @@ TEST_F(Lending, TouchedLinesFailAsWholeTilesDo)
         for (const bool touched : {false, true}) {
             const img_handle image = create_test_file(
                 touched ? m_file : m_name, {256, 256, 1, 1, 128, 128, IMG_LAYOUT_TILED, 0});
-            EXPECT_EQ(img_dump_tiles(image, 0, 4, 0, &m_content[7]), 0);
+            const std::int32_t ntiles = limit == 36 ? 0 : 4;  // that are there already
+            EXPECT_EQ(img_dump_tiles(image, 0, ntiles, 0, &m_content[7]), 0);
             host.disk_size = limit;
             seen[touched] = outcome_of([&] {
                 return img_dump_buffer(image, 70, 4, 58, 190, 0, &m_content[0], 190, nullptr);

@@ -1,7 +1,6 @@
 // imgfile_demo OUTDIR [PICTURE...]: makes image files of pictures, or of a scene of its own, opens
 // them again through the library, compares them with the pictures and tells what it saw.
 #include "check.h"
-#include "preview.h"
 #include "scene.h"
 
 #include <algorithm>
@@ -117,17 +116,6 @@ try {
     throw std::runtime_error(shown_name(name) + ": " + problem.what());
 }
 
-void write_previews(const std::string &stem, const std::string &image_name, const picture &source)
-{
-    const open_image image(img_openfile(image_name.c_str(), IMG_OPEN_READ_ONLY));
-    const std::int32_t high = std::min(source.nlines, 640), wide = std::min(source.nsamps, 640);
-    const window middle{(source.nlines - high) / 2, (source.nsamps - wide) / 2, high, wide};
-    write_preview(stem + "_whole.png", image, {0, 0, source.nlines, source.nsamps});
-    write_preview(stem + "_middle.png", image, middle);
-    std::printf("  previews: %s, %s\n", shown_name(stem + "_whole.png").c_str(),
-                shown_name(stem + "_middle.png").c_str());
-}
-
 void describe(const std::string &name, const picture &source)
 {
     std::printf("\n%s: %d lines x %d samples x %d band%s of %d byte%s\n", shown_name(name).c_str(),
@@ -158,7 +146,6 @@ void demonstrate(const std::string &name, const std::string &stem, totals &all)
     make_and_examine(untiled_name, source, untiled, "", all);
     make_and_examine(tiled_name, source, tiled, source.nbytes == 2 ? untiled_name : "", all);
     if (source.nbytes == 1) make_and_examine(stem + helava.suffix, source, helava, "", all);
-    write_previews(stem, tiled_name, source);
 }
 
 // OUTDIR and the picture's name without its folder and suffix, the like of no other; an "@" would

@@ -103,9 +103,10 @@ void check_samples(image_reader &image, findings &found)
         found.add("has no samples");
         return;
     }
-    std::vector<band_state> bands(static_cast<std::size_t>(form.nbands));
+    std::vector<band_state> bands;
     try {
-        walk(image, whole(form), all_bands(form), nullptr,
+        bands.resize(image.all_bands().size());
+        walk(image, whole(form), image.all_bands(), nullptr,
              [&](const window &place, const block &samples) {
                  samples.for_each_row([&](std::int32_t band, std::int32_t line, const auto *row) {
                      band_state &state = bands[static_cast<std::size_t>(band)];

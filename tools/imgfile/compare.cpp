@@ -77,7 +77,7 @@ int run_compare(const compare_options &asked)
     }
     differences seen;
     const partner other(*b);
-    const band_list bands = all_bands(a->form);
+    const band_list bands = a->all_bands();
     walk(*a, whole(a->form), bands, &other, [&](const window &place, const block &samples) {
         block others(place.nlines, place.nsamps, samples.nbands, b->form.nbytes);
         b->read(place, bands, others);

@@ -70,7 +70,7 @@ int run_convert(const convert_options &asked)
     const tile_size tiles = parse_tile(asked.tile);
     const auto in = open_image(asked.in);
     const window part = parse_window(asked.window, in->name, in->form);
-    const band_list bands = parse_bands(asked.bands, *in, all_bands(in->form));
+    const band_list bands = parse_bands(asked.bands, *in, in->all_bands());
 
     output_file out(asked.out, asked.overwrite, asked.in == "-" ? "" : asked.in);
     shape form{part.nlines, part.nsamps, static_cast<std::int32_t>(bands.size()), in->form.nbytes,

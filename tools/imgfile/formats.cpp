@@ -94,6 +94,23 @@ const char *name_of(file_format format)
     return names.at(static_cast<std::size_t>(format));
 }
 
+band_list image_reader::all_bands() const
+{
+    constexpr std::int32_t most = 4096;  // a header may say anything
+    if (form.nbands > most)
+        throw failure(name, text("says that it has ", form.nbands, " bands; at most ", most,
+                                 " are handled at once"));
+    band_list bands(static_cast<std::size_t>(form.nbands));
+    std::iota(bands.begin(), bands.end(), 0);
+    return bands;
+}
+
+void check_png_name(const std::string &name)
+{
+    if (in_lower_case(std::filesystem::path(name).extension()) != ".png")
+        throw wrong_usage(name + ": the picture will be a PNG file; let its name end in .png");
+}
+
 file_format format_of_output(const std::string &name, const std::string &wanted)
 {
     if (name == "-" && wanted.empty()) return file_format::pnm;

@@ -54,11 +54,11 @@ std::uint64_t band_histogram::beyond() const
 std::vector<band_histogram> measure_histograms(image_reader &image)
 {
     std::vector<band_histogram> all;
-    for (const std::int32_t band : all_bands(image.form))
+    for (const std::int32_t band : image.all_bands())
         all.push_back({band, image.form.nbits,
                        std::vector<std::uint64_t>(image.form.nbytes == 1 ? 256 : 65536),
                        stretch(image.form.nbits)});
-    walk(image, whole(image.form), all_bands(image.form), nullptr,
+    walk(image, whole(image.form), image.all_bands(), nullptr,
          [&](const window &place, const block &samples) {
              samples.for_each_row([&](std::int32_t band, std::int32_t, const auto *row) {
                  auto &counts = all[static_cast<std::size_t>(band)].counts;

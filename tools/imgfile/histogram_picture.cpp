@@ -7,6 +7,7 @@
 #include <array>
 #include <cairo.h>
 #include <cmath>
+#include <fontconfig/fontconfig.h>
 
 namespace {
 
@@ -20,7 +21,7 @@ struct color {
 constexpr color ink{0.15, 0.17, 0.2}, faint{0.88, 0.89, 0.91};
 constexpr std::array colors{color{0.80, 0.22, 0.20}, color{0.16, 0.55, 0.25},
                             color{0.13, 0.37, 0.75}};
-constexpr color gray{0.36, 0.45, 0.56};
+constexpr color gray{0.36, 0.45, 0.56}, orange{0.85, 0.42, 0.05};
 
 // A picture with a plot in it, of values in [low, high] and heights in [0, top].
 class plot {
@@ -38,6 +39,8 @@ public:
     {
         cairo_destroy(m_cairo);
         cairo_surface_destroy(m_surface);
+        cairo_debug_reset_static_data();  // what they know of fonts is not needed again
+        FcFini();
     }
     plot(const plot &) = delete;
     plot &operator=(const plot &) = delete;
@@ -95,7 +98,7 @@ public:
         line(LEFT, y(0), LEFT + PLOT_WIDTH, y(0), 1);
     }
 
-    void draw(const band_histogram &of, color by, double bin)
+    void draw(const band_histogram &of, color by, color stretch_by, double bin)
     {
         cairo_move_to(m_cairo, x(m_low), y(0));
         for (double first = m_low; first < m_high; first += bin) {
@@ -113,7 +116,7 @@ public:
             const auto index = std::min(static_cast<std::size_t>(value), table.size() - 1);
             cairo_line_to(m_cairo, x(value), y(table[index] / 255.0));
         }
-        use(by);
+        use(stretch_by);
         cairo_set_line_width(m_cairo, 2);
         cairo_stroke(m_cairo);
     }
@@ -164,6 +167,11 @@ private:
     double m_low, m_high, m_top;
 };
 
+double rounded(double number)  // to tenths
+{
+    return std::round(number * 10) / 10;
+}
+
 }  // namespace
 
 std::string draw_histograms(const std::vector<band_histogram> &of, const std::string &title)
@@ -180,12 +188,18 @@ std::string draw_histograms(const std::vector<band_histogram> &of, const std::st
                 top, plot::sum(each, std::max(first, 1), first == 0 ? std::max(bin - 1, 0) : bin));
     plot picture(0, high, top * 1.05);
     std::string subtitle;
-    for (const band_histogram &each : of)
+    for (const band_histogram &each : of) {
+        const double zeros =
+            static_cast<double>(each.counts[0]) / static_cast<double>(each.total());
         subtitle += text(subtitle.empty() ? "" : "    ", "band ", each.band, ": ", each.lowest(),
-                         " to ", each.highest(), ", mean ",
-                         static_cast<double>(std::lround(each.mean() * 10)) / 10);
+                         " to ", each.highest(), ", mean ", rounded(each.mean()), ", ",
+                         rounded(100 * zeros), " % zero");
+    }
     picture.axes(title, subtitle);
-    for (std::size_t i = 0; i < of.size(); ++i)
-        picture.draw(of[i], of.size() > 1 ? colors.at(i % colors.size()) : gray, bin);
+    for (std::size_t i = 0; i < of.size(); ++i) {
+        const color own = colors.at(i % colors.size());
+        const bool is_alone = of.size() == 1;
+        picture.draw(of[i], is_alone ? gray : own, is_alone ? orange : own, bin);
+    }
     return picture.as_png();
 }

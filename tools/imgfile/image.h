@@ -77,13 +77,6 @@ private:
 
 using band_list = std::vector<std::int32_t>;
 
-inline band_list all_bands(const shape &of)
-{
-    band_list bands(static_cast<std::size_t>(of.nbands));
-    std::iota(bands.begin(), bands.end(), 0);
-    return bands;
-}
-
 // An image file that is open for reading. All functions here throw `failure`.
 class image_reader {
 public:
@@ -94,6 +87,8 @@ public:
     virtual ~image_reader() = default;
     image_reader(const image_reader &) = delete;
     image_reader &operator=(const image_reader &) = delete;
+
+    band_list all_bands() const;
 
     // Reads these bands of a window inside the image. A failure names the first line that the file
     // does not have.
@@ -133,6 +128,9 @@ std::unique_ptr<image_writer> create_image(output_file &out, file_format format,
 
 // Returns the format that a name ends in, or that is called `wanted` ("" : not said).
 file_format format_of_output(const std::string &name, const std::string &wanted);
+
+// Refuses names that do not end in ".png".
+void check_png_name(const std::string &name);
 
 // --- by format ---
 

@@ -131,16 +131,29 @@ void output_file::reserve(std::int64_t length)
     if (::ftruncate(m_fd, length) == -1) fail(errno);
 }
 
-void output_file::write(const void *bytes, std::size_t count)
+template <typename Write>
+void output_file::write_all(const void *bytes, std::size_t count, Write write)
 {
-    const auto *from = static_cast<const char *>(bytes);
-    while (count > 0) {
-        const ssize_t written = ::write(m_fd, from, count);
+    for (std::size_t done = 0; done < count;) {
+        const ssize_t written = write(static_cast<const char *>(bytes) + done, count - done, done);
         if (written == -1 && errno == EINTR) continue;
         if (written == -1) fail(errno);
-        from += written;
-        count -= static_cast<std::size_t>(written);
+        done += static_cast<std::size_t>(written);
     }
+}
+
+void output_file::write(const void *bytes, std::size_t count)
+{
+    write_all(bytes, count, [this](const char *from, std::size_t left, std::size_t /*done*/) {
+        return ::write(m_fd, from, left);
+    });
+}
+
+void output_file::write_at(std::int64_t offset, const void *bytes, std::size_t count)
+{
+    write_all(bytes, count, [=, this](const char *from, std::size_t left, std::size_t done) {
+        return ::pwrite(m_fd, from, left, offset + static_cast<std::int64_t>(done));
+    });
 }
 
 void output_file::commit(std::int64_t length)

@@ -25,14 +25,17 @@ public:
 
     // Reserves the room for `length` bytes, all of which are to be written.
     void reserve(std::int64_t length);
-    // Writes all of the bytes at the current position.
+    // Write all of the bytes: after those before, or, not to standard output, at a place.
     void write(const void *bytes, std::size_t count);
+    void write_at(std::int64_t offset, const void *bytes, std::size_t count);
     // Checks the length (-1: not known), gets the bytes to the disk, and gives the file its name.
     void commit(std::int64_t length);
 
 private:
     void open_without_name(const std::string &folder);
     void open_beside();
+    template <typename Write>
+    void write_all(const void *bytes, std::size_t count, Write write);
     [[noreturn]] void fail(int error) const;
 
     std::string m_name, m_target;  // the latter without symbolic links

@@ -129,17 +129,17 @@ private:
 // Samples of two bytes are said to reach 65535, whatever they do: so no program scales them.
 class pnm_writer : public image_writer {
 public:
-    pnm_writer(output_file &out, const shape &form) : m_out(out)
+    pnm_writer(output_file &out, const shape &form) : m_out(out), m_form(form)
     {
-        in_order = true;
+        in_order = out.is_standard_output();
         const std::string header = text(form.nbands == 3 ? "P6" : "P5", "\n", form.nsamps, " ",
                                         form.nlines, "\n", form.nbytes == 2 ? 65535 : 255, "\n");
-        m_length = static_cast<std::int64_t>(header.size()) + form.bytes();
-        if (!out.is_standard_output()) out.reserve(m_length);
+        m_first = static_cast<std::int64_t>(header.size());
+        if (!in_order) out.reserve(finish());
         out.write(header.data(), header.size());
     }
 
-    void write(const window & /*at*/, const block &from) override
+    void write(const window &at, const block &from) override
     {
         m_pixels.resize(from.bytes.size());
         const std::size_t length = m_pixels.size() / static_cast<std::size_t>(from.nlines);
@@ -148,13 +148,24 @@ public:
                           &m_pixels[static_cast<std::size_t>(line) * length]);
         if (BIG_ENDIAN_IS_FOREIGN && from.nbytes == 2)
             exchange_bytes(m_pixels.data(), m_pixels.size() / 2);
-        m_out.write(m_pixels.data(), m_pixels.size());
+        if (from.nsamps == m_form.nsamps)
+            m_out.write(m_pixels.data(), m_pixels.size());
+        else
+            for (std::int32_t line = 0; line < from.nlines; ++line)
+                m_out.write_at(offset(at.line + line, at.samp),
+                               &m_pixels[static_cast<std::size_t>(line) * length], length);
     }
-    std::int64_t finish() override { return m_length; }
+    std::int64_t finish() override { return offset(m_form.nlines, 0); }
 
 private:
+    std::int64_t offset(std::int64_t line, std::int64_t samp) const
+    {
+        return m_first + (line * m_form.nsamps + samp) * m_form.nbands * m_form.nbytes;
+    }
+
     output_file &m_out;
-    std::int64_t m_length;
+    shape m_form;
+    std::int64_t m_first = 0;
     std::vector<std::uint8_t> m_pixels;
 };
 

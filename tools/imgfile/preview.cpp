@@ -66,10 +66,11 @@ private:
 
 int run_preview(const preview_options &asked)
 {
+    check_png_name(asked.out);
     const auto in = open_image(asked.in);
     if (in->form.nsamples() == 0) throw failure(in->name, "is empty: there is nothing to see");
     const band_list bands =
-        parse_bands(asked.bands, *in, in->form.nbands == 3 ? all_bands(in->form) : band_list{0});
+        parse_bands(asked.bands, *in, in->form.nbands == 3 ? in->all_bands() : band_list{0});
     if (bands.size() != 1 && bands.size() != 3) throw wrong_usage("--band takes one band or three");
     output_file out(asked.out, asked.overwrite, asked.in == "-" ? "" : asked.in);
 

@@ -49,6 +49,7 @@ void print(const band_histogram &of)
 
 int run_stats(const stats_options &asked)
 {
+    if (!asked.histogram.empty()) check_png_name(asked.histogram);
     const auto image = open_image(asked.in);
     if (image->form.nsamples() == 0) throw failure(image->name, "is empty: it has no samples");
     std::unique_ptr<output_file> out;
