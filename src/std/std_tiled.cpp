@@ -10,6 +10,9 @@
 
 namespace {
 
+// Bytes that take as long to move as the calls that spare moving them.
+constexpr std::size_t WORTH_A_CALL = 8192;
+
 // How a stretch of lines, or of samples, falls into tiles.
 class tile_span {
 public:
@@ -160,12 +163,11 @@ void lay_over(const img_desc *desc, const tiled_region &region, std::int32_t row
 bool touches_few_lines(const img_desc *desc, const tiled_region &region, std::int32_t row,
                        std::int32_t band)
 {
-    constexpr std::size_t worth_a_call = 8192;
     const bool lines_lie_together =
         img_std_plane_in_tile(desc, band).step == static_cast<std::size_t>(desc->nbytes);
     const auto touched = static_cast<std::size_t>(region.lines_in_tile(row).count);
     return lines_lie_together &&
-           img_std_plane_size(desc) - touched * region.plane_pitch() >= worth_a_call;
+           img_std_plane_size(desc) - touched * region.plane_pitch() >= WORTH_A_CALL;
 }
 
 // Writes those lines of a run that the region touches, without the rest of its tiles. Returns
@@ -261,9 +263,10 @@ std::int32_t img_std_write_tiled(img_desc *desc, std::int32_t line, std::int32_t
             write_touched_lines(desc, region, row, band, buffer, run.get()))
             continue;
         const bool is_known =
-            direct &&
-            (region.covers_run(row) || img_std_read_lent_tiles(desc, first_tile, region.ntiles(),
-                                                               band, 0, plane_samples, run.get()));
+            direct && (region.covers_run(row) ||
+                       (region.run_length() >= WORTH_A_CALL &&
+                        img_std_read_lent_tiles(desc, first_tile, region.ntiles(), band, 0,
+                                                plane_samples, run.get())));
         if (!is_known) {
             img_fill_samples(run.get(), plane_samples * static_cast<std::size_t>(region.ntiles()),
                              desc->nbytes, fill != nullptr ? fill : img_zero_sample.data());
