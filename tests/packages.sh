@@ -2,6 +2,7 @@
 # packages.sh CPACK BUILD SOURCE CC: makes the Debian packages of a build tree, twice, and looks at them
 # as their users will: what they ask for, what is in them, whether man finds every function, and a
 # host and the program of the unpacked tree at work.
+# shellcheck disable=SC2016 # dpkg-deb puts the fields in
 set -eu
 cpack=$1 build=$2 source=$3 cc=$4
 
@@ -50,7 +51,8 @@ for name in libimgfile0 libimgfile-dev imgfile; do
     expect "version in the changelog of $name" "$version" \
         "$(zcat "$name/usr/share/doc/$name/changelog.gz" | dpkg-parsechangelog -l - -S Version)"
 done
-expect 'control files of libimgfile0' 'control md5sums shlibs symbols triggers ' "$(cat libimgfile0.control)"
+expect 'control files of libimgfile0' 'control md5sums shlibs symbols triggers ' \
+    "$(cat libimgfile0.control)"
 expect 'control files of libimgfile-dev' 'control md5sums ' "$(cat libimgfile-dev.control)"
 expect 'control files of imgfile' 'control md5sums ' "$(cat imgfile.control)"
 

@@ -9,8 +9,9 @@ description=$1 library=$2 headers=$3
 
 if $renew; then
     abidw --headers-dir "$headers" --drop-private-types --exported-interfaces-only --no-corpus-path \
-        --no-comp-dir-path --no-elf-needed --no-show-locs --type-id-style hash "$library" |
-        sed "s#path='.*/\\(src\\|tests\\)/#path='\\1/#" >"$description"
+        --no-comp-dir-path --no-elf-needed --no-show-locs --type-id-style hash \
+        --out-file "$description" "$library"
+    sed -i "s#path='.*/\\(src\\|tests\\)/#path='\\1/#" "$description"  # wherever it was built
 else
     abidiff --headers-dir2 "$headers" --harmless --no-show-locs "$description" "$library" || {
         echo "The interface is not the one in $description. If that is meant, give IMGFILE_0 a"

@@ -1,5 +1,5 @@
-// The constants of img.h are no part of any function's type. One variable of each enumeration brings
-// them into the interface that is described.
+// The constants of img.h are no part of any function's type. One variable of each enumeration
+// brings them into the interface that is described.
 #include "api/img.h"
 
 extern "C" {
