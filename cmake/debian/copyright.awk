@@ -1,0 +1,14 @@
+# LICENSE, whose first line names the licence and whose third one the owners, as a Debian copyright
+# file. Variable: name (of the project).
+NR == 1 {
+    print "Format: https://www.debian.org/doc/packaging-manuals/copyright-format/1.0/"
+    print "Upstream-Name: " name
+    print ""
+    print "Files: *"
+}
+NR == 3 {
+    sub(/^Copyright \(c\) /, "")
+    print "Copyright: " $0
+    print "License: Expat"
+}
+NR > 4 { print $0 == "" ? " ." : " " $0 }

@@ -1,0 +1,25 @@
+# Run by cpack on the packages it made. Packs each anew with dpkg-deb, so that the same sources give
+# the same bytes if SOURCE_DATE_EPOCH is set; says how packages of several architectures live
+# together; and drops the scripts that call ldconfig, which the trigger does.
+function(run)
+    execute_process(COMMAND ${ARGV} COMMAND_ERROR_IS_FATAL ANY)
+endfunction()
+
+string(TIMESTAMP now "%s" UTC)
+set(ENV{SOURCE_DATE_EPOCH} ${now})
+foreach(package ${CPACK_PACKAGE_FILES})
+    set(tree ${package}.tree)
+    file(REMOVE_RECURSE ${tree})
+    run(dpkg-deb --raw-extract ${package} ${tree})
+    file(REMOVE ${tree}/DEBIAN/postinst ${tree}/DEBIAN/postrm)
+    file(READ ${tree}/DEBIAN/control control)
+    string(STRIP "${control}" control)
+    if(package MATCHES "/lib[^/]*$")
+        file(WRITE ${tree}/DEBIAN/control "${control}\nMulti-Arch: same\n")
+    else()
+        file(WRITE ${tree}/DEBIAN/control "${control}\nMulti-Arch: foreign\n")
+    endif()
+    run(find ${tree} -exec touch --no-dereference --date=@${now} {} +)
+    run(dpkg-deb --root-owner-group -Zxz --build ${tree} ${package} OUTPUT_QUIET)
+    file(REMOVE_RECURSE ${tree})
+endforeach()

@@ -1,0 +1,61 @@
+# Debian packages, one per component, with `cpack` in a build tree; scripts/package does it all.
+# The trees are completed by debian/tree.cmake before they are packed, and what CPack leaves to be
+# wished for is mended by debian/finish.cmake afterwards.
+set(package_files ${PROJECT_SOURCE_DIR}/cmake/debian)
+
+set(CPACK_GENERATOR DEB)
+set(CPACK_PACKAGE_CONTACT "imgfile developers <imgfile@example.org>")
+set(CPACK_PACKAGE_DESCRIPTION_SUMMARY "")  # each description has a first line of its own
+set(CPACK_PACKAGING_INSTALL_PREFIX /usr)
+set(CPACK_STRIP_FILES ON)
+set(CPACK_PRE_BUILD_SCRIPTS ${package_files}/tree.cmake)
+set(CPACK_POST_BUILD_SCRIPTS ${package_files}/finish.cmake)
+
+set(CPACK_DEB_COMPONENT_INSTALL ON)
+set(CPACK_COMPONENTS_ALL library development)
+set(CPACK_DEBIAN_FILE_NAME DEB-DEFAULT)
+set(CPACK_DEBIAN_PACKAGE_SOURCE imgfile)
+set(CPACK_DEBIAN_PACKAGE_PRIORITY optional)
+set(CPACK_DEBIAN_PACKAGE_CONTROL_STRICT_PERMISSION ON)
+set(CPACK_DEBIAN_PACKAGE_GENERATE_SHLIBS ON)
+set(CPACK_DEBIAN_PACKAGE_GENERATE_SHLIBS_POLICY ">=")
+
+set(CPACK_DEBIAN_LIBRARY_PACKAGE_NAME libimgfile${PROJECT_VERSION_MAJOR})
+set(CPACK_DEBIAN_LIBRARY_PACKAGE_SECTION libs)
+set(CPACK_DEBIAN_LIBRARY_PACKAGE_SHLIBDEPS ON)
+set(CPACK_DEBIAN_LIBRARY_PACKAGE_CONTROL_EXTRA ${package_files}/symbols ${package_files}/triggers)
+set(CPACK_DEBIAN_LIBRARY_DESCRIPTION
+"windowed and tiled access to VITec and Helava raster images
+Twelve C functions open, create and query images of two raster formats,
+VITec (.img) and Helava (.d), and read and write rectangular windows and
+whole tiles of them. Two-byte samples arrive stretched to one byte.
+
+This package contains the shared library.")
+
+set(CPACK_DEBIAN_DEVELOPMENT_PACKAGE_NAME libimgfile-dev)
+set(CPACK_DEBIAN_DEVELOPMENT_PACKAGE_SECTION libdevel)
+set(CPACK_DEBIAN_DEVELOPMENT_PACKAGE_DEPENDS
+    "${CPACK_DEBIAN_LIBRARY_PACKAGE_NAME} (= ${PROJECT_VERSION})")
+set(CPACK_DEBIAN_DEVELOPMENT_DESCRIPTION
+"windowed and tiled access to VITec and Helava images - development files
+Twelve C functions open, create and query images of two raster formats,
+VITec (.img) and Helava (.d), and read and write rectangular windows and
+whole tiles of them. Two-byte samples arrive stretched to one byte.
+
+This package contains the header, what CMake and pkg-config need to find
+the library, manual pages of the functions, and an example.")
+
+if(TARGET imgfile_tool)
+    list(APPEND CPACK_COMPONENTS_ALL tool)
+    set(CPACK_DEBIAN_TOOL_PACKAGE_NAME imgfile)
+    set(CPACK_DEBIAN_TOOL_PACKAGE_SECTION graphics)
+    set(CPACK_DEBIAN_TOOL_PACKAGE_SHLIBDEPS ON)
+    set(CPACK_DEBIAN_TOOL_DESCRIPTION
+"look at, check and convert VITec and Helava raster images
+One program with sub-commands for archives of two raster formats, VITec
+(.img) and Helava (.d): it tells what files hold, finds what is wrong with
+them, converts them from and to PNG, TIFF, PGM and PPM, makes previews and
+statistics, and compares images sample by sample.")
+endif()
+
+include(CPack)
