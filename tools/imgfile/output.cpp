@@ -126,8 +126,13 @@ void output_file::fail(int error) const
 
 void output_file::reserve(std::int64_t length)
 {
-    if (::fallocate(m_fd, 0, 0, length) == 0 || length == 0) return;
-    if (errno != EOPNOTSUPP) fail(errno);
+    if (length == 0) return;
+    int result;
+    do {
+        result = ::fallocate(m_fd, 0, 0, length);
+    } while (result == -1 && errno == EINTR);
+    if (result == 0) return;
+    if (errno != EOPNOTSUPP && errno != ENOSYS) fail(errno);
     if (::ftruncate(m_fd, length) == -1) fail(errno);
 }
 
