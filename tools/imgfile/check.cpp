@@ -15,7 +15,7 @@ namespace {
 
 class findings {
 public:
-    explicit findings(std::string name) : m_name(std::move(name)) {}
+    explicit findings(std::string name) : m_name(in_one_line(std::move(name))) {}
     void add(const std::string &what)
     {
         std::printf("%s: %s\n", m_name.c_str(), what.c_str());

@@ -69,9 +69,10 @@ public:
 int run_compare(const compare_options &asked)
 {
     const auto a = open_image(asked.a), b = open_image(asked.b);
+    const std::string a_name = in_one_line(asked.a), b_name = in_one_line(asked.b);
     if (a->form.nlines != b->form.nlines || a->form.nsamps != b->form.nsamps ||
         a->form.nbands != b->form.nbands) {
-        std::printf("%s and %s differ in size: %s, and %s\n", asked.a.c_str(), asked.b.c_str(),
+        std::printf("%s and %s differ in size: %s, and %s\n", a_name.c_str(), b_name.c_str(),
                     size_of(a->form).c_str(), size_of(b->form).c_str());
         return 1;
     }
@@ -84,13 +85,13 @@ int run_compare(const compare_options &asked)
         add_differences(place, samples, others, a->form.nsamps, seen);
     });
     if (seen.count == 0) {
-        std::printf("%s and %s are equal: %s samples\n", asked.a.c_str(), asked.b.c_str(),
+        std::printf("%s and %s are equal: %s samples\n", a_name.c_str(), b_name.c_str(),
                     grouped(a->form.nsamples()).c_str());
         return 0;
     }
     std::printf("%s and %s differ: %s of %s samples; first at line %d, sample %d, band %d: %d and "
                 "%d; largest difference %d\n",
-                asked.a.c_str(), asked.b.c_str(), grouped(seen.count).c_str(),
+                a_name.c_str(), b_name.c_str(), grouped(seen.count).c_str(),
                 grouped(a->form.nsamples()).c_str(), seen.line, seen.samp, seen.band, seen.a,
                 seen.b, seen.largest);
     return 1;

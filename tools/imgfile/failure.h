@@ -2,16 +2,25 @@
 #ifndef TOOL_FAILURE_H
 #define TOOL_FAILURE_H
 
+#include <algorithm>
 #include <cstring>
 #include <sstream>
 #include <stdexcept>
 #include <string>
 
+// A name as it can be part of a line.
+inline std::string in_one_line(std::string name)
+{
+    std::ranges::replace_if(
+        name, [](unsigned char c) { return c < ' ' || c == 0x7f; }, '?');
+    return name;
+}
+
 // The work on a file failed. what() is one line, "FILE: what is wrong with it".
 class failure : public std::runtime_error {
 public:
     failure(const std::string &file, const std::string &what)
-        : std::runtime_error(file + ": " + what)
+        : std::runtime_error(in_one_line(file) + ": " + what)
     {
     }
 };

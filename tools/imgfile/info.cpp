@@ -89,7 +89,7 @@ void print_length(const json &facts)
 void print(const json &facts)
 {
     const auto number = [&](const char *key) { return facts[key].get<std::int32_t>(); };
-    std::printf("%s: %s\n", facts["file"].get<std::string>().c_str(),
+    std::printf("%s: %s\n", in_one_line(facts["file"]).c_str(),
                 facts["type"].get<std::string>().c_str());
     print_line("size", text(number("lines"), " lines x ", number("samples"), " samples x ",
                             number("bands"), number("bands") == 1 ? " band" : " bands"));

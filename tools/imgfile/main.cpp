@@ -144,7 +144,8 @@ int tell_usage(const CLI::App &app, const std::string &what)
 {
     std::string command = "imgfile";
     for (const CLI::App *each : app.get_subcommands()) command += " " + each->get_name();
-    std::fprintf(stderr, "imgfile: %s (see %s --help)\n", what.c_str(), command.c_str());
+    std::fprintf(stderr, "imgfile: %s (see %s --help)\n", in_one_line(what).c_str(),
+                 command.c_str());
     return 2;
 }
 

@@ -59,7 +59,7 @@ public:
         }
         refuse_unless(field<std::uint16_t>(m_file, TIFFTAG_SAMPLEFORMAT, SAMPLEFORMAT_UINT) ==
                           SAMPLEFORMAT_UINT,
-                      "samples that are no whole numbers");
+                      "samples that are not unsigned whole numbers");
         const int bits = field<std::uint16_t>(m_file, TIFFTAG_BITSPERSAMPLE, 1);
         refuse_unless(bits == 8 || bits == 16, text("samples of ", bits, " bits"));
         const int photometric =
@@ -223,7 +223,10 @@ public:
             set(TIFFTAG_TILEWIDTH, tiling.nsamps);
             m_piece.resize(static_cast<std::size_t>(TIFFTileSize64(m_file.get())));
         } else {
-            set(TIFFTAG_ROWSPERSTRIP, TIFFDefaultStripSize(m_file.get(), 0));
+            constexpr std::int64_t strip = std::int64_t{256} << 10U;  // bytes, about
+            const std::int64_t line = std::max<std::int64_t>(form.bytes() / form.nlines, 1);
+            set(TIFFTAG_ROWSPERSTRIP,
+                static_cast<std::uint32_t>(std::clamp<std::int64_t>(strip / line, 1, form.nlines)));
         }
         m_line.resize(static_cast<std::size_t>(form.nsamps) * m_pixel);
     }

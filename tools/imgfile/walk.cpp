@@ -106,7 +106,8 @@ void walk(image_reader &from, const window &part, const band_list &bands,
 
 void note(const std::string &file, const std::string &what)
 {
-    if (!quiet) std::fprintf(stderr, "imgfile: %s: note: %s\n", file.c_str(), what.c_str());
+    if (!quiet)
+        std::fprintf(stderr, "imgfile: %s: note: %s\n", in_one_line(file).c_str(), what.c_str());
 }
 
 std::string grouped(std::int64_t number)
