@@ -8,28 +8,38 @@
 namespace {
 
 constexpr std::uint32_t TOP = 255;
-constexpr std::int32_t MAX_SIZE = 4096;  // for more entries a line takes more than 32 bits
+constexpr std::int32_t MAX_SIZE = 4096;  // for more entries a line takes more than 16 bits
 
+// All in 16 bits, of which a register holds the most. The product with the inverse is the quotient,
+// or one more: then the remainder is negative.
 inline std::uint8_t value_at(const img_chain_line &line, std::uint16_t sample)
 {
     const std::uint16_t inside = std::max(std::min(sample, line.last), line.low);
-    const auto above_low = static_cast<std::uint16_t>(inside - line.low);
-    const std::uint32_t value = std::min(above_low, line.rise) * line.multiplier >> line.shift;
-    return static_cast<std::uint8_t>(std::min(value, TOP));
+    const auto above = static_cast<std::uint16_t>(inside - line.low);
+    const auto scaled = static_cast<std::uint16_t>(above * line.scale);
+    const auto product = static_cast<std::uint16_t>(std::uint32_t{scaled} * line.inverse >> 16U);
+    const auto about = static_cast<std::uint16_t>(product >> 7U);
+    const auto remainder =
+        static_cast<std::uint16_t>((above << 8U) - about * line.span - line.late);
+    const auto value = static_cast<std::int16_t>(about - (remainder >> 15U));
+    return static_cast<std::uint8_t>(
+        std::clamp<std::int16_t>(value, 0, static_cast<std::int16_t>(TOP)));
 }
 
-// Returns the line that reaches its end `span` above `low`. Its multiplier, a fraction, is taken
-// `off` too large.
-img_chain_line line_over(std::uint32_t low, std::uint32_t span, std::uint32_t rise,
-                         std::uint32_t off, std::int32_t size)
+// Returns the line that reaches its end `span` above `low`.
+img_chain_line line_over(std::uint32_t low, std::uint32_t span, std::uint32_t late,
+                         std::int32_t size)
 {
-    const std::uint32_t shift = span > 2048 ? 24 : 23;
-    const auto multiplier = static_cast<std::uint32_t>((std::uint64_t{256} << shift) / span);
-    return {.last = static_cast<std::uint16_t>(size - 1),
-            .low = static_cast<std::uint16_t>(low),
-            .rise = static_cast<std::uint16_t>(rise),
-            .multiplier = multiplier + off,
-            .shift = shift};
+    std::uint32_t scale = 1;
+    while (span * scale * 2 <= 65536) scale *= 2;
+    const std::uint32_t end = low + span - (span * scale == 65536 ? 1 : 0);
+    const std::uint32_t inverse = (std::uint32_t{1} << 31U) / (span * scale) + 1;
+    return {.low = static_cast<std::uint16_t>(low),
+            .last = static_cast<std::uint16_t>(std::min(end, static_cast<std::uint32_t>(size) - 1)),
+            .span = static_cast<std::uint16_t>(span),
+            .scale = static_cast<std::uint16_t>(scale),
+            .inverse = static_cast<std::uint16_t>(std::min(inverse, 65535U)),
+            .late = static_cast<std::uint16_t>(late)};
 }
 
 }  // namespace
@@ -58,11 +68,10 @@ bool img_chain_find_line(const std::uint16_t *table, std::int32_t size, img_chai
     const std::uint32_t top = first_of(TOP);
     const std::uint32_t about = top - one + 2 * ((top - one) / (TOP - 1)) + 1;
     for (const std::uint32_t span : {about, about - 1, about + 1}) {
-        const std::uint32_t up_to_one = (span + TOP) / (TOP + 1);
-        if (span == 0 || up_to_one > one) continue;
-        for (const std::uint32_t off : {1U, 0U}) {
-            const std::uint32_t low = one - up_to_one;
-            *line = line_over(low, span, top - low, off, size);
+        for (const std::uint32_t late : {0U, 1U}) {
+            const std::uint32_t up_to_one = (span + TOP + late) / (TOP + 1);
+            if (span == 0 || up_to_one > one) continue;
+            *line = line_over(one - up_to_one, span, late, size);
             if (img_chain_compare_line(*line, table, static_cast<std::uint32_t>(size)) == 0)
                 return true;
         }

@@ -6,13 +6,13 @@
 #include <cstddef>
 #include <cstdint>
 
-// Maps a sample to the bits from `shift` on of (sample - low) * multiplier, from 0 at most to
-// 255. Samples beyond `last` map as it does.
+// Maps a sample to (sample - low) * 256 / span, from 0 at most to 255. Samples beyond `last` map as
+// it does.
 struct img_chain_line {
-    std::uint16_t last, low;
-    std::uint16_t rise;  // (sample - low) above which it stays 255
-    std::uint32_t multiplier;
-    std::uint32_t shift;
+    std::uint16_t low, last, span;
+    std::uint16_t scale;    // the power of two that makes `span` reach beyond 32768
+    std::uint16_t inverse;  // 2^31 / (scale * span), rounded up
+    std::uint16_t late;     // 1: what is a whole number exactly maps to the one before
 };
 
 // Finds the line that equals all of the `size` entries of a table, at most 4096. Returns false when

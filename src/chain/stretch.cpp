@@ -21,11 +21,13 @@ void count_samples(const std::uint8_t *buffer, const img_buffer_def &def, std::u
                    std::size_t size)
 {
     const auto line_length = static_cast<std::size_t>(def.stride) * sizeof(Sample);
-    for (std::int32_t line = 0; line < def.nlines; ++line) {
-        const std::uint8_t *const row = buffer + static_cast<std::size_t>(line) * line_length;
-        for (std::int64_t samp = 0; samp < def.nsamps; samp += 4) {
+    const auto nlines = static_cast<std::size_t>(std::max(def.nlines, 0));  // no counter can
+    const auto nsamps = static_cast<std::size_t>(std::max(def.nsamps, 0));  // change these
+    for (std::size_t line = 0; line < nlines; ++line) {
+        const std::uint8_t *const row = buffer + line * line_length;
+        for (std::size_t samp = 0; samp < nsamps; samp += 4) {
             Sample value;
-            std::memcpy(&value, row + static_cast<std::size_t>(samp) * sizeof value, sizeof value);
+            std::memcpy(&value, row + samp * sizeof value, sizeof value);
             if (value < size) ++histogram[value];
         }
     }

@@ -161,12 +161,12 @@ std::int32_t img_platform_open(const char *filename, std::int32_t oflags, std::i
     const std::size_t place = find_place(FREE_PLACE);
     if (place == open_files.size()) return close_and_fail(fd, EMFILE);
     descriptors[place] = fd;
-    open_files[place] = {.fd = fd,
-                         .position = 0,
-                         .mapping = {},
-                         .look = {.length = S_ISREG(status.st_mode) ? status.st_size : -1,
-                                  .head_length = -1,
-                                  .head = {}}};
+    open_file &file = open_files[place];  // whose head need not be cleared
+    file.fd = fd;
+    file.position = 0;
+    file.mapping = {};
+    file.look.length = S_ISREG(status.st_mode) ? status.st_size : -1;
+    file.look.head_length = -1;
     return fd;
 }
 
