@@ -5,7 +5,7 @@
 #include "native.h"
 #include "walk.h"
 
-#include "std/std.h"
+#include "formats/words.h"
 
 #include <algorithm>
 #include <cstdio>
@@ -77,17 +77,17 @@ void check_vitec_header(const vitec_header &header, findings &found)
     if (nbands < 0 || nbands > 3) found.add(text("nbands is ", nbands, ", not 0 to 3"));
     if (nbytes != 1 && nbytes != 2)
         found.add(text("nbytes_code says ", nbytes, " bytes per sample, not 1 or 2"));
-    found.expect("band_flag", field(IMG_VITEC_AT_BAND_FLAG), nbands < 3 ? 1 : 0);
     check_tile_sizes(tile_nlines, tile_nsamps, found);
 
-    std::int64_t width = nsamps;  // in the 32 bits that the word has, of whole tiles across
-    if (tile_nlines > 0 && tile_nsamps > 0)
-        width = (width + tile_nsamps - 1) / tile_nsamps * tile_nsamps;
-    const auto total = static_cast<std::uint32_t>(nlines) * static_cast<std::uint32_t>(width) *
-                           static_cast<std::uint32_t>(nbands) * static_cast<std::uint32_t>(nbytes) +
-                       static_cast<std::uint32_t>(field(IMG_VITEC_AT_HEADER_LENGTH));
-    found.expect("total_length", static_cast<std::uint32_t>(field(IMG_VITEC_AT_TOTAL_LENGTH)),
-                 total);
+    // What follows from the geometry is as the library would write it.
+    img_vitec_image_block written;
+    if (nbytes < 1 || nbytes > 2 ||
+        img_vitec_build_image_block(&written, nlines, nsamps, tile_nsamps, tile_nlines, nbands,
+                                    static_cast<std::int32_t>(nbytes), IMG_VITEC_RESERVED) == -1)
+        return;
+    for (const auto &[name, at] : {std::pair{"band_flag", IMG_VITEC_AT_BAND_FLAG},
+                                   {"total_length", IMG_VITEC_AT_TOTAL_LENGTH}})
+        found.expect(name, static_cast<std::uint32_t>(field(at)), img_get_word(written.bytes, at));
 }
 
 // What the samples of one band are like.

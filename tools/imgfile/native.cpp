@@ -152,9 +152,10 @@ private:
     std::int64_t m_length;
 };
 
-std::int64_t as_multiple(std::int64_t extent, std::int32_t of)
+std::int64_t padded(std::int32_t extent, std::int32_t tile_extent)
 {
-    return of == 0 ? extent : (extent + of - 1) / of * of;
+    return tile_extent == 0 ? extent
+                            : std::int64_t{img_whole_tiles(extent, tile_extent)} * tile_extent;
 }
 
 void check_tile_side(const std::string &name, std::int32_t side)
@@ -215,7 +216,7 @@ native_image::native_image(const std::string &path, const std::string &shown, st
     : m_name(register_name(path))
 {
     const std::int64_t length =
-        as_multiple(form.nlines, tiles.nlines) * as_multiple(form.nsamps, tiles.nsamps);
+        padded(form.nlines, tiles.nlines) * padded(form.nsamps, tiles.nsamps);
     if (form.nbands * form.nbytes != 0 && length > INT32_MAX / (form.nbands * form.nbytes))
         throw failure(shown, "cannot be created: the file would have 2 GiB or more");
     errno = 0;
