@@ -105,9 +105,9 @@ TEST_F(Lending, GivesWhatTheFileHasNow)
         std::int32_t result;
     };
     for (const auto &[kind, result] : {kind_of_file{{.block_devices = true}, 1},
-                                       {{.remote = true}, 1},
-                                       {{.memory = true, .holes = true}, 1},
-                                       {{.memory = true}, 0},
+                                       {{.file_system = 0x6969}, 1},
+                                       {{.file_system = 0x01021994, .holes = true}, 1},
+                                       {{.file_system = 0x01021994}, 0},
                                        {{.holes = true}, 0}}) {
         host = kind;
         EXPECT_EQ(lend_and_compare(0, 1), result);

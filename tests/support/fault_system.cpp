@@ -80,8 +80,7 @@ int __wrap_fstat(int fd, struct stat *status)
 int __wrap_fstatfs(int fd, struct statfs *status)
 {
     const int result = __real_fstatfs(fd, status);
-    if (host.remote) status->f_type = 0x6969;
-    if (host.memory) status->f_type = 0x01021994;
+    status->f_type = host.file_system;
     return result;
 }
 

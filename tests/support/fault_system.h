@@ -10,16 +10,15 @@ struct fault_host {
     bool interrupts = false;  // every other call, and the others move three bytes at most
     bool has_no_status = false, has_no_time = false, has_no_local_time = false;
     bool block_devices = false;  // all files are said to be such
-    bool remote = false;         // all files are said to be another machine's
-    bool memory = false;         // all files are said to have no disk under them
-    bool holes = false;          // all files are said to have some
-    int reads_left = 0;          // from the last of them on reads fail; 0: none does
-    int disk_size = -1;          // bytes that a file may have; -1: as many as it wants
-    int writes_left = 0;         // the process ends at the last of them; 0: it does not
-    bool half_done = false;      // that one moves half of what it should
-    int last_words = 0;          // what the process returns then
-    int seconds_later = 1;       // than it is: what others wrote a moment ago counts as old
-    long stamp = 0, now = 0;     // of all files, and of the clock, in nanoseconds; 0: as it is
+    int file_system = 0xEF53;  // what all files are said to be on: one with a disk, of this machine
+    bool holes = false;        // all files are said to have some
+    int reads_left = 0;        // from the last of them on reads fail; 0: none does
+    int disk_size = -1;        // bytes that a file may have; -1: as many as it wants
+    int writes_left = 0;       // the process ends at the last of them; 0: it does not
+    bool half_done = false;    // that one moves half of what it should
+    int last_words = 0;        // what the process returns then
+    int seconds_later = 1;     // than it is: what others wrote a moment ago counts as old
+    long stamp = 0, now = 0;   // of all files, and of the clock, in nanoseconds; 0: as it is
 };
 inline fault_host host;
 
