@@ -134,12 +134,16 @@ constexpr std::uint32_t TMPFS = 0x01021994;
 // Returns the kind of a file system whose stamps are of this machine's clock; 0: it may not be one.
 std::uint32_t local_file_system(int fd)
 {
-    constexpr std::array<std::uint32_t, 6> known{0xEF53,      // ext2, ext3, ext4
-                                                 0x58465342,  // XFS
-                                                 0x9123683E,  // Btrfs
-                                                 0xF2F52010,  // F2FS
-                                                 0x794C7630,  // overlay
-                                                 TMPFS};
+    constexpr std::array<std::uint32_t, 10> known{0xEF53,      // ext2, ext3, ext4
+                                                  0x58465342,  // XFS
+                                                  0x9123683E,  // Btrfs
+                                                  0xF2F52010,  // F2FS
+                                                  0xCA451A4E,  // bcachefs
+                                                  0x2FC12FC1,  // ZFS
+                                                  0x794C7630,  // overlay
+                                                  0x73717368,  // squashfs
+                                                  0x9660,      // ISO 9660
+                                                  TMPFS};
     struct statfs system = {};
     ::fstatfs(fd, &system);
     const auto kind = static_cast<std::uint32_t>(system.f_type);
