@@ -88,10 +88,22 @@ std::int32_t memory_seek(std::int32_t fd, std::int32_t offset, std::int32_t when
     return static_cast<std::int32_t>(wanted);
 }
 
+std::int32_t memory_lend(std::int32_t fd, std::int32_t offset, std::int32_t count,
+                         img_io_use_fn use, void *arg)
+{
+    const bytes &file = *descriptors.at(static_cast<std::size_t>(fd)).file;
+    if (offset < 0 || count < 1 || std::int64_t{offset} + count > std::ssize(file)) return -1;
+    const bytes lent(file.begin() + offset, file.begin() + offset + count);  // and not a byte more
+    use(arg, lent.data());
+    return 0;
+}
+
 }  // namespace
 
 void memory_disk_register()
 {
-    img_register_io_method("memory", nullptr, memory_open, memory_close, memory_read, memory_write,
-                           memory_seek, nullptr, nullptr);
+    for (const char *const name : {"memory", "lending"})
+        img_register_io_method(name, nullptr, memory_open, memory_close, memory_read, memory_write,
+                               memory_seek, nullptr, nullptr);
+    img_offer_lending("lending", memory_lend);
 }

@@ -1,4 +1,5 @@
-// The access method "memory": files in the memory of this process, on a disk that can go wrong.
+// The access method "memory": files in the memory of this process, on a disk that can go wrong; and
+// "lending", which lends its bytes, too.
 #ifndef IMG_FUZZ_MEMORY_DISK_H
 #define IMG_FUZZ_MEMORY_DISK_H
 
@@ -26,7 +27,7 @@ struct memory_disk {
 };
 inline memory_disk disk;
 
-// Registers the method; later calls do nothing.
+// Registers both; later calls do nothing.
 void memory_disk_register();
 
 #endif

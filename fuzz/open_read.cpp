@@ -16,7 +16,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size
     random_numbers random(static_cast<std::uint32_t>(size));
     for (const auto &[name, oflags] : {std::pair{real, IMG_OPEN_READ_ONLY},
                                        {"file@memory", IMG_OPEN_READ_ONLY},
-                                       {"file@memory", IMG_OPEN_READ_WRITE}}) {
+                                       {"file@memory", IMG_OPEN_READ_WRITE},
+                                       {"file@lending", IMG_OPEN_READ_WRITE}}) {
         disk.files[name.substr(0, name.find('@'))].assign(data, data + size);
         const open_image image = checked_open(name, oflags, 0);
         if (image.handle == -1) continue;
