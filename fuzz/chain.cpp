@@ -36,14 +36,17 @@ std::int32_t process(void *arg, const std::uint8_t *in_buffer, const img_buffer_
                      std::uint8_t *out_buffer, const img_buffer_def *out_def, std::int32_t pending,
                      const std::uint16_t *lut)
 {
+    const auto width_of = [](const img_buffer_def *def) {  // what a link says is not limited
+        return static_cast<std::size_t>(std::clamp(def->nbytes, 0, 4));
+    };
     for (std::int32_t i = 0; i < in_def->nlines * in_def->nsamps; ++i) {
         const std::int32_t line = i / in_def->nsamps, samp = i % in_def->nsamps;
         std::uint32_t sample = 0;
         std::memcpy(&sample, in_buffer + (line * in_def->stride + samp) * in_def->nbytes,
-                    static_cast<std::size_t>(in_def->nbytes));
+                    width_of(in_def));
         if (pending != 0) sample = img_chain_entry(lut, std::int32_t{1} << in_def->nbits, sample);
         std::memcpy(out_buffer + (line * out_def->stride + samp) * out_def->nbytes, &sample,
-                    static_cast<std::size_t>(out_def->nbytes));
+                    width_of(out_def));
     }
     return choice_of(arg) % 8 == 7 ? 1 : 0;
 }
