@@ -183,6 +183,7 @@ bool check(const std::string &name)
 
 int run_check(const check_options &asked)
 {
+    if (std::ranges::count(asked.files, "-") != 0) throw wrong_usage("check reads files alone");
     int status = 0;
     for (const std::string &name : asked.files) {
         try {

@@ -5,6 +5,7 @@
 
 #include "image.h"
 
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -20,13 +21,15 @@ struct check_options {
 int run_check(const check_options &asked);
 
 struct convert_options {
-    std::string in, out, format, tile = "none", window, bands;
+    std::string in, out, format, tile = "none";
+    std::optional<std::string> window, bands;
     bool stretch = false, overwrite = false;
 };
 int run_convert(const convert_options &asked);
 
 struct preview_options {
-    std::string in, out, bands;
+    std::string in, out;
+    std::optional<std::string> bands;
     std::int32_t size = 1024;
     bool raw = false, overwrite = false;
 };
@@ -53,8 +56,8 @@ int run_create(const create_options &asked);
 // "none", "256" or "128x256", lines first; throws `wrong_usage`.
 tile_size parse_tile(const std::string &text);
 
-// "0,2" as bands that the image has; "" as `otherwise`. Throws `wrong_usage` and `failure`.
-band_list parse_bands(const std::string &text, const image_reader &image,
+// "0,2" as bands that the image has; nothing as `otherwise`. Throws `wrong_usage` and `failure`.
+band_list parse_bands(const std::optional<std::string> &text, const image_reader &image,
                       const band_list &otherwise);
 
 #endif

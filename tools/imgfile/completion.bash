@@ -3,6 +3,12 @@ _imgfile()
 {
     local word=${COMP_WORDS[COMP_CWORD]} previous=${COMP_WORDS[COMP_CWORD - 1]} command='' i
     local commands='info check convert preview stats compare create'
+    # --option=value comes in three words, the last of which may be missing.
+    if [[ $word == = ]]; then
+        word=''
+    elif [[ $previous == = ]]; then
+        previous=${COMP_WORDS[COMP_CWORD - 2]}
+    fi
     for ((i = 1; i < COMP_CWORD; ++i)); do
         case " $commands " in
         *" ${COMP_WORDS[i]} "*)

@@ -27,16 +27,17 @@ std::vector<std::int32_t> parse_numbers(const std::string &option, const std::st
     }
 }
 
-window parse_window(const std::string &from, const std::string &name, const shape &form)
+window parse_window(const std::optional<std::string> &from, const std::string &name,
+                    const shape &form)
 {
-    if (from.empty()) return whole(form);
-    const auto numbers = parse_numbers("--window", from, ',');
+    if (!from) return whole(form);
+    const auto numbers = parse_numbers("--window", *from, ',');
     if (numbers.size() != 4) throw wrong_usage("--window takes LINE,SAMP,NLINES,NSAMPS");
     const window part{numbers[0], numbers[1], numbers[2], numbers[3]};
     if (part.nlines < 1 || part.nsamps < 1) throw wrong_usage("--window is empty");
     if (std::int64_t{part.line} + part.nlines > form.nlines ||
         std::int64_t{part.samp} + part.nsamps > form.nsamps)
-        throw failure(name, text("has no window ", from, ": it has ", form.nlines, " lines x ",
+        throw failure(name, text("has no window ", *from, ": it has ", form.nlines, " lines x ",
                                  form.nsamps, " samples"));
     return part;
 }
@@ -52,11 +53,11 @@ tile_size parse_tile(const std::string &from)
     return {sides.front(), sides.back()};
 }
 
-band_list parse_bands(const std::string &from, const image_reader &image,
+band_list parse_bands(const std::optional<std::string> &from, const image_reader &image,
                       const band_list &otherwise)
 {
-    if (from.empty()) return otherwise;
-    const band_list bands = parse_numbers("--band", from, ',');
+    if (!from) return otherwise;
+    const band_list bands = parse_numbers("--band", *from, ',');
     for (const std::int32_t band : bands)
         if (band >= image.form.nbands)
             throw failure(image.name, text("has no band ", band, ": it has ", image.form.nbands,
@@ -66,7 +67,7 @@ band_list parse_bands(const std::string &from, const image_reader &image,
 
 int run_convert(const convert_options &asked)
 {
-    const file_format format = format_of_output(asked.out, asked.format);
+    const file_format format = format_of_output(asked.out, asked.format, "--format");
     const tile_size tiles = parse_tile(asked.tile);
     const auto in = open_image(asked.in);
     const window part = parse_window(asked.window, in->name, in->form);

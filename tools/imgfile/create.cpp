@@ -53,7 +53,7 @@ void write_pattern(image_writer &writer, const shape &form)
 
 int run_create(const create_options &asked)
 {
-    const file_format format = format_of_output(asked.out, asked.type);
+    const file_format format = format_of_output(asked.out, asked.type, "--type");
     if (format != file_format::vitec && format != file_format::helava)
         throw wrong_usage(text(asked.out,
                                ": only VITec and Helava files are created; \"imgfile "

@@ -6,8 +6,7 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
-#include <cstdio>
-#include <cstring>
+#include <cstdlib>
 #include <filesystem>
 
 #include <fcntl.h>
@@ -36,23 +35,36 @@ std::string in_lower_case(std::string text)
     return text;
 }
 
+// A file without a name, for what may be large.
+int open_temporary()
+{
+    const char *const chosen = std::getenv("TMPDIR");
+    std::string path = std::string(chosen != nullptr ? chosen : "/var/tmp") + "/imgfile_XXXXXX";
+    const int fd = ::mkostemp(path.data(), O_CLOEXEC);
+    if (fd == -1) throw failure(path, system_text(errno));
+    ::unlink(path.c_str());
+    return fd;
+}
+
 // Standard input as a file that can be read twice.
 int spool_standard_input()
 {
-    std::FILE *const spool = std::tmpfile();
-    if (spool == nullptr)
-        throw failure("standard input", "no temporary file: " + system_text(errno));
-    const int fd = ::fcntl(::fileno(spool), F_DUPFD_CLOEXEC, 3);
-    std::fclose(spool);
+    const int fd = open_temporary();
+    const auto fail = [fd](const char *what) {
+        const int error = errno;
+        ::close(fd);
+        throw failure("standard input", what + system_text(error));
+    };
     std::array<char, 65536> bytes;
     for (;;) {
         const ssize_t got = ::read(STDIN_FILENO, bytes.data(), bytes.size());
         if (got == 0) return fd;
-        if (got == -1 && errno == EINTR) continue;
-        if (got == -1 || ::write(fd, bytes.data(), static_cast<std::size_t>(got)) != got) {
-            const int error = errno;
-            ::close(fd);
-            throw failure("standard input", "cannot be read: " + system_text(error));
+        if (got == -1 && errno != EINTR) fail("cannot be read: ");
+        for (ssize_t done = 0; done < got;) {
+            const ssize_t written =
+                ::write(fd, bytes.data() + done, static_cast<std::size_t>(got - done));
+            if (written == -1 && errno != EINTR) fail("cannot be copied to a temporary file: ");
+            done += std::max<ssize_t>(written, 0);
         }
     }
 }
@@ -111,18 +123,19 @@ void check_png_name(const std::string &name)
         throw wrong_usage(name + ": the picture will be a PNG file; let its name end in .png");
 }
 
-file_format format_of_output(const std::string &name, const std::string &wanted)
+file_format format_of_output(const std::string &name, const std::string &wanted,
+                             const std::string &option)
 {
     if (name == "-" && wanted.empty()) return file_format::pnm;
-    const std::string end =
-        wanted.empty() ? in_lower_case(std::filesystem::path(name).extension()) : "." + wanted;
+    const std::string end = in_lower_case(
+        wanted.empty() ? std::filesystem::path(name).extension().string() : "." + wanted);
     if (end == ".vitec") return file_format::vitec;
     if (end == ".helava") return file_format::helava;
     const auto *const found =
         std::ranges::find_if(endings, [&end](const ending &each) { return end == each.text; });
     if (found == endings.end())
         throw wrong_usage(text(name, ": ", end.empty() ? "a name without an ending" : end,
-                               " tells no format that can be written; say --format"));
+                               " tells no format that can be written; say ", option));
     if (name == "-" && !is_pnm(found->format))
         throw wrong_usage("only PGM and PPM can go to standard output");
     return found->format;
@@ -148,7 +161,7 @@ std::unique_ptr<image_reader> open_image(const std::string &name)
             return open_tiff(shown, fd);
     }
     ::close(fd);
-    if (name == "-") throw failure(shown, "is no PGM or PPM picture");
+    if (name == "-") throw failure(shown, "is no PGM, PPM, PNG or TIFF picture");
     return open_native(name);
 }
 

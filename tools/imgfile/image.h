@@ -127,7 +127,9 @@ std::unique_ptr<image_writer> create_image(output_file &out, file_format format,
                                            tile_size tiles);
 
 // Returns the format that a name ends in, or that is called `wanted` ("" : not said).
-file_format format_of_output(const std::string &name, const std::string &wanted);
+// `option` is what could say it.
+file_format format_of_output(const std::string &name, const std::string &wanted,
+                             const std::string &option);
 
 // Refuses names that do not end in ".png".
 void check_png_name(const std::string &name);

@@ -57,7 +57,9 @@ json describe(const std::string &name)
                {"created", nullptr}};
     if (image->tiles.nlines != 0)
         facts["tile_size"] = {{"lines", image->tiles.nlines}, {"samples", image->tiles.nsamps}};
-    if (name != "-") facts["file_length"] = std::filesystem::file_size(name);
+    std::error_code unknown;
+    const auto length = std::filesystem::file_size(name, unknown);
+    if (!unknown) facts["file_length"] = length;
     if (image->format == file_format::vitec || image->format == file_format::helava)
         describe_native(name, facts);
     return facts;

@@ -51,7 +51,7 @@ void add_output(CLI::App *command, std::string &name, bool &overwrite, const cha
 CLI::App *add_info(CLI::App &app, info_options &asked)
 {
     CLI::App *const command = app.add_subcommand("info", "Tell what image files are");
-    add_operand(command, "FILE", asked.files, "Images of any format");
+    add_operand(command, "FILE", asked.files, "Images of any format; - is standard input");
     command->add_flag("--json", asked.json, "Print an array with one object for each file");
     return command;
 }
@@ -114,7 +114,7 @@ CLI::App *add_stats(CLI::App &app, stats_options &asked)
 CLI::App *add_compare(CLI::App &app, compare_options &asked)
 {
     CLI::App *const command = app.add_subcommand("compare", "Compare two images sample by sample");
-    add_operand(command, "A", asked.a, "An image");
+    add_operand(command, "A", asked.a, "An image; - is standard input");
     add_operand(command, "B", asked.b, "Another image, of any format");
     return command;
 }
@@ -123,7 +123,7 @@ CLI::App *add_create(CLI::App &app, create_options &asked)
 {
     CLI::App *const command = app.add_subcommand("create", "Create an image, all samples 0");
     add_output(command, asked.out, asked.overwrite, "What to write; its ending tells the type");
-    const auto not_negative = CLI::NonNegativeNumber.description("");
+    const auto not_negative = CLI::Range(0, INT32_MAX).description("");
     add_option(command, "--lines", asked.nlines, "N", "Lines")->required()->check(not_negative);
     add_option(command, "--samples", asked.nsamps, "N", "Samples per line")
         ->required()
@@ -186,12 +186,14 @@ int run(int argc, char **argv)
         app.exit(wanted);
         return 0;
     } catch (const CLI::ParseError &error) {
-        const std::string first = argc > 1 ? argv[1] : "-";
+        const auto *const first =
+            std::find_if(argv + 1, argv + argc, [](const char *word) { return *word != '-'; });
         const bool is_known =
-            first.starts_with("-") || std::ranges::any_of(commands, [&](const auto &each) {
-                return each.first->get_name() == first;
+            first == argv + argc || std::ranges::any_of(commands, [&](const auto &each) {
+                return each.first->get_name() == *first;
             });
-        const std::string what = is_known ? error.what() : "there is no command " + first;
+        const std::string what =
+            is_known ? error.what() : std::string("there is no command ") + *first;
         return tell_usage(app, what.substr(0, what.find('\n')));
     }
     try {

@@ -15,6 +15,7 @@
 #include <cerrno>
 #include <charconv>
 #include <map>
+#include <ranges>
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -95,7 +96,7 @@ public:
         for (std::size_t i = 0; i < bands.size(); ++i) {
             const auto at = static_cast<std::int32_t>(i);
             if (part.nlines > 0 && part.nsamps > 0 && !read_band(part, bands[i], to.row(at, 0)))
-                fail_at_first_missing_line(part, bands[i], to.row(at, 0));
+                fail(part, bands[i]);
         }
     }
 
@@ -108,19 +109,37 @@ private:
                                       to, part.nsamps) == 0;
     }
 
-    [[noreturn]] void fail_at_first_missing_line(const window &part, std::int32_t band,
-                                                 std::uint8_t *buffer)
+    bool has_line(std::int32_t line, std::int32_t band)
     {
-        window line{part.line, part.samp, 1, part.nsamps};
-        while (line.line < part.line + part.nlines - 1 && read_band(line, band, buffer))
-            ++line.line;
-        const std::string where = text("line ", line.line, " of band ", band);
+        m_line.resize(static_cast<std::size_t>(form.nsamps) *
+                      static_cast<std::size_t>(form.nbytes));
+        return read_band({line, 0, 1, form.nsamps}, band, m_line.data());
+    }
+
+    // Names the first line of the file that cannot be read, whatever part was asked for: tiled
+    // files hold their bands side by side, others one after the other.
+    [[noreturn]] void fail(const window &part, std::int32_t failed_band)
+    {
         const std::string reason = library_message::reason("");
+        std::int32_t line = part.line, band = failed_band;
+        bool found = false;
+        for (std::int32_t each = 0; each < form.nbands && (!found || tiles.nlines != 0); ++each) {
+            if (has_line(form.nlines - 1, each)) continue;
+            const auto lines = std::views::iota(0, form.nlines);
+            const std::int32_t first = *std::ranges::partition_point(
+                lines, [&](std::int32_t at) { return has_line(at, each); });
+            if (found && first >= line) continue;
+            line = first;
+            band = each;
+            found = true;
+        }
+        const std::string where = text("line ", line, " of band ", band);
         throw failure(name, reason.empty() ? "cut short: " + where + " is missing"
                                            : where + " cannot be read: " + reason);
     }
 
     native_image m_image;
+    std::vector<std::uint8_t> m_line;
 };
 
 class native_writer : public image_writer {
