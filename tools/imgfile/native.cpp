@@ -11,11 +11,9 @@
 #include "io/platform.h"
 #include "std/std.h"
 
-#include <algorithm>
 #include <cerrno>
 #include <charconv>
 #include <map>
-#include <ranges>
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -116,6 +114,20 @@ private:
         return read_band({line, 0, 1, form.nsamps}, band, m_line.data());
     }
 
+    // Of a band whose last line is missing, by halving what is left.
+    std::int32_t first_missing_line(std::int32_t band)
+    {
+        std::int32_t from = 0, past = form.nlines - 1;
+        while (from < past) {
+            const std::int32_t middle = from + (past - from) / 2;
+            if (has_line(middle, band))
+                from = middle + 1;
+            else
+                past = middle;
+        }
+        return past;
+    }
+
     // Names the first line of the file that cannot be read, whatever part was asked for: tiled
     // files hold their bands side by side, others one after the other.
     [[noreturn]] void fail(const window &part, std::int32_t failed_band)
@@ -125,9 +137,7 @@ private:
         bool found = false;
         for (std::int32_t each = 0; each < form.nbands && (!found || tiles.nlines != 0); ++each) {
             if (has_line(form.nlines - 1, each)) continue;
-            const auto lines = std::views::iota(0, form.nlines);
-            const std::int32_t first = *std::ranges::partition_point(
-                lines, [&](std::int32_t at) { return has_line(at, each); });
+            const std::int32_t first = first_missing_line(each);
             if (found && first >= line) continue;
             line = first;
             band = each;
