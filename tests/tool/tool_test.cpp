@@ -219,6 +219,12 @@ TEST_F(Tool, CutsWindowsAndPassesPicturesThrough)
         run("convert - - --format ppm", [] { ::dup2(::open("a.ppm", O_RDONLY), STDIN_FILENO); });
     EXPECT_EQ(piped.out, content_of("a.ppm"));
     EXPECT_EQ(piped.err, "");
+    // Standard input is read as often as it takes, by more than one reader at once.
+    const auto from_picture = [] { ::dup2(::open("a.png", O_RDONLY), STDIN_FILENO); };
+    EXPECT_EQ(run("compare - -", from_picture).status, 0);
+    EXPECT_EQ(run("convert - b.ppm --stretch", from_picture).status, 0);
+    expect_done("convert a.ppm c.ppm --stretch");
+    EXPECT_EQ(content_of("b.ppm"), content_of("c.ppm"));
 }
 
 // What the tool stretches is what a host of the library sees.
@@ -473,9 +479,11 @@ TEST_F(Tool, FindsWhatIsWrongWithFiles)
     run("convert b.pgm b.img");
     EXPECT_NE(run("check b.img").out.find("samples beyond 12 bits\n"), std::string::npos);
     expect_done("check b.pgm");
-    const finished none = run("check missing b.pgm");
+    fs::create_symlink("loop", "loop");
+    const finished none = run("check missing loop b.pgm");
     EXPECT_EQ(none.status, 1);
-    EXPECT_EQ(none.err, "imgfile: missing: No such file or directory\n");
+    EXPECT_EQ(none.err, "imgfile: missing: No such file or directory\n"
+                        "imgfile: loop: Too many levels of symbolic links\n");
 }
 
 TEST_F(Tool, ComparesAndMeasuresSamples)
@@ -520,6 +528,9 @@ TEST_F(Tool, ComparesAndMeasuresSamples)
         EXPECT_EQ(seen["beyond_stated_bits"], 0);
     }
     EXPECT_NE(run("info h.png").out.find("540 lines x 960 samples x 3 bands"), std::string::npos);
+    fs::copy("b.ppm", "\xff.ppm");
+    expect_done("stats \xff.ppm --histogram i.png --quiet");
+    EXPECT_GT(fs::file_size("i.png"), fs::file_size("h.png") / 2);  // not empty
 
     expect_done("preview a.img p.png --size 16 --raw");
     const auto reduced = nlohmann::json::parse(run("info p.png --json").out);
@@ -535,10 +546,15 @@ TEST_F(Tool, ComparesAndMeasuresSamples)
 #ifndef IMGFILE_SANITIZED  // which takes memory of its own
 TEST_F(Tool, TakesLittleMemoryForLargeImages)
 {
+    expect_done("create line.img --lines 1 --samples 200000000");
+    const char header[] = "\x89PNG\r\n\x1a\n\0\0\0\rIHDR\x7f\xff\xff\xff\0\0\0\1\x10\2\0\0\0\x7f"
+                          "\xc4\x78\xc9\0\0\0\0IDAT";
+    write_content("line.png", std::string(header, sizeof header - 1));
     expect_done("create a.img --lines 10000 --samples 15000");
     for (const char *const arguments :
          {"convert a.img b.img --tile 256", "convert b.img c.tif --tile 512", "convert a.img -",
-          "stats b.img", "preview b.img p.png", "check a.img", "compare a.img b.img"}) {
+          "stats b.img", "preview b.img p.png", "check a.img", "compare a.img b.img",
+          "preview line.img l.png", "convert line.img l.pgm", "check line.png", "check line.img"}) {
         const finished end =
             run(arguments, [] { ::dup2(::open("/dev/null", O_WRONLY), STDOUT_FILENO); });
         EXPECT_LT(end.kilobytes, 64 * 1024) << arguments;

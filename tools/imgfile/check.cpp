@@ -106,7 +106,7 @@ void check_samples(image_reader &image, findings &found)
     std::vector<band_state> bands;
     try {
         bands.resize(image.all_bands().size());
-        walk(image, whole(form), image.all_bands(), nullptr,
+        walk(image, whole(form), image.all_bands(), {},
              [&](const window &place, const block &samples) {
                  samples.for_each_row([&](std::int32_t band, std::int32_t line, const auto *row) {
                      band_state &state = bands[static_cast<std::size_t>(band)];
@@ -139,7 +139,9 @@ void check_samples(image_reader &image, findings &found)
 void check_length(const std::string &name, findings &found)
 {
     const native_image image(name);
-    const auto length = static_cast<std::int64_t>(std::filesystem::file_size(name));
+    std::error_code error;
+    const auto length = static_cast<std::int64_t>(std::filesystem::file_size(name, error));
+    if (error) throw failure(name, error.message());
     const std::int64_t wanted = image.whole_length();
     if (length < wanted)
         found.add(text("cut short: ", grouped(wanted - length), " of ", grouped(wanted),
@@ -167,7 +169,8 @@ bool check(const std::string &name)
     try {
         image = open_image(name);
     } catch (const failure &failed) {
-        if (!std::filesystem::is_regular_file(name)) throw;
+        std::error_code unknown;
+        if (!std::filesystem::is_regular_file(name, unknown)) throw;
         check_header(name, found);
         found.add(std::string(failed.what()).substr(name.size() + 2));
         return false;

@@ -52,18 +52,6 @@ std::string size_of(const shape &form)
                 form.nbands == 1 ? " band" : " bands");
 }
 
-// Carries the other reader's wishes into a walk, as if it was written to.
-class partner : public image_writer {
-public:
-    explicit partner(const image_reader &of)
-    {
-        tiles = of.tiles;
-        in_order = of.in_order;
-    }
-    void write(const window & /*at*/, const block & /*from*/) override {}
-    std::int64_t finish() override { return -1; }
-};
-
 }  // namespace
 
 int run_compare(const compare_options &asked)
@@ -77,9 +65,8 @@ int run_compare(const compare_options &asked)
         return 1;
     }
     differences seen;
-    const partner other(*b);
     const band_list bands = a->all_bands();
-    walk(*a, whole(a->form), bands, &other, [&](const window &place, const block &samples) {
+    walk(*a, whole(a->form), bands, *b, [&](const window &place, const block &samples) {
         block others(place.nlines, place.nsamps, samples.nbands, b->form.nbytes);
         b->read(place, bands, others);
         add_differences(place, samples, others, a->form.nsamps, seen);

@@ -89,7 +89,7 @@ int run_convert(const convert_options &asked)
                                    ? std::min(in->form.nbits, 12)
                                    : in->form.nbits;
     std::int64_t beyond = 0;
-    walk(*in, part, bands, writer.get(), [&](const window &place, const block &samples) {
+    walk(*in, part, bands, *writer, [&](const window &place, const block &samples) {
         if (in->form.nbytes == 2 && nbits < 16) beyond += count_beyond(samples, (1 << nbits) - 1);
         writer->write(place, asked.stretch ? stretched(samples, stretches) : samples);
     });

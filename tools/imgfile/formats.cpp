@@ -73,7 +73,10 @@ int open_to_read(const std::string &name)
 {
     if (name == "-") {
         static const int spool = spool_standard_input();
-        return ::fcntl(spool, F_DUPFD_CLOEXEC, 3);
+        // Opened anew, each reader has a position of its own.
+        const int fd = ::open(text("/proc/self/fd/", spool).c_str(), O_RDONLY | O_CLOEXEC);
+        if (fd == -1) throw failure("standard input", "cannot be read: " + system_text(errno));
+        return fd;
     }
     const int fd = ::open(name.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK);
     if (fd == -1) throw failure(name, system_text(errno));
@@ -141,7 +144,9 @@ file_format format_of_output(const std::string &name, const std::string &wanted,
     return found->format;
 }
 
-std::unique_ptr<image_reader> open_image(const std::string &name)
+namespace {
+
+std::unique_ptr<image_reader> open_by_first_bytes(const std::string &name)
 {
     const int fd = open_to_read(name);
     const std::string shown = name == "-" ? "standard input" : name;
@@ -163,6 +168,17 @@ std::unique_ptr<image_reader> open_image(const std::string &name)
     ::close(fd);
     if (name == "-") throw failure(shown, "is no PGM, PPM, PNG or TIFF picture");
     return open_native(name);
+}
+
+}  // namespace
+
+std::unique_ptr<image_reader> open_image(const std::string &name)
+{
+    auto image = open_by_first_bytes(name);
+    const shape &form = image->form;
+    if (1.0 * form.nlines * form.nsamps * form.nbands * form.nbytes > 1e18)
+        throw failure(image->name, "says that it has more samples than any file can hold");
+    return image;
 }
 
 std::unique_ptr<image_writer> create_image(output_file &out, file_format format, const shape &form,

@@ -58,7 +58,7 @@ std::vector<band_histogram> measure_histograms(image_reader &image)
         all.push_back({band, image.form.nbits,
                        std::vector<std::uint64_t>(image.form.nbytes == 1 ? 256 : 65536),
                        stretch(image.form.nbits)});
-    walk(image, whole(image.form), image.all_bands(), nullptr,
+    walk(image, whole(image.form), image.all_bands(), {},
          [&](const window &place, const block &samples) {
              samples.for_each_row([&](std::int32_t band, std::int32_t, const auto *row) {
                  auto &counts = all[static_cast<std::size_t>(band)].counts;

@@ -123,6 +123,8 @@ public:
 
     std::string as_png() const
     {
+        if (const cairo_status_t status = cairo_status(m_cairo); status != CAIRO_STATUS_SUCCESS)
+            throw std::runtime_error(cairo_status_to_string(status));
         std::string bytes;
         const auto append = [](void *to, const unsigned char *data, unsigned count) {
             static_cast<std::string *>(to)->append(reinterpret_cast<const char *>(data), count);
@@ -167,6 +169,17 @@ private:
     double m_low, m_high, m_top;
 };
 
+// Bytes that are not UTF-8 cannot be drawn.
+std::string drawable(std::string name)
+{
+    int characters, widest;
+    if (FcUtf8Len(reinterpret_cast<const FcChar8 *>(name.data()), static_cast<int>(name.size()),
+                  &characters, &widest) == FcFalse)
+        std::ranges::replace_if(
+            name, [](unsigned char c) { return c >= 0x80; }, '?');
+    return in_one_line(name);
+}
+
 double rounded(double number)  // to tenths
 {
     return std::round(number * 10) / 10;
@@ -195,7 +208,7 @@ std::string draw_histograms(const std::vector<band_histogram> &of, const std::st
                          " to ", each.highest(), ", mean ", rounded(each.mean()), ", ",
                          rounded(100 * zeros), " % zero");
     }
-    picture.axes(title, subtitle);
+    picture.axes(drawable(title), subtitle);
     for (std::size_t i = 0; i < of.size(); ++i) {
         const color own = colors.at(i % colors.size());
         const bool is_alone = of.size() == 1;

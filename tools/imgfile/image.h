@@ -77,8 +77,15 @@ private:
 
 using band_list = std::vector<std::int32_t>;
 
+// In what pieces samples come and go.
+struct access_needs {
+    tile_size tiles{};         // in whole ones of these it goes best
+    bool whole_tiles = false;  // true: only in windows that begin and end at their edges
+    bool in_order = false;     // true: only in whole lines, each window below the one before
+};
+
 // An image file that is open for reading. All functions here throw `failure`.
-class image_reader {
+class image_reader : public access_needs {
 public:
     image_reader(std::string file_name, file_format file_kind)
         : name(std::move(file_name)), format(file_kind)
@@ -97,12 +104,10 @@ public:
     const std::string name;
     file_format format;
     shape form{};
-    tile_size tiles{};      // in which it is read at its best
-    bool in_order = false;  // true: in whole lines, each window below the one before
 };
 
 // An image file that is being made.
-class image_writer {
+class image_writer : public access_needs {
 public:
     image_writer() = default;
     virtual ~image_writer() = default;
@@ -112,10 +117,6 @@ public:
     virtual void write(const window &at, const block &from) = 0;
     // Completes the file. Returns the length that it must have, -1 where that is not known.
     virtual std::int64_t finish() = 0;
-
-    tile_size tiles{};
-    bool whole_tiles = false;  // true: in windows that begin and end at tile edges
-    bool in_order = false;
 };
 
 // Opens an image of any format, which its first bytes tell; "-" is standard input. `fresh` readers

@@ -63,6 +63,7 @@ public:
     void read(const window &part, const band_list &bands, block &to) override
     {
         const auto pixel = static_cast<std::size_t>(form.nbands * form.nbytes);
+        m_pixels.resize(static_cast<std::size_t>(form.nsamps) * pixel);
         for (std::int32_t line = m_next; line < part.line + part.nlines; ++line) {
             if (!guarded(m_failed, [this] { png_read_row(m_png, m_pixels.data(), nullptr); }))
                 throw failure(name, text("line ", line, " is missing or damaged: ", m_failed.what));
@@ -98,11 +99,7 @@ private:
                 .nbands = colors == PNG_COLOR_TYPE_RGB ? 3 : 1,
                 .nbytes = depth / 8,
                 .nbits = depth};
-        guarded(m_failed, [this] {
-            if (BIG_ENDIAN_IS_FOREIGN && form.nbytes == 2) png_set_swap(m_png);
-            png_start_read_image(m_png);
-        });
-        m_pixels.resize(png_get_rowbytes(m_png, m_info));
+        if (BIG_ENDIAN_IS_FOREIGN && form.nbytes == 2) png_set_swap(m_png);
     }
     void close()
     {
@@ -150,13 +147,12 @@ public:
             png_write_info(m_png, m_info);
             if (BIG_ENDIAN_IS_FOREIGN && form.nbytes == 2) png_set_swap(m_png);
         }));
-        m_pixels.resize(static_cast<std::size_t>(form.nsamps) *
-                        static_cast<std::size_t>(form.nbands * form.nbytes));
     }
     ~png_writer() override { png_destroy_write_struct(&m_png, &m_info); }
 
     void write(const window & /*at*/, const block &from) override
     {
+        m_pixels.resize(from.bytes.size() / static_cast<std::size_t>(from.nlines));
         for (std::int32_t line = 0; line < from.nlines; ++line) {
             gather_pixels(from, {line, 0, from.nsamps, 0}, m_pixels.data());
             check(guarded(m_failed, [this] { png_write_row(m_png, m_pixels.data()); }));

@@ -4,6 +4,7 @@
 #include "output.h"
 #include "samples.h"
 
+#include <algorithm>
 #include <bit>
 #include <cerrno>
 #include <climits>
@@ -89,23 +90,36 @@ public:
 
     void read(const window &part, const band_list &bands, block &to) override
     {
+        constexpr std::int64_t at_once = std::int64_t{1} << 20U;  // bytes of lines that are whole
         const std::int64_t pixel = std::int64_t{form.nbands} * form.nbytes;
-        m_pixels.resize(static_cast<std::size_t>(part.nsamps * pixel));
-        for (std::int32_t i = 0; i < part.nlines; ++i) {
-            const std::int64_t line = part.line + i;
-            const ssize_t got = read_at(m_first + line * m_line_length + part.samp * pixel,
-                                        m_pixels.data(), m_pixels.size());
-            if (got == -1)
-                throw failure(name, text("line ", line, " cannot be read: ", system_text(errno)));
-            if (static_cast<std::size_t>(got) != m_pixels.size())
-                throw failure(name, text("cut short: line ", line, " is missing"));
-            if (BIG_ENDIAN_IS_FOREIGN && form.nbytes == 2)
-                exchange_bytes(m_pixels.data(), m_pixels.size() / 2);
-            spread_pixels(m_pixels.data(), form.nbands, bands, {i, 0, part.nsamps, 0}, to);
+        const auto step = static_cast<std::int32_t>(
+            part.nsamps == form.nsamps
+                ? std::clamp<std::int64_t>(at_once / m_line_length, 1, part.nlines)
+                : 1);
+        const std::int64_t length = part.nsamps * pixel;
+        for (std::int32_t first = 0; first < part.nlines; first += step) {
+            const std::int32_t count = std::min(step, part.nlines - first);
+            m_pixels.resize(static_cast<std::size_t>(count * length));
+            read_pixels(std::int64_t{part.line} + first, part.samp * pixel, length);
+            for (std::int32_t i = 0; i < count; ++i)
+                spread_pixels(&m_pixels[static_cast<std::size_t>(i * length)], form.nbands, bands,
+                              {first + i, 0, part.nsamps, 0}, to);
         }
     }
 
 private:
+    // Fills m_pixels with pieces of lines, `length` bytes each; with more than one: of whole lines.
+    void read_pixels(std::int64_t line, std::int64_t first_byte, std::int64_t length)
+    {
+        const ssize_t got =
+            read_at(m_first + line * m_line_length + first_byte, m_pixels.data(), m_pixels.size());
+        if (got == -1)
+            throw failure(name, text("line ", line, " cannot be read: ", system_text(errno)));
+        if (static_cast<std::size_t>(got) != m_pixels.size())
+            throw failure(name, text("cut short: line ", line + got / length, " is missing"));
+        if (BIG_ENDIAN_IS_FOREIGN && form.nbytes == 2)
+            exchange_bytes(m_pixels.data(), m_pixels.size() / 2);
+    }
     // Returns the bytes that came; fewer than asked: the file ends.
     ssize_t read_at(std::int64_t offset, void *to, std::size_t count) const
     {

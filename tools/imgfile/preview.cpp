@@ -5,61 +5,67 @@
 #include "stretch.h"
 #include "walk.h"
 
+#include "std/std.h"
+
 #include <algorithm>
+#include <map>
 
 namespace {
 
-// The means of squares of `factor` x `factor` samples, of lines that come from the top on.
+// The means of squares of `factor` x `factor` samples, which come from the top on, from left to
+// right.
 class reduction {
 public:
     reduction(const shape &of, std::int32_t nbands, std::int32_t factor)
         : m_of(of), m_factor(factor),
-          m_means((of.nlines + factor - 1) / factor, (of.nsamps + factor - 1) / factor, nbands, 2),
-          m_sums(static_cast<std::size_t>(nbands) * static_cast<std::size_t>(m_means.nsamps))
+          m_means(img_whole_tiles(of.nlines, factor), img_whole_tiles(of.nsamps, factor), nbands, 2)
     {
     }
     shape form() const { return {m_means.nlines, m_means.nsamps, m_means.nbands, 1, 8}; }
     const block &means() const { return m_means; }
 
-    // Takes whole lines.
     void add(const window &place, const block &samples)
     {
+        const bool ends_lines = place.samp + samples.nsamps == m_of.nsamps;
         for (std::int32_t line = 0; line < samples.nlines; ++line) {
+            const std::int32_t at = place.line + line;
+            line_sums &sums = m_sums[at / m_factor];
+            sums.resize(static_cast<std::size_t>(m_means.nbands) * width());
             for (std::int32_t band = 0; band < samples.nbands; ++band)
                 samples.use_row(band, line, [&](const auto *row) {
-                    std::uint64_t *const sums = sums_of(band);
-                    for (std::int32_t samp = 0; samp < m_of.nsamps; ++samp)
-                        sums[samp / m_factor] += row[samp];
+                    std::uint64_t *const own = &sums[static_cast<std::size_t>(band) * width()];
+                    for (std::int32_t i = 0; i < samples.nsamps; ++i)
+                        own[(place.samp + i) / m_factor] += row[i];
                 });
-            const std::int32_t at = place.line + line;
-            if ((at + 1) % m_factor == 0 || at + 1 == m_of.nlines)
-                finish_line(at / m_factor, at % m_factor + 1);
+            if (ends_lines && ((at + 1) % m_factor == 0 || at + 1 == m_of.nlines)) {
+                finish_line(at / m_factor, at % m_factor + 1, sums);
+                m_sums.erase(at / m_factor);
+            }
         }
     }
 
 private:
-    std::uint64_t *sums_of(std::int32_t band)
-    {
-        return &m_sums[static_cast<std::size_t>(band) * static_cast<std::size_t>(m_means.nsamps)];
-    }
-    void finish_line(std::int32_t line, std::int32_t height)
+    using line_sums = std::vector<std::uint64_t>;
+
+    std::size_t width() const { return static_cast<std::size_t>(m_means.nsamps); }
+    void finish_line(std::int32_t line, std::int32_t nlines, const line_sums &sums)
     {
         for (std::int32_t band = 0; band < m_means.nbands; ++band) {
             auto *const row = reinterpret_cast<std::uint16_t *>(m_means.row(band, line));
             for (std::int32_t samp = 0; samp < m_means.nsamps; ++samp) {
-                const std::int32_t width = std::min(m_factor, m_of.nsamps - samp * m_factor);
+                const std::int32_t nsamps = std::min(m_factor, m_of.nsamps - samp * m_factor);
                 row[samp] = static_cast<std::uint16_t>(
-                    sums_of(band)[samp] /
-                    (static_cast<std::uint64_t>(width) * static_cast<std::uint64_t>(height)));
+                    sums[static_cast<std::size_t>(band) * width() +
+                         static_cast<std::size_t>(samp)] /
+                    (static_cast<std::uint64_t>(nsamps) * static_cast<std::uint64_t>(nlines)));
             }
         }
-        std::ranges::fill(m_sums, std::uint64_t{0});
     }
 
     shape m_of;
     std::int32_t m_factor;
     block m_means;
-    std::vector<std::uint64_t> m_sums;  // of the line of means that is being made
+    std::map<std::int32_t, line_sums> m_sums;  // of the lines of means that are being made
 };
 
 }  // namespace
@@ -76,10 +82,10 @@ int run_preview(const preview_options &asked)
 
     const std::int32_t longer = std::max(in->form.nlines, in->form.nsamps);
     reduction reduced(in->form, static_cast<std::int32_t>(bands.size()),
-                      longer / asked.size + (longer % asked.size != 0 ? 1 : 0));
+                      img_whole_tiles(longer, asked.size));
     std::vector<stretch> stretches(bands.size(), stretch(in->form.nbits));
     const auto writer = create_image(out, file_format::png, reduced.form(), {});
-    walk(*in, whole(in->form), bands, writer.get(), [&](const window &place, const block &samples) {
+    walk(*in, whole(in->form), bands, {}, [&](const window &place, const block &samples) {
         reduced.add(place, samples);
         for (std::size_t i = 0; i < stretches.size(); ++i)
             stretches[i].count(samples, static_cast<std::int32_t>(i), place.samp);

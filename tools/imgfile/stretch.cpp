@@ -59,7 +59,7 @@ std::vector<stretch> measure_stretches(image_reader &from, const window &part,
                                        const band_list &bands)
 {
     std::vector<stretch> all(bands.size(), stretch(from.form.nbits));
-    walk(from, part, bands, nullptr, [&](const window &place, const block &samples) {
+    walk(from, part, bands, {}, [&](const window &place, const block &samples) {
         for (std::size_t i = 0; i < all.size(); ++i)
             all[i].count(samples, static_cast<std::int32_t>(i), place.samp);
     });

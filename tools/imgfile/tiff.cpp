@@ -4,6 +4,8 @@
 #include "output.h"
 #include "samples.h"
 
+#include "std/std.h"
+
 #include <algorithm>
 #include <cerrno>
 #include <cstdarg>
@@ -14,28 +16,37 @@
 
 namespace {
 
-std::string last_message;
-
-void keep_message(const char * /*module*/, const char *format, std::va_list arguments)
+int keep_message(TIFF * /*file*/, void *to, const char * /*module*/, const char *format,
+                 std::va_list arguments)
 {
     char message[512];
     const int error = errno;
     std::vsnprintf(message, sizeof message, format, arguments);
-    last_message = message;
-    if (error == ENOSPC || error == EIO || error == EFBIG || error == EDQUOT)
-        last_message = system_text(error);
+    *static_cast<std::string *>(to) =
+        error == ENOSPC || error == EIO || error == EFBIG || error == EDQUOT ? system_text(error)
+                                                                             : message;
+    return 1;  // nobody else is told
 }
 
 using tiff_file = std::unique_ptr<TIFF, decltype(&TIFFClose)>;
 
-// "m": without a mapping, whose pages would count as memory of this program.
-tiff_file open_tiff_file(int fd, const std::string &name, const char *mode)
+// Opens `fd`, which is closed with the file, or now if that fails. What goes wrong with the file is
+// left in `message`. "m" in the mode: without a mapping, whose pages would count as memory of this
+// program.
+tiff_file open_tiff_file(int fd, const std::string &name, const char *mode, std::string &message)
 {
-    TIFFSetErrorHandler(keep_message);
-    TIFFSetWarningHandler(nullptr);
-    last_message.clear();
+    const auto pass_over = [](TIFF *, void *, const char *, const char *, std::va_list) {
+        return 1;
+    };
+    const std::unique_ptr<TIFFOpenOptions, decltype(&TIFFOpenOptionsFree)> options(
+        TIFFOpenOptionsAlloc(), TIFFOpenOptionsFree);
+    if (!options) throw std::bad_alloc();
+    TIFFOpenOptionsSetErrorHandlerExtR(options.get(), keep_message, &message);
+    TIFFOpenOptionsSetWarningHandlerExtR(options.get(), pass_over, nullptr);
     errno = 0;
-    return {TIFFFdOpen(fd, name.c_str(), mode), TIFFClose};
+    tiff_file file(TIFFFdOpenExt(fd, name.c_str(), mode, options.get()), TIFFClose);
+    if (!file) ::close(fd);
+    return file;
 }
 
 template <typename Number>
@@ -51,12 +62,9 @@ constexpr std::uint64_t LARGEST_PIECE = std::uint64_t{48} << 20U;  // bytes of a
 class tiff_reader : public image_reader {
 public:
     tiff_reader(const std::string &path, int fd)
-        : image_reader(path, file_format::tiff), m_file(open_tiff_file(fd, path, "rm"))
+        : image_reader(path, file_format::tiff), m_file(open_tiff_file(fd, path, "rm", m_message))
     {
-        if (!m_file) {
-            ::close(fd);
-            throw failure(name, "is a damaged TIFF file: " + last_message);
-        }
+        if (!m_file) throw failure(name, "is a damaged TIFF file: " + m_message);
         refuse_unless(field<std::uint16_t>(m_file, TIFFTAG_SAMPLEFORMAT, SAMPLEFORMAT_UINT) ==
                           SAMPLEFORMAT_UINT,
                       "samples that are not unsigned whole numbers");
@@ -89,18 +97,18 @@ public:
                      static_cast<std::int32_t>(field<std::uint32_t>(m_file, TIFFTAG_TILEWIDTH, 0))};
             const std::uint64_t size = TIFFTileSize64(m_file.get());
             refuse_unless(size > 0 && size <= LARGEST_PIECE, "tiles of no usable size");
-            m_piece.resize(static_cast<std::size_t>(size));
         } else {
             in_order = true;
-            const std::uint64_t size = TIFFScanlineSize64(m_file.get());
-            refuse_unless(size > 0, "lines of no usable size");
-            m_piece.resize(static_cast<std::size_t>(size));
+            refuse_unless(TIFFScanlineSize64(m_file.get()) > 0, "lines of no usable size");
         }
     }
 
     void read(const window &part, const band_list &bands, block &to) override
     {
-        if (tiles.nlines != 0)
+        const bool tiled = tiles.nlines != 0;
+        m_piece.resize(static_cast<std::size_t>(tiled ? TIFFTileSize64(m_file.get())
+                                                      : TIFFScanlineSize64(m_file.get())));
+        if (tiled)
             read_tiles(part, bands, to);
         else
             read_lines(part, bands, to);
@@ -116,7 +124,7 @@ private:
     [[noreturn]] void fail_at(std::int32_t line) const
     {
         throw failure(name, text("line ", line, " is missing or damaged",
-                                 last_message.empty() ? "" : ": ", last_message));
+                                 m_message.empty() ? "" : ": ", m_message));
     }
 
     // Calls `take(plane, nbands, bands, position)` for each of what is stored by itself: all bands
@@ -141,7 +149,8 @@ private:
                                   std::int32_t position) {
             for (std::int32_t i = 0; i < part.nlines; ++i) {
                 if (TIFFReadScanline(m_file.get(), m_piece.data(),
-                                     static_cast<std::uint32_t>(part.line + i), plane) != 1)
+                                     static_cast<std::uint32_t>(part.line + i), plane) != 1 ||
+                    !m_message.empty())
                     fail_at(part.line + i);
                 spread_pixels(&m_piece[static_cast<std::size_t>(part.samp) * pixel_size(nbands)],
                               nbands, chosen, {i, 0, part.nsamps, position}, to);
@@ -159,7 +168,8 @@ private:
                 for (std::int64_t left = part.samp / tiles.nsamps * tiles.nsamps; left < last_samp;
                      left += tiles.nsamps) {
                     if (TIFFReadTile(m_file.get(), m_piece.data(), static_cast<std::uint32_t>(left),
-                                     static_cast<std::uint32_t>(top), 0, plane) == -1)
+                                     static_cast<std::uint32_t>(top), 0, plane) == -1 ||
+                        !m_message.empty())
                         fail_at(static_cast<std::int32_t>(top));
                     const auto first_line = std::max<std::int64_t>(top, part.line);
                     const auto end_line = std::min<std::int64_t>(top + tiles.nlines, last_line);
@@ -185,18 +195,33 @@ private:
         return static_cast<std::size_t>(nbands * form.nbytes);
     }
 
+    std::string m_message;  // of what went wrong last
     tiff_file m_file;
     bool m_planar = false;
     std::vector<std::uint8_t> m_piece;  // a line or a tile
 };
 
+std::int64_t tiles_in(const shape &form, tile_size tiles)
+{
+    return tiles.nlines == 0 ? 0
+                             : std::int64_t{img_whole_tiles(form.nlines, tiles.nlines)} *
+                                   img_whole_tiles(form.nsamps, tiles.nsamps);
+}
+
+// Classic files end at 4 GiB.
+bool needs_big_tiff(const shape &form, tile_size tiles)
+{
+    const std::int64_t samples = std::max(form.nsamples(), tiles_in(form, tiles) * tiles.nlines *
+                                                               tiles.nsamps * form.nbands);
+    return samples * form.nbytes > 4'000'000'000;
+}
+
 class tiff_writer : public image_writer {
 public:
     tiff_writer(output_file &out, const shape &form, tile_size tiling)
         : m_name(out.name()),
-          // classic files end at 4 GiB
           m_file(open_tiff_file(::dup(out.fd()), out.name(),
-                                form.bytes() > 4'000'000'000 ? "w8" : "w"))
+                                needs_big_tiff(form, tiling) ? "w8" : "w", m_message))
     {
         if (!m_file) fail();
         tiles = tiling;
@@ -228,15 +253,15 @@ public:
             set(TIFFTAG_ROWSPERSTRIP,
                 static_cast<std::uint32_t>(std::clamp<std::int64_t>(strip / line, 1, form.nlines)));
         }
-        m_line.resize(static_cast<std::size_t>(form.nsamps) * m_pixel);
     }
 
     void write(const window &at, const block &from) override
     {
         if (tiles.nlines != 0) return write_tiles(at, from);
+        m_piece.resize(from.bytes.size() / static_cast<std::size_t>(from.nlines));
         for (std::int32_t i = 0; i < from.nlines; ++i) {
-            gather_pixels(from, {i, 0, from.nsamps, 0}, m_line.data());
-            if (TIFFWriteScanline(m_file.get(), m_line.data(),
+            gather_pixels(from, {i, 0, from.nsamps, 0}, m_piece.data());
+            if (TIFFWriteScanline(m_file.get(), m_piece.data(),
                                   static_cast<std::uint32_t>(at.line + i), 0) != 1)
                 fail();
         }
@@ -245,7 +270,7 @@ public:
     {
         if (TIFFFlush(m_file.get()) != 1) fail();
         m_file.reset();
-        if (!last_message.empty()) fail();
+        if (!m_message.empty()) fail();
         return -1;
     }
 
@@ -266,12 +291,12 @@ private:
                     fail();
             }
     }
-    [[noreturn]] void fail() const { throw failure(m_name, "cannot be written: " + last_message); }
+    [[noreturn]] void fail() const { throw failure(m_name, "cannot be written: " + m_message); }
 
-    std::string m_name;
+    std::string m_name, m_message;
     tiff_file m_file;
     std::size_t m_pixel = 0;
-    std::vector<std::uint8_t> m_piece, m_line;
+    std::vector<std::uint8_t> m_piece;  // a line or a tile
 };
 
 }  // namespace
@@ -293,5 +318,8 @@ std::unique_ptr<image_writer> create_tiff(output_file &out, const shape &form, t
     if (std::int64_t{tiles.nlines} * tiles.nsamps * form.nbands * form.nbytes >
         std::int64_t{LARGEST_PIECE})
         throw failure(out.name(), "its tiles would be too large");
+    constexpr std::int64_t most = 2'000'000;  // libtiff holds the places of all in memory
+    if (tiles_in(form, tiles) > most)
+        throw failure(out.name(), "it would have too many tiles; ask for larger ones");
     return std::make_unique<tiff_writer>(out, form, tiles);
 }

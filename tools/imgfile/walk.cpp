@@ -12,6 +12,8 @@ namespace {
 constexpr std::int64_t BUDGET = std::int64_t{8} << 20U;        // bytes of a piece
 constexpr std::int64_t LARGEST_ROW = std::int64_t{40} << 20U;  // of tiles that must be whole
 
+constexpr std::int64_t LARGEST_LINE = std::int64_t{64} << 20U;  // of lines that must be whole
+
 struct piece_size {
     std::int32_t nlines, nsamps;
 };
@@ -28,18 +30,30 @@ std::int32_t as_size(std::int64_t size, std::int32_t extent)
     return static_cast<std::int32_t>(std::clamp<std::int64_t>(size, 1, std::max(extent, 1)));
 }
 
-piece_size choose_pieces(const image_reader &from, const window &part, std::int64_t pixel,
-                         const image_writer *writer)
+void check_lines(const image_reader &from, const window &part, std::int64_t pixel,
+                 const access_needs &to)
 {
-    const tile_size out = writer != nullptr ? writer->tiles : tile_size{};
-    const bool must_fit = writer != nullptr && writer->whole_tiles;
-    const std::int64_t high = must_fit ? out.nlines : common(from.tiles.nlines, out.nlines);
-    const std::int64_t wide = must_fit ? out.nsamps : common(from.tiles.nsamps, out.nsamps);
+    const shape &form = from.form;
+    const std::int64_t read = from.in_order ? form.bytes() / form.nlines : 0;
+    const std::int64_t longest = std::max(read, to.in_order ? part.nsamps * pixel : 0);
+    if (longest > LARGEST_LINE)
+        throw failure(from.name, text("has lines of ", grouped(longest),
+                                      " bytes; where they must be whole, 64 MiB are the most"));
+}
+
+piece_size choose_pieces(const image_reader &from, const window &part, std::int64_t pixel,
+                         const access_needs &to)
+{
+    const bool must_fit = to.whole_tiles;
+    const std::int64_t high =
+        must_fit ? to.tiles.nlines : common(from.tiles.nlines, to.tiles.nlines);
+    const std::int64_t wide =
+        must_fit ? to.tiles.nsamps : common(from.tiles.nsamps, to.tiles.nsamps);
     const std::int64_t line = std::max<std::int64_t>(part.nsamps * pixel, 1);
     if (high * line <= BUDGET)
         return {as_size(BUDGET / line / high * high, part.nlines),
                 as_size(part.nsamps, part.nsamps)};
-    if (!from.in_order && (writer == nullptr || !writer->in_order)) {
+    if (!from.in_order && !to.in_order) {
         const std::int64_t count = std::max<std::int64_t>(BUDGET / (high * pixel) / wide, 1) * wide;
         if (must_fit || count * high * pixel <= 4 * BUDGET)
             return {as_size(high, part.nlines), as_size(count, part.nsamps)};
@@ -81,14 +95,14 @@ void progress::add(std::int64_t bytes)
                  done / taken / 1e6, taken / done * (all - done));
 }
 
-void walk(image_reader &from, const window &part, const band_list &bands,
-          const image_writer *writer,
+void walk(image_reader &from, const window &part, const band_list &bands, const access_needs &to,
           const std::function<void(const window &place, const block &samples)> &use)
 {
     const auto nbands = static_cast<std::int32_t>(bands.size());
     const std::int64_t pixel = std::int64_t{nbands} * from.form.nbytes;
     if (pixel == 0 || part.nlines == 0 || part.nsamps == 0) return;
-    const piece_size size = choose_pieces(from, part, pixel, writer);
+    check_lines(from, part, pixel, to);
+    const piece_size size = choose_pieces(from, part, pixel, to);
     progress shown(std::int64_t{part.nlines} * part.nsamps * pixel);
     for (std::int64_t top = 0; top < part.nlines; top += size.nlines)
         for (std::int64_t left = 0; left < part.nsamps; left += size.nsamps) {

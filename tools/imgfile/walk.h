@@ -26,10 +26,10 @@ private:
 };
 
 // Reads a window piece by piece and calls `use` with the place of each piece in the window and its
-// samples: from the top on, and where the reader or the writer (null: none) asks for it in whole
-// lines or whole tiles. Takes some 8 MiB, unless one line is more than that.
-void walk(image_reader &from, const window &part, const band_list &bands,
-          const image_writer *writer,
+// samples: from the top on, from left to right, and as the reader and what the samples go to need
+// it. Takes some 8 MiB; more only for longer lines that must be whole, which are refused from
+// 64 MiB on.
+void walk(image_reader &from, const window &part, const band_list &bands, const access_needs &to,
           const std::function<void(const window &place, const block &samples)> &use);
 
 inline window whole(const shape &of)
