@@ -12,6 +12,7 @@
 #include <nlohmann/json.hpp>
 #include <random>
 #include <sstream>
+#include <tiffio.h>
 
 #include <fcntl.h>
 #include <sys/resource.h>
@@ -227,6 +228,51 @@ TEST_F(Tool, CutsWindowsAndPassesPicturesThrough)
     EXPECT_EQ(content_of("b.ppm"), content_of("c.ppm"));
 }
 
+void write_tiff(const char *name, const char *mode, const picture &of, int compression, bool planar,
+                int strip)
+{
+    TIFF *const file = TIFFOpen(name, mode);
+    TIFFSetField(file, TIFFTAG_IMAGELENGTH, of.nlines);
+    TIFFSetField(file, TIFFTAG_IMAGEWIDTH, of.nsamps);
+    TIFFSetField(file, TIFFTAG_SAMPLESPERPIXEL, of.nbands);
+    TIFFSetField(file, TIFFTAG_BITSPERSAMPLE, 16);
+    TIFFSetField(file, TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_RGB);
+    TIFFSetField(file, TIFFTAG_PLANARCONFIG, planar ? PLANARCONFIG_SEPARATE : PLANARCONFIG_CONTIG);
+    TIFFSetField(file, TIFFTAG_COMPRESSION, compression);
+    TIFFSetField(file, TIFFTAG_ROWSPERSTRIP, strip);
+    const int step = planar ? 1 : of.nbands;
+    for (int plane = 0; plane < of.nbands; plane += step)
+        for (int line = 0; line < of.nlines; ++line) {
+            std::vector<std::uint16_t> samples;
+            for (int samp = 0; samp < of.nsamps; ++samp)
+                for (int band = plane; band < plane + step; ++band)
+                    samples.push_back(static_cast<std::uint16_t>(of.at(line, samp, band)));
+            TIFFWriteScanline(file, samples.data(), static_cast<std::uint32_t>(line),
+                              static_cast<std::uint16_t>(plane));
+        }
+    TIFFClose(file);
+}
+
+// Strips are read piece by piece, and from anywhere in them.
+TEST_F(Tool, ReadsStripsOfAllKinds)
+{
+    const picture source = random_picture(1700, 900, 3, 2, 300);
+    write_content("a.ppm", source.as_pnm({0, 1, 2}));
+    expect_done("convert a.ppm window.ppm --window 777,50,200,600 --band 2,0,2");
+    for (const int compression : {COMPRESSION_NONE, COMPRESSION_LZW})
+        for (const bool planar : {false, true})
+            for (const int strip : {7, 1700}) {
+                write_tiff("a.tif", strip == 7 ? "wb" : "wl", source, compression, planar, strip);
+                EXPECT_EQ(run("compare a.ppm a.tif").status, 0)
+                    << compression << ' ' << planar << ' ' << strip;
+                expect_done("convert a.tif b.ppm --overwrite --window 777,50,200,600 --band 2,0,2");
+                EXPECT_EQ(content_of("b.ppm"), content_of("window.ppm"));
+            }
+    expect_done("convert a.ppm b.tif");
+    fs::resize_file("b.tif", 4'000'000);
+    EXPECT_EQ(run("convert b.tif c.tif").err, "imgfile: b.tif: line 740 is missing\n");
+}
+
 // What the tool stretches is what a host of the library sees.
 TEST_F(Tool, StretchesAsTheLibraryDoesAllAtOnce)
 {
@@ -263,6 +309,7 @@ TEST_F(Tool, RefusesInOneLineAndLeavesTheTargetAsItWas)
     write_content("cut.img", content_of("whole.img").substr(0, 244 + 8 * 40));
     write_content("junk", "nothing in particular, but long enough to hold a header of some kind");
     write_content("old", "what was there before");
+    write_content("empty", "");
     fs::create_hard_link("rgb.ppm", "twin.ppm");
     fs::create_symlink("rgb.ppm", "link.ppm");
     ASSERT_EQ(::mkfifo("pipe", 0600), 0);
@@ -336,9 +383,11 @@ TEST_F(Tool, RefusesInOneLineAndLeavesTheTargetAsItWas)
              {"check -", 2, "check reads files alone (see imgfile check --help)"},
              {"--quiet nonsense", 2, "there is no command nonsense (see imgfile --help)"},
              {"info junk", 1, nullptr},
+             {"info empty", 1, "empty: is empty"},
+             {"--versio", 2, "there is no option --versio (see imgfile --help)"},
              {"compare rgb.ppm missing.img", 1, "missing.img: No such file or directory"},
              {"nonsense", 2, "there is no command nonsense (see imgfile --help)"},
-             {"", 2, nullptr},
+             {"", 2, "a command is required (see imgfile --help)"},
          }) {
         const auto before = files();
         const finished end = run(arguments);
@@ -441,6 +490,7 @@ TEST_F(Tool, FindsWhatIsWrongWithFiles)
     };
     for (const auto &[at, byte, findings] : std::vector<damage>{
              {7, "\x6d", {"image_block_link is 109, not 108", "has a header that"}},
+             {12, "\x01", {"bytes 8 to 15, which are reserved, are not 0"}},
              {17, "\x0c", {"create_date is no date: "}},
              {32, "v", {"signature is not VITec"}},
              {115, "\x83", {"header_length is 131, not 132"}},
@@ -479,6 +529,8 @@ TEST_F(Tool, FindsWhatIsWrongWithFiles)
     run("convert b.pgm b.img");
     EXPECT_NE(run("check b.img").out.find("samples beyond 12 bits\n"), std::string::npos);
     expect_done("check b.pgm");
+    write_content("c.pgm", content_of("b.pgm") + "more");
+    EXPECT_EQ(run("check c.pgm").out, "c.pgm: 4 bytes more than the header asks for\n");
     fs::create_symlink("loop", "loop");
     const finished none = run("check missing loop b.pgm");
     EXPECT_EQ(none.status, 1);

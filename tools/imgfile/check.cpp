@@ -2,7 +2,6 @@
 #include "commands.h"
 #include "failure.h"
 #include "header.h"
-#include "native.h"
 #include "walk.h"
 
 #include "formats/words.h"
@@ -10,8 +9,11 @@
 #include <algorithm>
 #include <cstdio>
 #include <filesystem>
+#include <fstream>
 
 namespace {
+
+constexpr std::size_t IMAGE_BLOCK = 112;  // where the library places it
 
 class findings {
 public:
@@ -40,10 +42,23 @@ bool is_all_zero(const std::uint8_t *bytes, std::size_t count)
 
 void check_date(const vitec_header &header, findings &found)
 {
-    const auto *const date = &header.file.bytes[IMG_VITEC_AT_CREATE_DATE];
-    if (is_all_zero(date, 6)) return;  // of a clock that could not be read
-    if (date[1] > 11 || date[2] < 1 || date[2] > 31 || date[3] > 23 || date[4] > 59 || date[5] > 60)
-        found.add("create_date is no date: " + header.date());
+    const bool is_left_out = is_all_zero(&header.file.bytes[IMG_VITEC_AT_CREATE_DATE], 6);
+    if (!is_left_out && !header.has_date()) found.add("create_date is no date: " + header.date());
+}
+
+// Bytes of a file that begins as the library writes it.
+void check_reserved_bytes(const std::string &name, findings &found)
+{
+    std::array<std::uint8_t, 244> start{};
+    std::ifstream(name, std::ios::binary)
+        .read(reinterpret_cast<char *>(start.data()), std::ssize(start));
+    for (const auto &[from, end] : {std::pair<std::size_t, std::size_t>{8, 16},
+                                    {22, 32},
+                                    {38, IMAGE_BLOCK},
+                                    {IMAGE_BLOCK + 28, IMAGE_BLOCK + 36},
+                                    {IMAGE_BLOCK + 64, start.size()}})
+        if (!is_all_zero(&start.at(from), end - from))
+            found.add(text("bytes ", from, " to ", end - 1, ", which are reserved, are not 0"));
 }
 
 void check_tile_sizes(std::int32_t tile_nlines, std::int32_t tile_nsamps, findings &found)
@@ -57,7 +72,7 @@ void check_tile_sizes(std::int32_t tile_nlines, std::int32_t tile_nsamps, findin
 }
 
 // The fields against what a writer may put there, and against each other.
-void check_vitec_header(const vitec_header &header, findings &found)
+void check_vitec_header(const std::string &file, const vitec_header &header, findings &found)
 {
     const auto field = [&header](std::size_t at) { return header.word(at); };
     found.expect("image_block_link", header.file_word(IMG_VITEC_AT_IMAGE_BLOCK_LINK), 108);
@@ -66,6 +81,8 @@ void check_vitec_header(const vitec_header &header, findings &found)
     check_date(header, found);
     found.expect("version", field(IMG_VITEC_AT_VERSION), std::int32_t{IMG_VITEC_VERSION});
     found.expect("header_length", field(IMG_VITEC_AT_HEADER_LENGTH), 132);
+    if (header.image_block_at == IMAGE_BLOCK && field(IMG_VITEC_AT_HEADER_LENGTH) == 132)
+        check_reserved_bytes(file, found);
 
     const std::int32_t nlines = field(IMG_VITEC_AT_NLINES), nsamps = field(IMG_VITEC_AT_NSAMPS);
     const std::int32_t nbands = field(IMG_VITEC_AT_NBANDS);
@@ -136,24 +153,23 @@ void check_samples(image_reader &image, findings &found)
     }
 }
 
-void check_length(const std::string &name, findings &found)
+void check_length(const image_reader &image, findings &found)
 {
-    const native_image image(name);
+    if (image.length == -1) return;
     std::error_code error;
-    const auto length = static_cast<std::int64_t>(std::filesystem::file_size(name, error));
-    if (error) throw failure(name, error.message());
-    const std::int64_t wanted = image.whole_length();
-    if (length < wanted)
-        found.add(text("cut short: ", grouped(wanted - length), " of ", grouped(wanted),
+    const auto length = static_cast<std::int64_t>(std::filesystem::file_size(image.name, error));
+    if (error) throw failure(image.name, error.message());
+    if (length < image.length)
+        found.add(text("cut short: ", grouped(image.length - length), " of ", grouped(image.length),
                        " bytes are missing"));
-    if (length > wanted)
-        found.add(text(grouped(length - wanted), " bytes more than the header asks for"));
+    if (length > image.length)
+        found.add(text(grouped(length - image.length), " bytes more than the header asks for"));
 }
 
 void check_header(const std::string &name, findings &found)
 {
     if (const auto vitec = read_vitec_header(name)) {
-        check_vitec_header(*vitec, found);
+        check_vitec_header(name, *vitec, found);
     } else if (const auto helava = read_helava_trailer(name)) {
         for (const auto &[field, value] : {std::pair{"nbands", helava->nbands},
                                            {"nsamps", helava->nsamps},
@@ -176,8 +192,7 @@ bool check(const std::string &name)
         return false;
     }
     check_header(name, found);
-    if (image->format == file_format::vitec || image->format == file_format::helava)
-        check_length(name, found);
+    check_length(*image, found);
     check_samples(*image, found);
     return !found.any();
 }

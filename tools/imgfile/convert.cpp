@@ -96,6 +96,7 @@ int run_convert(const convert_options &asked)
     const std::int64_t length = writer->finish();
     writer.reset();
     out.commit(length);
+    if (!in->remark.empty()) note(in->name, in->remark);
     if (beyond != 0)
         note(in->name, text(grouped(beyond), " samples lie beyond ", nbits, " bits; they were ",
                             asked.stretch ? "mapped as the highest value" : "kept as they are"));

@@ -20,7 +20,7 @@ inline std::string in_one_line(std::string name)
 class failure : public std::runtime_error {
 public:
     failure(const std::string &file, const std::string &what)
-        : std::runtime_error(in_one_line(file) + ": " + what)
+        : std::runtime_error(in_one_line(file + ": " + what))
     {
     }
 };

@@ -1,4 +1,5 @@
 // Which format a file has, and which one it is to have.
+#include "descriptor.h"
 #include "failure.h"
 #include "image.h"
 #include "output.h"
@@ -49,20 +50,18 @@ int open_temporary()
 // Standard input as a file that can be read twice.
 int spool_standard_input()
 {
-    const int fd = open_temporary();
-    const auto fail = [fd](const char *what) {
-        const int error = errno;
-        ::close(fd);
-        throw failure("standard input", what + system_text(error));
+    descriptor file(open_temporary());
+    const auto fail = [](const char *what) {
+        throw failure("standard input", what + system_text(errno));
     };
     std::array<char, 65536> bytes;
     for (;;) {
         const ssize_t got = ::read(STDIN_FILENO, bytes.data(), bytes.size());
-        if (got == 0) return fd;
+        if (got == 0) return file.release();
         if (got == -1 && errno != EINTR) fail("cannot be read: ");
         for (ssize_t done = 0; done < got;) {
             const ssize_t written =
-                ::write(fd, bytes.data() + done, static_cast<std::size_t>(got - done));
+                ::write(file, bytes.data() + done, static_cast<std::size_t>(got - done));
             if (written == -1 && errno != EINTR) fail("cannot be copied to a temporary file: ");
             done += std::max<ssize_t>(written, 0);
         }
@@ -73,19 +72,14 @@ int open_to_read(const std::string &name)
 {
     if (name == "-") {
         static const int spool = spool_standard_input();
-        // Opened anew, each reader has a position of its own.
-        const int fd = ::open(text("/proc/self/fd/", spool).c_str(), O_RDONLY | O_CLOEXEC);
-        if (fd == -1) throw failure("standard input", "cannot be read: " + system_text(errno));
-        return fd;
+        return open_again(spool, "standard input");
     }
-    const int fd = ::open(name.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK);
-    if (fd == -1) throw failure(name, system_text(errno));
+    descriptor file(::open(name.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
     struct stat status;
-    if (::fstat(fd, &status) == -1 || !(S_ISREG(status.st_mode) || S_ISBLK(status.st_mode))) {
-        ::close(fd);
+    if (file == -1 || ::fstat(file, &status) == -1) throw failure(name, system_text(errno));
+    if (!S_ISREG(status.st_mode) && !S_ISBLK(status.st_mode))
         throw failure(name, S_ISDIR(status.st_mode) ? "is a folder" : "is not a regular file");
-    }
-    return fd;
+    return file.release();
 }
 
 bool is_pnm(file_format format)
@@ -148,24 +142,24 @@ namespace {
 
 std::unique_ptr<image_reader> open_by_first_bytes(const std::string &name)
 {
-    const int fd = open_to_read(name);
+    descriptor file(open_to_read(name));
     const std::string shown = name == "-" ? "standard input" : name;
-    const std::string start = bytes_at(fd, 0, 4);
+    const std::string start = bytes_at(file, 0, 4);
     // Samples of a Helava file come first, and may look like the beginning of anything.
-    const std::string end = bytes_at(fd, ::lseek(fd, 0, SEEK_END) - 4, 4);
+    const std::string end = bytes_at(file, ::lseek(file, 0, SEEK_END) - 4, 4);
     const bool is_native = start == std::string("\x00\x5B\x07\x20", 4) ||
                            start == std::string("\x20\x07\x5B\x00", 4) ||
                            end == "\x48\x41\x14\x84" || end == "\x84\x14\x41\x48";
-    ::lseek(fd, 0, SEEK_SET);
+    ::lseek(file, 0, SEEK_SET);
+    if (start.empty()) throw failure(shown, "is empty");
     if (!is_native) {
         if (start.size() == 4 && start[0] == 'P' && start[1] >= '1' && start[1] <= '7')
-            return open_pnm(shown, fd);
-        if (start == "\x89PNG") return open_png(shown, fd);
+            return open_pnm(shown, file.release());
+        if (start == "\x89PNG") return open_png(shown, file.release());
         if (start.starts_with("II*") || start.starts_with("II+") ||
             start == std::string("MM\0*", 4) || start == std::string("MM\0+", 4))
-            return open_tiff(shown, fd);
+            return open_tiff(shown, file.release());
     }
-    ::close(fd);
     if (name == "-") throw failure(shown, "is no PGM, PPM, PNG or TIFF picture");
     return open_native(name);
 }

@@ -6,6 +6,7 @@
 #include "formats/words.h"
 
 #include <cerrno>
+#include <chrono>
 #include <cstdio>
 #include <fstream>
 
@@ -45,10 +46,17 @@ std::int32_t vitec_header::word(std::size_t at) const
     return img_get_int(std::array(image.bytes), at);
 }
 
+bool vitec_header::has_date() const
+{
+    const auto *const at = &file.bytes[IMG_VITEC_AT_CREATE_DATE];
+    const std::chrono::year_month_day day(std::chrono::year(1900 + at[0]),
+                                          std::chrono::month(at[1] + 1U), std::chrono::day(at[2]));
+    return day.ok() && at[3] <= 23 && at[4] <= 59 && at[5] <= 60;
+}
+
 std::string vitec_header::date() const
 {
     const auto *const at = &file.bytes[IMG_VITEC_AT_CREATE_DATE];
-    if (at[2] == 0) return "";  // days count from 1
     char date[32];
     std::snprintf(date, sizeof date, "%04d-%02d-%02d %02d:%02d:%02d", 1900 + at[0], at[1] + 1,
                   at[2], at[3], at[4], at[5]);

@@ -18,7 +18,8 @@ struct vitec_header {
 
     std::int32_t file_word(std::size_t at) const;
     std::int32_t word(std::size_t at) const;  // of the image block
-    // "2026-11-23 08:15:30"; empty: no date.
+    bool has_date() const;
+    // "2026-11-23 08:15:30", whether that is a date or not.
     std::string date() const;
 };
 

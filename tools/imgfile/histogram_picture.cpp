@@ -23,6 +23,11 @@ constexpr std::array colors{color{0.80, 0.22, 0.20}, color{0.16, 0.55, 0.25},
                             color{0.13, 0.37, 0.75}};
 constexpr color gray{0.36, 0.45, 0.56}, orange{0.85, 0.42, 0.05};
 
+struct caption {
+    std::string what;
+    color by;
+};
+
 // A picture with a plot in it, of values in [low, high] and heights in [0, top].
 class plot {
 public:
@@ -55,13 +60,15 @@ public:
     {
         cairo_set_source_rgba(m_cairo, what.red, what.green, what.blue, opacity);
     }
-    void write(const std::string &what, double at_x, double at_y, double align, double size)
+    // Returns the width.
+    double write(const std::string &what, double at_x, double at_y, double align, double size)
     {
         cairo_set_font_size(m_cairo, size);
         cairo_text_extents_t extents;
         cairo_text_extents(m_cairo, what.c_str(), &extents);
         cairo_move_to(m_cairo, at_x - align * extents.x_advance, at_y);
         cairo_show_text(m_cairo, what.c_str());
+        return extents.x_advance;
     }
     void line(double x0, double y0, double x1, double y1, double width)
     {
@@ -71,11 +78,16 @@ public:
         cairo_stroke(m_cairo);
     }
 
-    void axes(const std::string &title, const std::string &subtitle)
+    void axes(const std::string &title, const std::vector<caption> &captions)
     {
         use(ink);
         write(title, LEFT, 30, 0, 18);
-        write(subtitle, LEFT, 50, 0, 12);
+        double at = LEFT;
+        for (const caption &each : captions) {
+            use(each.by);
+            at += write(each.what, at, 50, 0, 12) + 18;
+        }
+        use(ink);
         const double step = rounded_step((m_high - m_low) / 8);
         for (double value = std::ceil(m_low / step) * step; value <= m_high; value += step) {
             use(faint);
@@ -200,19 +212,20 @@ std::string draw_histograms(const std::vector<band_histogram> &of, const std::st
             top = std::max(
                 top, plot::sum(each, std::max(first, 1), first == 0 ? std::max(bin - 1, 0) : bin));
     plot picture(0, high, top * 1.05);
-    std::string subtitle;
-    for (const band_histogram &each : of) {
+    const bool is_alone = of.size() == 1;
+    const auto own = [](std::size_t i) { return colors.at(i % colors.size()); };
+    std::vector<caption> captions;
+    for (std::size_t i = 0; i < of.size(); ++i) {
+        const band_histogram &each = of[i];
         const double zeros =
             static_cast<double>(each.counts[0]) / static_cast<double>(each.total());
-        subtitle += text(subtitle.empty() ? "" : "    ", "band ", each.band, ": ", each.lowest(),
-                         " to ", each.highest(), ", mean ", rounded(each.mean()), ", ",
-                         rounded(100 * zeros), " % zero");
+        captions.push_back(
+            {text("band ", each.band, ": ", each.lowest(), " to ", each.highest(), ", mean ",
+                  rounded(each.mean()), ", ", rounded(100 * zeros), " % zero"),
+             is_alone ? ink : own(i)});
     }
-    picture.axes(drawable(title), subtitle);
-    for (std::size_t i = 0; i < of.size(); ++i) {
-        const color own = colors.at(i % colors.size());
-        const bool is_alone = of.size() == 1;
-        picture.draw(of[i], is_alone ? gray : own, is_alone ? orange : own, bin);
-    }
+    picture.axes(drawable(title), captions);
+    for (std::size_t i = 0; i < of.size(); ++i)
+        picture.draw(of[i], is_alone ? gray : own(i), is_alone ? orange : own(i), bin);
     return picture.as_png();
 }

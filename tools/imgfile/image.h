@@ -104,6 +104,8 @@ public:
     const std::string name;
     file_format format;
     shape form{};
+    std::int64_t length = -1;  // bytes that the file must have; -1: not known
+    std::string remark;        // what people should know of the file; empty: nothing
 };
 
 // An image file that is being made.
@@ -119,8 +121,8 @@ public:
     virtual std::int64_t finish() = 0;
 };
 
-// Opens an image of any format, which its first bytes tell; "-" is standard input. `fresh` readers
-// of one name are independent of each other.
+// Opens an image of any format, which its first bytes tell; "-" is standard input. Readers of one
+// name do not depend on each other.
 std::unique_ptr<image_reader> open_image(const std::string &name);
 
 // Makes an image in `out`, which `name` is to become; refuses what the format cannot hold.

@@ -32,8 +32,7 @@ void describe_native(const std::string &name, json &facts)
         facts["tile_grid"] = {{"down", desc.std_file->tiles_down},
                               {"across", desc.std_file->tiles_across}};
     facts["data_offset"] = desc.std_file->data_offset;
-    facts["expected_length"] = image.whole_length();
-    if (vitec && !vitec->date().empty()) facts["created"] = vitec->date();
+    if (vitec && vitec->has_date()) facts["created"] = vitec->date();
 }
 
 json describe(const std::string &name)
@@ -60,6 +59,7 @@ json describe(const std::string &name)
     std::error_code unknown;
     const auto length = std::filesystem::file_size(name, unknown);
     if (!unknown) facts["file_length"] = length;
+    if (image->length != -1) facts["expected_length"] = image->length;
     if (image->format == file_format::vitec || image->format == file_format::helava)
         describe_native(name, facts);
     return facts;

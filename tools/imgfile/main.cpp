@@ -6,7 +6,6 @@
 #include "walk.h"
 
 #include <CLI/CLI.hpp>
-#include <algorithm>
 #include <array>
 #include <csignal>
 #include <cstdio>
@@ -42,6 +41,18 @@ CLI::Option *add_option(CLI::App *command, const char *name, Value &value, const
     return command->add_option(name, value, what)->type_name(kind);
 }
 
+void add_quiet(CLI::App *app)
+{
+    app->add_flag("--quiet", quiet, "Print no progress and no notes");
+}
+
+CLI::App *add_command(CLI::App &app, const char *name, const char *what)
+{
+    CLI::App *const command = app.add_subcommand(name, what);
+    add_quiet(command);
+    return command;
+}
+
 void add_output(CLI::App *command, std::string &name, bool &overwrite, const char *what)
 {
     add_operand(command, "OUT", name, what);
@@ -50,7 +61,7 @@ void add_output(CLI::App *command, std::string &name, bool &overwrite, const cha
 
 CLI::App *add_info(CLI::App &app, info_options &asked)
 {
-    CLI::App *const command = app.add_subcommand("info", "Tell what image files are");
+    CLI::App *const command = add_command(app, "info", "Tell what image files are");
     add_operand(command, "FILE", asked.files, "Images of any format; - is standard input");
     command->add_flag("--json", asked.json, "Print an array with one object for each file");
     return command;
@@ -59,7 +70,7 @@ CLI::App *add_info(CLI::App &app, info_options &asked)
 CLI::App *add_check(CLI::App &app, check_options &asked)
 {
     CLI::App *const command =
-        app.add_subcommand("check", "Look for all that can be wrong with image files");
+        add_command(app, "check", "Look for all that can be wrong with image files");
     add_operand(command, "FILE", asked.files, "Images of any format");
     return command;
 }
@@ -67,7 +78,7 @@ CLI::App *add_check(CLI::App &app, check_options &asked)
 CLI::App *add_convert(CLI::App &app, convert_options &asked)
 {
     CLI::App *const command =
-        app.add_subcommand("convert", "Write an image, or a part of it, in another format");
+        add_command(app, "convert", "Write an image, or a part of it, in another format");
     add_operand(command, "IN", asked.in, "The image; - is standard input");
     add_output(command, asked.out, asked.overwrite,
                "What to write; its ending tells the format; - is standard output");
@@ -88,7 +99,7 @@ CLI::App *add_convert(CLI::App &app, convert_options &asked)
 
 CLI::App *add_preview(CLI::App &app, preview_options &asked)
 {
-    CLI::App *const command = app.add_subcommand("preview", "Make a picture for people to look at");
+    CLI::App *const command = add_command(app, "preview", "Make a picture for people to look at");
     add_operand(command, "FILE", asked.in, "The image; - is standard input");
     add_output(command, asked.out, asked.overwrite, "The picture, a PNG file");
     add_option(command, "--size", asked.size, "N", "Lines or samples at most, 16 to 2048 (1024)")
@@ -102,7 +113,7 @@ CLI::App *add_preview(CLI::App &app, preview_options &asked)
 CLI::App *add_stats(CLI::App &app, stats_options &asked)
 {
     CLI::App *const command =
-        app.add_subcommand("stats", "Tell what the samples of an image are like");
+        add_command(app, "stats", "Tell what the samples of an image are like");
     add_operand(command, "FILE", asked.in, "The image; - is standard input");
     command->add_flag("--json", asked.json, "Print an object");
     add_option(command, "--histogram", asked.histogram, "OUT.png",
@@ -113,7 +124,7 @@ CLI::App *add_stats(CLI::App &app, stats_options &asked)
 
 CLI::App *add_compare(CLI::App &app, compare_options &asked)
 {
-    CLI::App *const command = app.add_subcommand("compare", "Compare two images sample by sample");
+    CLI::App *const command = add_command(app, "compare", "Compare two images sample by sample");
     add_operand(command, "A", asked.a, "An image; - is standard input");
     add_operand(command, "B", asked.b, "Another image, of any format");
     return command;
@@ -121,7 +132,7 @@ CLI::App *add_compare(CLI::App &app, compare_options &asked)
 
 CLI::App *add_create(CLI::App &app, create_options &asked)
 {
-    CLI::App *const command = app.add_subcommand("create", "Create an image, all samples 0");
+    CLI::App *const command = add_command(app, "create", "Create an image, all samples 0");
     add_output(command, asked.out, asked.overwrite, "What to write; its ending tells the type");
     const auto not_negative = CLI::Range(0, INT32_MAX).description("");
     add_option(command, "--lines", asked.nlines, "N", "Lines")->required()->check(not_negative);
@@ -157,9 +168,8 @@ int run(int argc, char **argv)
     app.require_subcommand(1);
     app.set_version_flag("--version", text("imgfile ", VERSION), "Print the version and exit");
     app.set_help_flag("--help", "Print this help and exit");
-    app.add_flag("--quiet", quiet, "Print no progress and no notes");
+    add_quiet(&app);
     app.get_formatter()->column_width(34);
-    app.fallthrough();  // --quiet may follow the command
     app.footer("Exit status: 0 done, 1 failed or found something, 2 wrong usage.\n"
                "\"imgfile COMMAND --help\" and \"man imgfile-COMMAND\" tell more.");
 
@@ -186,14 +196,13 @@ int run(int argc, char **argv)
         app.exit(wanted);
         return 0;
     } catch (const CLI::ParseError &error) {
-        const auto *const first =
-            std::find_if(argv + 1, argv + argc, [](const char *word) { return *word != '-'; });
-        const bool is_known =
-            first == argv + argc || std::ranges::any_of(commands, [&](const auto &each) {
-                return each.first->get_name() == *first;
-            });
-        const std::string what =
-            is_known ? error.what() : std::string("there is no command ") + *first;
+        std::string what = error.what();
+        const std::vector<std::string> left = app.remaining();
+        if (app.get_subcommands().empty() && left.empty())
+            what = "a command is required";
+        else if (app.get_subcommands().empty())
+            what = (left[0].starts_with('-') ? "there is no option " : "there is no command ") +
+                   left[0];
         return tell_usage(app, what.substr(0, what.find('\n')));
     }
     try {

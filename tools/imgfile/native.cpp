@@ -87,6 +87,7 @@ public:
         if (desc.type == IMG_TYPE_HELAVA) format = file_format::helava;
         form = {desc.nlines, desc.nsamps, desc.nbands, desc.nbytes, desc.nbits};
         if (img_is_tiled(&desc)) tiles = {desc.tile_nlines, desc.tile_nsamps};
+        length = m_image.whole_length();
     }
 
     void read(const window &part, const band_list &bands, block &to) override

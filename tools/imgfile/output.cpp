@@ -1,5 +1,6 @@
 #include "output.h"
 
+#include "descriptor.h"
 #include "failure.h"
 
 #include <array>
@@ -46,11 +47,6 @@ std::string name_beside(const std::string &target)
             text(".", path.filename().string().substr(0, 200), ".",
                  std::chrono::system_clock::now().time_since_epoch().count(), ".part"))
         .string();
-}
-
-std::string path_of_descriptor(int fd)
-{
-    return text("/proc/self/fd/", fd);
 }
 
 }  // namespace

@@ -1,4 +1,5 @@
 // Binary PGM and PPM files: a header of text, then pixels, line by line, the high byte first.
+#include "descriptor.h"
 #include "failure.h"
 #include "image.h"
 #include "output.h"
@@ -14,18 +15,6 @@
 #include <unistd.h>
 
 namespace {
-
-class descriptor {
-public:
-    explicit descriptor(int fd) : m_fd(fd) {}
-    ~descriptor() { ::close(m_fd); }
-    descriptor(const descriptor &) = delete;
-    descriptor &operator=(const descriptor &) = delete;
-    operator int() const { return m_fd; }
-
-private:
-    int m_fd;
-};
 
 bool is_blank(int byte)
 {
@@ -86,6 +75,8 @@ public:
         form.nbits = form.nbytes == 1 ? 8 : static_cast<int>(std::bit_width(unsigned(*highest)));
         m_first = static_cast<std::int64_t>(header.m_at) + 1;
         m_line_length = std::int64_t{form.nsamps} * form.nbands * form.nbytes;
+        if (form.nlines <= INT64_MAX / 2 / m_line_length)
+            length = m_first + m_line_length * form.nlines;
     }
 
     void read(const window &part, const band_list &bands, block &to) override
@@ -96,27 +87,27 @@ public:
             part.nsamps == form.nsamps
                 ? std::clamp<std::int64_t>(at_once / m_line_length, 1, part.nlines)
                 : 1);
-        const std::int64_t length = part.nsamps * pixel;
+        const std::int64_t piece = part.nsamps * pixel;
         for (std::int32_t first = 0; first < part.nlines; first += step) {
             const std::int32_t count = std::min(step, part.nlines - first);
-            m_pixels.resize(static_cast<std::size_t>(count * length));
-            read_pixels(std::int64_t{part.line} + first, part.samp * pixel, length);
+            m_pixels.resize(static_cast<std::size_t>(count * piece));
+            read_pixels(std::int64_t{part.line} + first, part.samp * pixel, piece);
             for (std::int32_t i = 0; i < count; ++i)
-                spread_pixels(&m_pixels[static_cast<std::size_t>(i * length)], form.nbands, bands,
+                spread_pixels(&m_pixels[static_cast<std::size_t>(i * piece)], form.nbands, bands,
                               {first + i, 0, part.nsamps, 0}, to);
         }
     }
 
 private:
-    // Fills m_pixels with pieces of lines, `length` bytes each; with more than one: of whole lines.
-    void read_pixels(std::int64_t line, std::int64_t first_byte, std::int64_t length)
+    // Fills m_pixels with pieces of lines, `piece` bytes each; with more than one: of whole lines.
+    void read_pixels(std::int64_t line, std::int64_t first_byte, std::int64_t piece)
     {
         const ssize_t got =
             read_at(m_first + line * m_line_length + first_byte, m_pixels.data(), m_pixels.size());
         if (got == -1)
             throw failure(name, text("line ", line, " cannot be read: ", system_text(errno)));
         if (static_cast<std::size_t>(got) != m_pixels.size())
-            throw failure(name, text("cut short: line ", line + got / length, " is missing"));
+            throw failure(name, text("cut short: line ", line + got / piece, " is missing"));
         if (BIG_ENDIAN_IS_FOREIGN && form.nbytes == 2)
             exchange_bytes(m_pixels.data(), m_pixels.size() / 2);
     }

@@ -97,5 +97,6 @@ int run_preview(const preview_options &asked)
     writer->write(whole(reduced.form()), stretched(reduced.means(), stretches));
     writer->finish();
     out.commit(-1);
+    if (!in->remark.empty()) note(in->name, in->remark);
     return 0;
 }

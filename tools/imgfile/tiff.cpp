@@ -1,4 +1,5 @@
 // TIFF files of 8 or 16 bits, in strips or tiles.
+#include "descriptor.h"
 #include "failure.h"
 #include "image.h"
 #include "output.h"
@@ -22,9 +23,10 @@ int keep_message(TIFF * /*file*/, void *to, const char * /*module*/, const char 
     char message[512];
     const int error = errno;
     std::vsnprintf(message, sizeof message, format, arguments);
-    *static_cast<std::string *>(to) =
-        error == ENOSPC || error == EIO || error == EFBIG || error == EDQUOT ? system_text(error)
-                                                                             : message;
+    auto &kept = *static_cast<std::string *>(to);
+    kept = error == ENOSPC || error == EIO || error == EFBIG || error == EDQUOT ? system_text(error)
+                                                                                : message;
+    kept.resize(std::min(kept.find('\n'), kept.size()));
     return 1;  // nobody else is told
 }
 
@@ -59,12 +61,19 @@ Number field(const tiff_file &file, ttag_t tag, Number otherwise)
 
 constexpr std::uint64_t LARGEST_PIECE = std::uint64_t{48} << 20U;  // bytes of a tile
 
+// Such are turned into RGB as they are read.
+bool is_jpeg_of_colours(const tiff_file &file)
+{
+    return field<std::uint16_t>(file, TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_MINISBLACK) ==
+               PHOTOMETRIC_YCBCR &&
+           field<std::uint16_t>(file, TIFFTAG_COMPRESSION, COMPRESSION_NONE) == COMPRESSION_JPEG;
+}
+
 class tiff_reader : public image_reader {
 public:
     tiff_reader(const std::string &path, int fd)
-        : image_reader(path, file_format::tiff), m_file(open_tiff_file(fd, path, "rm", m_message))
+        : image_reader(path, file_format::tiff), m_file(open_file(fd))
     {
-        if (!m_file) throw failure(name, "is a damaged TIFF file: " + m_message);
         refuse_unless(field<std::uint16_t>(m_file, TIFFTAG_SAMPLEFORMAT, SAMPLEFORMAT_UINT) ==
                           SAMPLEFORMAT_UINT,
                       "samples that are not unsigned whole numbers");
@@ -72,13 +81,9 @@ public:
         refuse_unless(bits == 8 || bits == 16, text("samples of ", bits, " bits"));
         const int photometric =
             field<std::uint16_t>(m_file, TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_MINISBLACK);
-        const bool lossy =
-            field<std::uint16_t>(m_file, TIFFTAG_COMPRESSION, COMPRESSION_NONE) == COMPRESSION_JPEG;
         refuse_unless(photometric == PHOTOMETRIC_MINISBLACK || photometric == PHOTOMETRIC_RGB ||
-                          (photometric == PHOTOMETRIC_YCBCR && lossy),
+                          is_jpeg_of_colours(m_file),
                       "colours that are neither gray nor RGB");
-        if (photometric == PHOTOMETRIC_YCBCR)
-            TIFFSetField(m_file.get(), TIFFTAG_JPEGCOLORMODE, JPEGCOLORMODE_RGB);
 
         const auto nlines = field<std::uint32_t>(m_file, TIFFTAG_IMAGELENGTH, 0);
         const auto nsamps = field<std::uint32_t>(m_file, TIFFTAG_IMAGEWIDTH, 0);
@@ -96,11 +101,25 @@ public:
             tiles = {static_cast<std::int32_t>(field<std::uint32_t>(m_file, TIFFTAG_TILELENGTH, 0)),
                      static_cast<std::int32_t>(field<std::uint32_t>(m_file, TIFFTAG_TILEWIDTH, 0))};
             const std::uint64_t size = TIFFTileSize64(m_file.get());
-            refuse_unless(size > 0 && size <= LARGEST_PIECE, "tiles of no usable size");
+            refuse_unless(size > 0, "tiles of no usable size");
+            if (size > LARGEST_PIECE)
+                throw failure(name, text("has tiles of ", size, " bytes; 48 MiB are the most"));
         } else {
             in_order = true;
+            m_plain = field<std::uint16_t>(m_file, TIFFTAG_COMPRESSION, COMPRESSION_NONE) ==
+                          COMPRESSION_NONE &&
+                      field<std::uint16_t>(m_file, TIFFTAG_FILLORDER, FILLORDER_MSB2LSB) ==
+                          FILLORDER_MSB2LSB;
+            m_strip_nlines =
+                std::max(field<std::uint32_t>(m_file, TIFFTAG_ROWSPERSTRIP, nlines), 1U);
             refuse_unless(TIFFScanlineSize64(m_file.get()) > 0, "lines of no usable size");
         }
+        if (const int orientation =
+                field<std::uint16_t>(m_file, TIFFTAG_ORIENTATION, ORIENTATION_TOPLEFT);
+            orientation != ORIENTATION_TOPLEFT)
+            remark = text("its orientation, ", orientation, ", is left out of account");
+        else if (has_pages())
+            remark = "it has more than one image, of which this is the first";
     }
 
     void read(const window &part, const band_list &bands, block &to) override
@@ -121,10 +140,31 @@ private:
             throw failure(name,
                           "has " + what + "; TIFF files of 8 or 16 bits, gray or RGB, are read");
     }
-    [[noreturn]] void fail_at(std::int32_t line) const
+    [[noreturn]] void fail_at(std::int64_t line, std::uint16_t plane) const
     {
-        throw failure(name, text("line ", line, " is missing or damaged",
-                                 m_message.empty() ? "" : ": ", m_message));
+        throw failure(
+            name, text("line ", line, m_planar ? text(" of band ", plane) : "",
+                       m_message.empty() ? " is missing" : " is missing or damaged: ", m_message));
+    }
+    tiff_file open_file(int fd)
+    {
+        tiff_file file = open_tiff_file(fd, name, "rm", m_message);
+        if (!file) throw failure(name, "is a damaged TIFF file: " + m_message);
+        if (is_jpeg_of_colours(file))
+            TIFFSetField(file.get(), TIFFTAG_JPEGCOLORMODE, JPEGCOLORMODE_RGB);
+        m_message.clear();  // it could be opened in spite of it
+        return file;
+    }
+
+    // True when a second image follows that is neither the first one reduced nor a mask.
+    bool has_pages()
+    {
+        if (TIFFLastDirectory(m_file.get()) != 0) return false;
+        const tiff_file again = open_file(open_again(TIFFFileno(m_file.get()), name));
+        const bool found = TIFFReadDirectory(again.get()) == 1;
+        const auto type = field<std::uint32_t>(again, TIFFTAG_SUBFILETYPE, 0);
+        m_message.clear();
+        return found && (type & (FILETYPE_REDUCEDIMAGE | FILETYPE_MASK)) == 0;
     }
 
     // Calls `take(plane, nbands, bands, position)` for each of what is stored by itself: all bands
@@ -141,17 +181,61 @@ private:
                  static_cast<std::int32_t>(i));
     }
 
-    // libtiff reads lines of compressed strips from the top only, and starts over by itself when
-    // the plane changes.
+    // A plane of lines that is being read. Compressed strips can be read from their first line on
+    // alone, and would be begun anew with each change of the plane if all were read by one.
+    struct lines_in_order {
+        tiff_file file;
+        std::uint16_t plane;
+        std::int64_t next = 0;
+    };
+
+    lines_in_order &lines_of(std::uint16_t plane, std::int32_t position)
+    {
+        const auto at = static_cast<std::size_t>(position);
+        for (std::size_t i = m_lines.size(); i <= at; ++i)
+            m_lines.push_back({open_file(open_again(TIFFFileno(m_file.get()), name)), plane});
+        if (m_lines[at].plane != plane) m_lines[at].next = 0;
+        m_lines[at].plane = plane;
+        return m_lines[at];
+    }
+
+    // Leave the line in m_piece. libtiff would take the whole strip into memory for it.
+    void read_plain_line(std::int64_t line, std::uint16_t plane)
+    {
+        TIFF *const file = m_file.get();
+        const std::uint32_t strip = TIFFComputeStrip(file, static_cast<std::uint32_t>(line), plane);
+        const std::uint64_t from =
+            static_cast<std::uint64_t>(line % m_strip_nlines) * m_piece.size();
+        ssize_t got = 0;
+        if (from + m_piece.size() <= TIFFGetStrileByteCount(file, strip))
+            got = ::pread(TIFFFileno(file), m_piece.data(), m_piece.size(),
+                          static_cast<off_t>(TIFFGetStrileOffset(file, strip) + from));
+        if (got == -1) m_message = system_text(errno);
+        if (got != static_cast<ssize_t>(m_piece.size())) fail_at(line, plane);
+        if (TIFFIsByteSwapped(file) != 0 && form.nbytes == 2)
+            exchange_bytes(m_piece.data(), m_piece.size() / 2);
+    }
+    void read_line(lines_in_order &from, std::int64_t line)
+    {
+        const std::int64_t first = line / m_strip_nlines * m_strip_nlines;
+        if (from.next < first || from.next > line) from.next = first;
+        for (; from.next <= line; ++from.next)
+            if (TIFFReadScanline(from.file.get(), m_piece.data(),
+                                 static_cast<std::uint32_t>(from.next), from.plane) != 1 ||
+                !m_message.empty())
+                fail_at(from.next, from.plane);
+    }
+
     void read_lines(const window &part, const band_list &bands, block &to)
     {
         for_each_plane(bands, [&](std::uint16_t plane, std::int32_t nbands, const band_list &chosen,
                                   std::int32_t position) {
             for (std::int32_t i = 0; i < part.nlines; ++i) {
-                if (TIFFReadScanline(m_file.get(), m_piece.data(),
-                                     static_cast<std::uint32_t>(part.line + i), plane) != 1 ||
-                    !m_message.empty())
-                    fail_at(part.line + i);
+                const std::int64_t line = std::int64_t{part.line} + i;
+                if (m_plain)
+                    read_plain_line(line, plane);
+                else
+                    read_line(lines_of(plane, position), line);
                 spread_pixels(&m_piece[static_cast<std::size_t>(part.samp) * pixel_size(nbands)],
                               nbands, chosen, {i, 0, part.nsamps, position}, to);
             }
@@ -170,7 +254,7 @@ private:
                     if (TIFFReadTile(m_file.get(), m_piece.data(), static_cast<std::uint32_t>(left),
                                      static_cast<std::uint32_t>(top), 0, plane) == -1 ||
                         !m_message.empty())
-                        fail_at(static_cast<std::int32_t>(top));
+                        fail_at(top, plane);
                     const auto first_line = std::max<std::int64_t>(top, part.line);
                     const auto end_line = std::min<std::int64_t>(top + tiles.nlines, last_line);
                     const auto first = std::max<std::int64_t>(left, part.samp);
@@ -198,7 +282,10 @@ private:
     std::string m_message;  // of what went wrong last
     tiff_file m_file;
     bool m_planar = false;
-    std::vector<std::uint8_t> m_piece;  // a line or a tile
+    bool m_plain = false;  // lines can be read where they lie
+    std::int64_t m_strip_nlines = 0;
+    std::vector<lines_in_order> m_lines;  // of the bands that are read, if they are planes
+    std::vector<std::uint8_t> m_piece;    // a line or a tile
 };
 
 std::int64_t tiles_in(const shape &form, tile_size tiles)
@@ -253,6 +340,7 @@ public:
             set(TIFFTAG_ROWSPERSTRIP,
                 static_cast<std::uint32_t>(std::clamp<std::int64_t>(strip / line, 1, form.nlines)));
         }
+        write_directory();
     }
 
     void write(const window &at, const block &from) override
@@ -275,6 +363,16 @@ public:
     }
 
 private:
+    // Before the samples, so that of a file which is cut short it is known what is missing. The
+    // places of strips and tiles are filled in when they have one.
+    void write_directory()
+    {
+        TIFF *const file = m_file.get();
+        if (TIFFDeferStrileArrayWriting(file) != 1 ||
+            TIFFWriteCheck(file, whole_tiles ? 1 : 0, "") != 1 || TIFFWriteDirectory(file) != 1 ||
+            TIFFSetDirectory(file, 0) != 1 || TIFFForceStrileArrayWriting(file) != 1)
+            fail();
+    }
     void write_tiles(const window &at, const block &from)
     {
         const std::size_t pitch = static_cast<std::size_t>(tiles.nsamps) * m_pixel;
