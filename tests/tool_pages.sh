@@ -37,7 +37,7 @@ offered() {  # WORD...: what completion offers for the last of them
     printf '%s\n' "${COMPREPLY[@]}" | sorted
 }
 
-commands=$("$program" --help | sed -n '/^Subcommands/,/^$/s/^  \([a-z]*\) .*/\1/p')
+commands=$("$program" --help | sed -n '/^Commands/,/^$/s/^  \([a-z]*\) .*/\1/p')
 expect 'commands' 'check compare convert create info preview stats ' "$(echo "$commands" | sorted)"
 expect 'options that all have' "$(options_of_help | sorted)" \
     "$(options_of_page "$pages/imgfile.1" | sorted)"

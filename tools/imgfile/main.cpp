@@ -49,6 +49,7 @@ void add_quiet(CLI::App *app)
 CLI::App *add_command(CLI::App &app, const char *name, const char *what)
 {
     CLI::App *const command = app.add_subcommand(name, what);
+    command->group("Commands");
     add_quiet(command);
     return command;
 }
@@ -170,6 +171,7 @@ int run(int argc, char **argv)
     app.set_help_flag("--help", "Print this help and exit");
     add_quiet(&app);
     app.get_formatter()->column_width(34);
+    app.get_formatter()->label("SUBCOMMAND", "COMMAND");
     app.footer("Exit status: 0 done, 1 failed or found something, 2 wrong usage.\n"
                "\"imgfile COMMAND --help\" and \"man imgfile-COMMAND\" tell more.");
 
