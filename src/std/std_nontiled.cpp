@@ -65,7 +65,7 @@ std::int32_t write_interleaved_line(img_desc *desc, std::int64_t at, std::int32_
     return result;
 }
 
-// How many lines of a region one call may move: all, or as many as fit the processor's cache where
+// How many lines of a region one call may write: all, or as many as fit the processor's cache where
 // they have to be gathered first, when they lie side by side in the file and nobody counts the
 // calls.
 std::int32_t lines_at_once(const img_desc *desc, std::int32_t nlines, std::int32_t nsamps,
@@ -111,30 +111,21 @@ std::int32_t img_std_read_lines(img_desc *desc, std::int32_t line, std::int32_t 
         return 0;
 
     const std::int32_t row_length = desc->nbytes * nsamps;
-    const bool joins = stride == nsamps && desc->std_file->pre_reads == 0;
-    std::int32_t count = joins ? lines_at_once(desc, nlines, nsamps, false) : 1;
-    for (std::int32_t i = 0; i < nlines;) {
+    for (std::int32_t i = 0; i < nlines; ++i) {
         const std::int64_t offset = img_std_line_offset(desc, std::int64_t{line} + i, samp, band);
         std::uint8_t *const row = buffer + row_start(desc, i, stride);
         if (desc->mem_image) {
             if (offset + row_length - 1 > desc->std_file->veof)
                 return img_fail("img_read_nontiled: read beyond virtual eof!!\n");
             copy_row(desc, desc->mem_image.get() + offset, row, nsamps, exchange);
-            ++i;
             continue;
         }
-        const std::int32_t length = count * row_length;
-        const std::int32_t got = img_std_read_at(desc, offset, row, length);
-        if (got != length && count > 1) {  // once more, line by line
-            count = 1;
-            continue;
-        }
-        if (got != length && img_std_report_errors == 0) return -1;  // virtual tiles
+        const std::int32_t got = img_std_read_at(desc, offset, row, row_length);
+        if (got != row_length && img_std_report_errors == 0) return -1;  // virtual tiles
         if (got == -1) return img_fail_errno("img_read_nontiled:read");
-        if (got != length)
+        if (got != row_length)
             return img_fail("img_read_nontiled: %d of %d bytes read!!\n", got, row_length);
-        if (exchange) copy_row(desc, row, row, count * nsamps, exchange);
-        i += count;
+        if (exchange) copy_row(desc, row, row, nsamps, exchange);
     }
     return 0;
 }
