@@ -32,6 +32,10 @@ TEST_F(Platform, TranslatesOpenFlags)
     EXPECT_EQ(open_and_ask(0x102), O_RDWR);
     host.block_devices = true;
     EXPECT_EQ(open_and_ask(0), O_RDONLY);
+    host = {.leases_files = 1};
+    EXPECT_EQ(open_and_ask(0), O_RDONLY);
+    host = {.leases_files = 2};
+    EXPECT_EQ(open_and_ask(0), -1);
     host = {};
     for (const std::int32_t unknown : {3, 0x303, 0x306, 0x10302, -1, INT32_MIN})
         EXPECT_EQ(open_and_ask(unknown), -1) << unknown;

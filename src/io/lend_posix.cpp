@@ -18,24 +18,40 @@ namespace {
 struct {
     pthread_t thread;
     std::uint8_t *begin;
-    std::size_t size;                 // 0: nobody uses it
-    struct sigaction found;           // what the host does about bus errors
-    volatile std::sig_atomic_t torn;  // 1: some of the bytes were not there
+    std::size_t size;                      // 0: nobody uses it
+    struct sigaction found;                // what the host does about bus errors
+    sigset_t mask;                         // which signals it blocks
+    volatile std::sig_atomic_t torn;       // 1: some of the bytes were not there
+    volatile std::sig_atomic_t held_back;  // 1: a signal came that the host blocks
 } in_use;
+
+bool is_sent_by_a_program(const siginfo_t *info)
+{
+    return info->si_code <= 0;
+}
+
+bool is_in_use_here()
+{
+    return in_use.size != 0 && ::pthread_equal(::pthread_self(), in_use.thread) != 0;
+}
 
 // True when an error is a read of the mapping by the thread that uses it.
 bool is_torn(const siginfo_t *info)
 {
     const auto *const address = static_cast<const std::uint8_t *>(info->si_addr);
-    return info->si_code > 0 && address >= in_use.begin && address < in_use.begin + in_use.size &&
-           ::pthread_equal(::pthread_self(), in_use.thread) != 0;
+    return !is_sent_by_a_program(info) && is_in_use_here() && address >= in_use.begin &&
+           address < in_use.begin + in_use.size;
 }
 
 // Does what would have happened without this library.
 void leave_to_host(int signal, siginfo_t *info, void *context)
 {
-    const struct sigaction &host = in_use.found;
-    const bool sent_by_a_program = info->si_code <= 0;
+    const struct sigaction host = in_use.found;
+    const bool sent_by_a_program = is_sent_by_a_program(info);
+    if ((static_cast<unsigned>(host.sa_flags) & SA_RESETHAND) != 0) {
+        in_use.found.sa_handler = SIG_DFL;
+        in_use.found.sa_flags = 0;
+    }
     // unreachable: a process in which the processor's error is ignored ends, as in the default case
     if (host.sa_handler == SIG_IGN && sent_by_a_program) return;
     // unreachable: the same
@@ -57,9 +73,15 @@ void leave_to_host(int signal, siginfo_t *info, void *context)
 void on_bus_error(int signal, siginfo_t *info, void *context)
 {
     if (!is_torn(info)) {
-        leave_to_host(signal, info, context);
+        if (is_sent_by_a_program(info) && is_in_use_here() &&
+            ::sigismember(&in_use.mask, SIGBUS) == 1)
+            in_use.held_back = 1;
+        else
+            leave_to_host(signal, info, context);
         return;
     }
+    // Of a host that locks its memory, what is mapped here counts as more than what it replaces.
+    ::munlock(in_use.begin, in_use.size);
     const void *const zeros = ::mmap(in_use.begin, in_use.size, PROT_READ,
                                      MAP_PRIVATE | MAP_ANONYMOUS | MAP_FIXED, -1, 0);
     in_use.torn = 1;
@@ -79,8 +101,10 @@ public:
     {
         struct sigaction ours;
         ours.sa_sigaction = on_bus_error;
-        ours.sa_flags = SA_SIGINFO | SA_NODEFER | SA_ONSTACK;
+        ours.sa_flags = SA_SIGINFO | SA_NODEFER | SA_ONSTACK | SA_RESTART;
         ::sigemptyset(&ours.sa_mask);
+        ::sigemptyset(&in_use.mask);
+        in_use.held_back = 0;
         struct sigaction found;
         ::sigaction(SIGBUS, &ours, &found);
         // Ours is found where a handler of the host has jumped out of an earlier use.
@@ -89,11 +113,13 @@ public:
         sigset_t bus_errors;  // a blocked one ends the process
         ::sigemptyset(&bus_errors);
         ::sigaddset(&bus_errors, SIGBUS);
-        ::pthread_sigmask(SIG_UNBLOCK, &bus_errors, &m_mask);
+        ::pthread_sigmask(SIG_UNBLOCK, &bus_errors, &in_use.mask);
     }
     ~bus_error_guard()
     {
-        if (::sigismember(&m_mask, SIGBUS) != 0) ::pthread_sigmask(SIG_SETMASK, &m_mask, nullptr);
+        const sigset_t mask = in_use.mask;
+        if (::sigismember(&mask, SIGBUS) != 0) ::pthread_sigmask(SIG_SETMASK, &mask, nullptr);
+        if (in_use.held_back != 0) ::raise(SIGBUS);  // the host finds it pending again
         struct sigaction last;
         ::sigaction(SIGBUS, &in_use.found, &last);
         // What another thread has installed meanwhile is to stay.
@@ -101,9 +127,6 @@ public:
     }
     bus_error_guard(const bus_error_guard &) = delete;
     bus_error_guard &operator=(const bus_error_guard &) = delete;
-
-private:
-    sigset_t m_mask;
 };
 
 // Calls `use` while bus errors in the mapping are caught. Returns false when there was one.
@@ -131,19 +154,20 @@ img_file_time time_of(const std::timespec &time)
 
 constexpr std::uint32_t TMPFS = 0x01021994;
 
-// Returns the kind of a file system whose stamps are of this machine's clock; 0: it may not be one.
+// Returns the kind of a file system whose stamps are of this machine's clock, and where a
+// descriptor and its mapping are of the same file for good; 0: it may not be one. (An overlay is
+// not: a descriptor follows its file into the upper layer, the mapping does not.)
 std::uint32_t local_file_system(int fd)
 {
-    constexpr std::array<std::uint32_t, 10> known{0xEF53,      // ext2, ext3, ext4
-                                                  0x58465342,  // XFS
-                                                  0x9123683E,  // Btrfs
-                                                  0xF2F52010,  // F2FS
-                                                  0xCA451A4E,  // bcachefs
-                                                  0x2FC12FC1,  // ZFS
-                                                  0x794C7630,  // overlay
-                                                  0x73717368,  // squashfs
-                                                  0x9660,      // ISO 9660
-                                                  TMPFS};
+    constexpr std::array<std::uint32_t, 9> known{0xEF53,      // ext2, ext3, ext4
+                                                 0x58465342,  // XFS
+                                                 0x9123683E,  // Btrfs
+                                                 0xF2F52010,  // F2FS
+                                                 0xCA451A4E,  // bcachefs
+                                                 0x2FC12FC1,  // ZFS
+                                                 0x73717368,  // squashfs
+                                                 0x9660,      // ISO 9660
+                                                 TMPFS};
     struct statfs system = {};
     ::fstatfs(fd, &system);
     const auto kind = static_cast<std::uint32_t>(system.f_type);

@@ -137,15 +137,19 @@ std::int32_t transfer_whole(open_file *file, std::uint32_t count, Transfer trans
 
 std::int32_t img_platform_open(const char *filename, std::int32_t oflags, std::int32_t mode)
 {
-    const int flags = system_flags(oflags);
+    int flags = system_flags(oflags);
     if (flags == -1) {
         errno = EINVAL;
         return -1;
     }
     int fd;
-    do {
+    for (;;) {
         fd = ::open(filename, flags, static_cast<mode_t>(mode));
-    } while (fd == -1 && errno == EINTR);
+        if (fd == -1 && errno == EWOULDBLOCK && (flags & O_NONBLOCK) != 0)
+            flags &= ~O_NONBLOCK;  // another program has leased the file: the system asks for it
+        else if (fd != -1 || errno != EINTR)
+            break;
+    }
     if (fd == -1) return -1;
 
     // With a standard stream closed, what the host prints to it would land in the image.

@@ -4,6 +4,7 @@
 #include <cerrno>
 #include <ctime>
 
+#include <fcntl.h>
 #include <sys/stat.h>
 #include <sys/vfs.h>
 #include <unistd.h>
@@ -37,6 +38,10 @@ std::tm *__real_localtime_r(const std::time_t *time, std::tm *local);
 
 int __wrap_open(const char *name, int flags, mode_t mode)
 {
+    if (host.leases_files == 2 || (host.leases_files == 1 && (flags & O_NONBLOCK) != 0)) {
+        errno = EWOULDBLOCK;
+        return -1;
+    }
     const auto open = [=](auto) { return __real_open(name, flags, mode); };
     return static_cast<int>(interruptible(0, open));
 }

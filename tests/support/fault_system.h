@@ -7,6 +7,7 @@
 
 // What the library's calls of the system meet with; the default is nothing.
 struct fault_host {
+    int leases_files = 0;     // 1: who does not wait cannot open one; 2: nobody can
     bool interrupts = false;  // every other call, and the others move three bytes at most
     bool has_no_status = false, has_no_time = false, has_no_local_time = false;
     bool block_devices = false;  // all files are said to be such

@@ -39,25 +39,35 @@ std::int32_t open_by_number(const char *number, std::int32_t oflags, std::int32_
     return img_platform_open(names.at(key).c_str(), oflags, mode);
 }
 
-std::int32_t lend_nothing(std::int32_t /*fd*/, std::int32_t /*offset*/, std::int32_t /*count*/,
-                          img_io_use_fn /*use*/, void * /*arg*/)
+// Room for what is lent: a piece of a walk, and more.
+constexpr std::int32_t LARGEST_COPY = 9 << 20;
+std::unique_ptr<std::uint8_t[]> copy;
+
+// Lends a copy of the bytes, which came with one call. Many short lines would take as many.
+std::int32_t lend_copy(std::int32_t fd, std::int32_t offset, std::int32_t count, img_io_use_fn use,
+                       void *arg)
 {
-    return -1;
+    if (count < 1 || count > LARGEST_COPY ||
+        ::pread(fd, copy.get(), static_cast<std::size_t>(count), offset) != count)
+        return -1;
+    use(arg, copy.get());
+    return 0;
 }
 
-// Returns the number of a new name. "plain" moves bytes with calls alone, as few as possible: pages
-// of a mapping would count as memory of this program.
+// Returns the number of a new name. "plain" moves bytes with calls alone: pages of a mapping would
+// count as memory of this program.
 std::int32_t register_name(const std::string &name)
 {
     static std::int32_t next = 0;
     if (next == 0) {
+        copy = std::make_unique_for_overwrite<std::uint8_t[]>(LARGEST_COPY);
         img_library_init();
         img_message_sink = keep_message;
         for (const char *const method : {"plain", "mapped"})
             img_register_io_method(method, nullptr, open_by_number, img_platform_close,
                                    img_platform_read, img_platform_write, img_platform_seek,
                                    img_platform_unlink, nullptr);
-        img_offer_lending("plain", lend_nothing);
+        img_offer_lending("plain", lend_copy);
         img_offer_lending("mapped", img_platform_lend);
     }
     names[next] = name;

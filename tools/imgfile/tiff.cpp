@@ -199,22 +199,34 @@ private:
         return m_lines[at];
     }
 
-    // Leave the line in m_piece. libtiff would take the whole strip into memory for it.
-    void read_plain_line(std::int64_t line, std::uint16_t plane)
+    // Leaves as many lines of one strip in m_piece as one call reads, up to `most`, and returns how
+    // many. libtiff would take the whole strip into memory for it.
+    std::int32_t read_plain_lines(std::int64_t line, std::int32_t most, std::int64_t line_length,
+                                  std::uint16_t plane)
     {
+        constexpr std::int64_t at_once = std::int64_t{1} << 20U;  // bytes
         TIFF *const file = m_file.get();
+        const std::int64_t before = line % m_strip_nlines;
+        const std::int64_t count = std::min<std::int64_t>(
+            {most, m_strip_nlines - before, std::max<std::int64_t>(at_once / line_length, 1)});
+        m_piece.resize(static_cast<std::size_t>(count * line_length));
         const std::uint32_t strip = TIFFComputeStrip(file, static_cast<std::uint32_t>(line), plane);
-        const std::uint64_t from =
-            static_cast<std::uint64_t>(line % m_strip_nlines) * m_piece.size();
+        const auto from = static_cast<std::uint64_t>(before * line_length);
+        const std::uint64_t stored = TIFFGetStrileByteCount(file, strip);
         ssize_t got = 0;
-        if (from + m_piece.size() <= TIFFGetStrileByteCount(file, strip))
-            got = ::pread(TIFFFileno(file), m_piece.data(), m_piece.size(),
-                          static_cast<off_t>(TIFFGetStrileOffset(file, strip) + from));
+        if (from < stored)
+            got = ::pread(
+                TIFFFileno(file), m_piece.data(),
+                static_cast<std::size_t>(std::min<std::uint64_t>(m_piece.size(), stored - from)),
+                static_cast<off_t>(TIFFGetStrileOffset(file, strip) + from));
         if (got == -1) m_message = system_text(errno);
-        if (got != static_cast<ssize_t>(m_piece.size())) fail_at(line, plane);
+        if (got != static_cast<ssize_t>(m_piece.size()))
+            fail_at(line + std::max<ssize_t>(got, 0) / line_length, plane);
         if (TIFFIsByteSwapped(file) != 0 && form.nbytes == 2)
             exchange_bytes(m_piece.data(), m_piece.size() / 2);
+        return static_cast<std::int32_t>(count);
     }
+    // Leaves the line in m_piece.
     void read_line(lines_in_order &from, std::int64_t line)
     {
         const std::int64_t first = line / m_strip_nlines * m_strip_nlines;
@@ -230,14 +242,19 @@ private:
     {
         for_each_plane(bands, [&](std::uint16_t plane, std::int32_t nbands, const band_list &chosen,
                                   std::int32_t position) {
-            for (std::int32_t i = 0; i < part.nlines; ++i) {
+            const std::size_t first = static_cast<std::size_t>(part.samp) * pixel_size(nbands);
+            const std::size_t pitch = static_cast<std::size_t>(form.nsamps) * pixel_size(nbands);
+            for (std::int32_t i = 0; i < part.nlines;) {
                 const std::int64_t line = std::int64_t{part.line} + i;
+                std::int32_t count = 1;
                 if (m_plain)
-                    read_plain_line(line, plane);
+                    count = read_plain_lines(line, part.nlines - i,
+                                             static_cast<std::int64_t>(pitch), plane);
                 else
                     read_line(lines_of(plane, position), line);
-                spread_pixels(&m_piece[static_cast<std::size_t>(part.samp) * pixel_size(nbands)],
-                              nbands, chosen, {i, 0, part.nsamps, position}, to);
+                for (std::int32_t k = 0; k < count; ++k, ++i)
+                    spread_pixels(&m_piece[static_cast<std::size_t>(k) * pitch + first], nbands,
+                                  chosen, {i, 0, part.nsamps, position}, to);
             }
         });
     }
