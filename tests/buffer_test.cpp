@@ -6,9 +6,9 @@
 #include "support/guarded_buffer.h"
 #include "support/random.h"
 #include "support/refusal.h"
+#include "support/sample.h"
 #include "support/stretch_model.h"
 
-#include <cstring>
 #include <utility>
 
 namespace {
@@ -78,18 +78,15 @@ protected:
         m_image =
             in_memory ? create_test_memory(image) : open_test_file(m_name, IMG_OPEN_READ_WRITE);
         m_model = model_image(image);
-        m_nbytes = static_cast<std::size_t>(image.nbytes);
+        m_nbytes = image.nbytes;
     }
     // Where in the room a buffer starts that has `count` samples left to its end.
     std::size_t offset_of(std::int64_t count) const
     {
-        return m_room.size() - static_cast<std::size_t>(count) * m_nbytes;
+        return m_room.size() - static_cast<std::size_t>(count * m_nbytes);
     }
     bool has_room(std::int64_t count) const { return count <= 56; }
-    bool is_addressable(std::int64_t count) const
-    {
-        return count <= INT32_MAX / static_cast<std::int64_t>(m_nbytes);
-    }
+    bool is_addressable(std::int64_t count) const { return count <= INT32_MAX / m_nbytes; }
 
     void check_load(const img_window &at, std::int32_t stride)
     {
@@ -104,7 +101,7 @@ protected:
             const std::int64_t line = at.line + i / stride, samp = at.samp + i % stride;
             if (i % stride >= at.nsamps) continue;
             const std::uint16_t sample = m_model.has(line, samp) ? m_model.at(1, line, samp) : 9;
-            std::memcpy(expected.data() + offset_of(length - i), &sample, m_nbytes);
+            put_sample(expected.data() + offset_of(length - i), m_nbytes, sample);
         }
         EXPECT_EQ(load(m_image, at, 1, m_room.data() + offset_of(length), stride, 9),
                   refused ? -1 : 0);
@@ -129,7 +126,7 @@ protected:
         if (!has_room(end)) return;  // the library would read all of it
         for (std::uint8_t &byte : m_room) byte = static_cast<std::uint8_t>(m_random.below(256));
         for (const auto &[sample, place] : moved)
-            if (!refused) std::memcpy(sample, m_room.data() + offset_of(end - place), m_nbytes);
+            if (!refused) *sample = get_sample(m_room.data() + offset_of(end - place), m_nbytes);
         EXPECT_EQ(dump(m_image, at, 1, m_room.data() + offset_of(end), stride), refused ? -1 : 0);
         check_load({0, 0, 2, 4}, 4);
     }
@@ -139,7 +136,7 @@ protected:
     random_numbers m_random{6};
     img_handle m_image = -1;
     model_image m_model{{}};
-    std::size_t m_nbytes = 1;
+    std::int32_t m_nbytes = 1;
 };
 
 TEST_F(ExtremeWindows, AreTransferredOrRefused)

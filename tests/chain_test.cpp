@@ -3,6 +3,7 @@
 #include "chain/chain.h"
 #include "support/random.h"
 #include "support/refusal.h"
+#include "support/sample.h"
 #include "support/test_image.h"
 
 #include <cerrno>
@@ -22,13 +23,11 @@ std::ptrdiff_t byte_of(const img_buffer_def &def, std::int32_t i)
 }
 std::uint16_t get(const std::uint8_t *buffer, const img_buffer_def &def, std::int32_t i)
 {
-    std::uint16_t sample = 0;
-    std::memcpy(&sample, buffer + byte_of(def, i), static_cast<std::size_t>(def.nbytes));
-    return sample;
+    return get_sample(buffer + byte_of(def, i), def.nbytes);
 }
 void put(std::uint8_t *buffer, const img_buffer_def &def, std::int32_t i, std::uint32_t sample)
 {
-    std::memcpy(buffer + byte_of(def, i), &sample, static_cast<std::size_t>(def.nbytes));
+    put_sample(buffer + byte_of(def, i), def.nbytes, static_cast<std::uint16_t>(sample));
 }
 
 const img_chain_create_fn fail_to_create = [](auto...) { return 1; };

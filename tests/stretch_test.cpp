@@ -3,9 +3,8 @@
 #include "support/effort.h"
 #include "support/random.h"
 #include "support/refusal.h"
+#include "support/sample.h"
 #include "support/stretch_model.h"
-
-#include <cstring>
 
 namespace {
 
@@ -102,8 +101,7 @@ TEST(StretchOfABuffer, TakesEveryFourthSampleOfEachLineButTheFill)
             if (nbytes == 1) sample &= 0xFF;
             window.push_back(sample);
             const std::int32_t at = (i / nsamps * stride + i % nsamps) * nbytes;
-            std::memcpy(&buffer[static_cast<std::size_t>(at)], &sample,
-                        static_cast<std::size_t>(nbytes));
+            put_sample(&buffer[static_cast<std::size_t>(at)], nbytes, sample);
         }
         const int bits_out = std::min(bits, 8);
         samples lut(std::size_t{1} << bits, UNTOUCHED);

@@ -8,6 +8,7 @@
 #include "support/layout_rules.h"
 #include "support/random.h"
 #include "support/refusal.h"
+#include "support/sample.h"
 
 #include <algorithm>
 #include <fstream>
@@ -194,14 +195,16 @@ private:
     {
         const std::vector<place> places = places_of(at);
         bytes buffer = random_bytes(places.back().byte + 9), expected = buffer;
-        const bytes fill{random_bytes(1)[0], 0};
+        const bytes fill = random_bytes(1);
+        bytes filled(2);
+        put_sample(filled.data(), m_image.nbytes, fill[0]);
         std::int32_t result = transfer(false, m_handle, at, &buffer, fill);
         std::size_t needed = 0;
         for (const auto &[byte, exists, tile, from, end] : places) {
             needed = std::max(needed, end);
             if (exists && from < m_stored.size()) expected[byte] = m_stored[from];
             // Virtual tiles at the edges have no samples for all of their plane.
-            if (!exists) expected[byte] = at.stride != 0 ? fill[byte % nbytes()] : buffer[byte];
+            if (!exists) expected[byte] = at.stride != 0 ? filled[byte % nbytes()] : buffer[byte];
         }
         if (m_where == storage::memory && img_is_tiled(m_desc) && needed > 0) {
             EXPECT_EQ(result, -1);  // quietly

@@ -85,7 +85,7 @@ int __wrap_fstat(int fd, struct stat *status)
 int __wrap_fstatfs(int fd, struct statfs *status)
 {
     const int result = __real_fstatfs(fd, status);
-    status->f_type = host.file_system;
+    status->f_type = static_cast<decltype(status->f_type)>(host.file_system);
     return result;
 }
 
