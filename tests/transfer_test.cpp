@@ -87,7 +87,7 @@ private:
         else if (created)
             m_header = read_file(m_file);
         if (m_where != storage::cached_file || !img_is_tiled(m_desc)) return;
-        bytes plane(img_std_plane_size(m_desc));
+        bytes plane(img_plane_size(m_desc));
         if (img_load_tiles(m_handle, 0, 1, 0, plane.data()) == -1) ++m_failures;
         m_desc->tile_cache->free_entries = m_random.within(1, 4);
     }

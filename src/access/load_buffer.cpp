@@ -1,10 +1,10 @@
 // Reading a window: where its samples come from, the fill around them, and the image's chain.
 #include "access/buffer.h"
+#include "api/fill.h"
 #include "api/img_desc.h"
 #include "api/report.h"
 #include "api/types.h"
 #include "chain/chain.h"
-#include "std/std.h"
 
 #include <algorithm>
 #include <cstring>

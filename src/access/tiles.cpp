@@ -3,7 +3,6 @@
 #include "api/img.h"
 #include "api/img_desc.h"
 #include "api/types.h"
-#include "std/std.h"
 
 namespace {
 
@@ -21,11 +20,19 @@ bool is_a_run_of_tiles(const img_desc *desc, std::int32_t first_tile, std::int32
            std::int64_t{first_tile} + ntiles <= tile_count(desc);
 }
 
+// The cache's way back to the file; note the order of its arguments.
+std::int32_t img_std_write_tile(void *desc, std::int32_t band, std::int32_t tile,
+                                const std::uint8_t *buffer)
+{
+    auto *const image = static_cast<img_desc *>(desc);
+    return img_type_of(image).write_tiles(image, tile, 1, band, buffer);
+}
+
 // Makes the image's cache at its first use. A budget that is too small is not tried again.
 void make_cache(img_desc *desc)
 {
     if (desc->cache_pending == 0 || desc->cache_mb <= 0) return;
-    desc->tile_cache = img_tile_cache_create(static_cast<std::int32_t>(img_std_plane_size(desc)),
+    desc->tile_cache = img_tile_cache_create(static_cast<std::int32_t>(img_plane_size(desc)),
                                              static_cast<std::int32_t>(tile_count(desc)),
                                              desc->nbands, desc->cache_mb);
     img_tile_cache_set_write_back(desc->tile_cache, img_std_write_tile, desc);

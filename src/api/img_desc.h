@@ -58,6 +58,23 @@ inline bool img_is_tiled(const img_desc *desc)
     return desc->tile_nsamps != 0 && desc->tile_nlines != 0;
 }
 
+// Tiles that it takes to hold `extent` lines or samples, the last one perhaps in part.
+inline std::int32_t img_whole_tiles(std::int32_t extent, std::int32_t tile_extent)
+{
+    return extent / tile_extent + (extent % tile_extent != 0 ? 1 : 0);
+}
+
+// Samples, and bytes, of one tile plane, in every layout.
+inline std::size_t img_plane_samples(const img_desc *desc)
+{
+    return static_cast<std::size_t>(desc->tile_nlines) *
+           static_cast<std::size_t>(desc->tile_nsamps);
+}
+inline std::size_t img_plane_size(const img_desc *desc)
+{
+    return img_plane_samples(desc) * static_cast<std::size_t>(desc->nbytes);
+}
+
 // IMG_OPEN_READ_ONLY, IMG_OPEN_WRITE_ONLY or IMG_OPEN_READ_WRITE, as the image was opened.
 inline std::int32_t img_access_mode(const img_desc *desc)
 {

@@ -2,10 +2,12 @@
 
 #include <algorithm>
 #include <array>
+#include <atomic>
 #include <bit>
 #include <csignal>
 #include <ctime>
 
+#include <poll.h>
 #include <pthread.h>
 #include <sys/mman.h>
 #include <sys/stat.h>
@@ -16,14 +18,18 @@ namespace {
 
 // The mapping whose bytes are in use, or were last, and by whom.
 struct {
-    pthread_t thread;
+    std::atomic<pthread_t> thread;  // 0: nobody uses it
+    // For that thread alone:
     std::uint8_t *begin;
-    std::size_t size;                      // 0: nobody uses it
-    struct sigaction found;                // what the host does about bus errors
-    sigset_t mask;                         // which signals it blocks
+    std::size_t size;
+    sigset_t mask;                         // which signals the host blocks
     volatile std::sig_atomic_t torn;       // 1: some of the bytes were not there
-    volatile std::sig_atomic_t held_back;  // 1: a signal came that the host blocks
+    volatile std::sig_atomic_t held_back;  // 1: a signal came that is to come later
+    // For all threads:
+    struct sigaction found;        // what the host does about bus errors
+    std::atomic<bool> knows_host;  // false: `found` is about to be filled
 } in_use;
+static_assert(decltype(in_use.thread)::is_always_lock_free, "a signal handler takes no locks");
 
 bool is_sent_by_a_program(const siginfo_t *info)
 {
@@ -32,32 +38,46 @@ bool is_sent_by_a_program(const siginfo_t *info)
 
 bool is_in_use_here()
 {
-    return in_use.size != 0 && ::pthread_equal(::pthread_self(), in_use.thread) != 0;
+    return in_use.thread.load(std::memory_order_relaxed) == ::pthread_self();
 }
 
 // True when an error is a read of the mapping by the thread that uses it.
 bool is_torn(const siginfo_t *info)
 {
-    const auto *const address = static_cast<const std::uint8_t *>(info->si_addr);
-    return !is_sent_by_a_program(info) && is_in_use_here() && address >= in_use.begin &&
-           address < in_use.begin + in_use.size;
+    if (is_sent_by_a_program(info) || !is_in_use_here()) return false;
+    const auto address = reinterpret_cast<std::uintptr_t>(info->si_addr);
+    const auto begin = reinterpret_cast<std::uintptr_t>(in_use.begin);
+    return address >= begin && address - begin < in_use.size;
+}
+
+bool knows_host()
+{
+    return in_use.knows_host.load(std::memory_order_acquire);
+}
+
+// True for a signal that finds this thread where it must not leave it to the host yet.
+bool is_too_early(const siginfo_t *info)
+{
+    return is_sent_by_a_program(info) && is_in_use_here() &&
+           (!knows_host() || ::sigismember(&in_use.mask, SIGBUS) == 1);
 }
 
 // Does what would have happened without this library.
 void leave_to_host(int signal, siginfo_t *info, void *context)
 {
+    while (!knows_host()) ::poll(nullptr, 0, 1);  // another thread is about to
     const struct sigaction host = in_use.found;
     const bool sent_by_a_program = is_sent_by_a_program(info);
     if ((static_cast<unsigned>(host.sa_flags) & SA_RESETHAND) != 0) {
         in_use.found.sa_handler = SIG_DFL;
         in_use.found.sa_flags = 0;
     }
-    // unreachable: a process in which the processor's error is ignored ends, as in the default case
+    // uncounted: a process in which the processor's error is ignored ends, as in the default case
     if (host.sa_handler == SIG_IGN && sent_by_a_program) return;
-    // unreachable: the same
+    // uncounted: the same
     if (host.sa_handler == SIG_DFL || host.sa_handler == SIG_IGN) {
         ::sigaction(signal, &host, nullptr);
-        // unreachable: the same
+        // uncounted: the same
         if (sent_by_a_program) ::raise(signal);  // the processor's comes again by itself
     } else if ((host.sa_flags & SA_SIGINFO) != 0) {
         host.sa_sigaction(signal, info, context);
@@ -73,8 +93,7 @@ void leave_to_host(int signal, siginfo_t *info, void *context)
 void on_bus_error(int signal, siginfo_t *info, void *context)
 {
     if (!is_torn(info)) {
-        if (is_sent_by_a_program(info) && is_in_use_here() &&
-            ::sigismember(&in_use.mask, SIGBUS) == 1)
+        if (is_too_early(info))
             in_use.held_back = 1;
         else
             leave_to_host(signal, info, context);
@@ -105,10 +124,12 @@ public:
         ::sigemptyset(&ours.sa_mask);
         ::sigemptyset(&in_use.mask);
         in_use.held_back = 0;
+        in_use.knows_host.store(false, std::memory_order_release);
         struct sigaction found;
         ::sigaction(SIGBUS, &ours, &found);
         // Ours is found where a handler of the host has jumped out of an earlier use.
         if (!is_ours(found)) in_use.found = found;
+        in_use.knows_host.store(true, std::memory_order_release);
 
         sigset_t bus_errors;  // a blocked one ends the process
         ::sigemptyset(&bus_errors);
@@ -133,15 +154,15 @@ public:
 bool use_guarded(std::uint8_t *mapping, std::size_t size, std::int32_t offset, img_io_use_fn use,
                  void *arg)
 {
-    in_use.thread = ::pthread_self();
     in_use.begin = mapping;
     in_use.size = size;
     in_use.torn = 0;
+    in_use.thread.store(::pthread_self(), std::memory_order_relaxed);
     {
         const bus_error_guard guard;
         use(arg, mapping + offset);
     }
-    in_use.size = 0;
+    in_use.thread.store(0, std::memory_order_relaxed);
     return in_use.torn == 0;
 }
 

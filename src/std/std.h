@@ -79,6 +79,10 @@ std::int32_t img_std_update_veof(img_desc *desc);
 std::int32_t img_std_read_at(img_desc *desc, std::int64_t offset, void *buffer, std::int32_t count);
 std::int32_t img_std_write_at(img_desc *desc, std::int64_t offset, const void *buffer,
                               std::int32_t count);
+// Returns where the `count` bytes at `offset` of an image in memory are to be written, and raises
+// veof to the last of them; null when they do not lie inside.
+std::uint8_t *img_std_memory_to_write(const img_desc *desc, std::int64_t offset,
+                                      std::int32_t count);
 // Calls `use` with the `count` bytes at `offset` where they lie: in memory, or in a file whose
 // access method lends them. Returns true when all of them are there. Else what `use` did, if it
 // was called, is worth nothing, and the bytes are to be asked for one transfer at a time.
@@ -127,9 +131,6 @@ struct img_std_rows {
 // samples lie side by side.
 void img_std_copy_rows(const img_std_rows &from, std::uint8_t *to, std::size_t to_pitch,
                        std::size_t nrows, std::size_t nsamps, std::int32_t nbytes, bool exchange);
-// Writes `count` copies of the sample at `value`.
-void img_fill_samples(std::uint8_t *buffer, std::size_t count, std::int32_t nbytes,
-                      const std::uint8_t *value);
 
 // --- Regions of one band ---
 //
@@ -201,18 +202,6 @@ std::int32_t img_std_read_virtual_tiles(img_desc *desc, std::int32_t first_tile,
 std::int32_t img_std_write_virtual_tiles(img_desc *desc, std::int32_t first_tile,
                                          std::int32_t ntiles, std::int32_t band,
                                          const std::uint8_t *buffer);
-// Writes one tile back on behalf of the tile cache; note the order of its arguments.
-std::int32_t img_std_write_tile(void *desc, std::int32_t band, std::int32_t tile,
-                                const std::uint8_t *buffer);
-
-// Tiles that it takes to hold `extent` lines or samples, the last one perhaps in part.
-inline std::int32_t img_whole_tiles(std::int32_t extent, std::int32_t tile_extent)
-{
-    return extent / tile_extent + (extent % tile_extent != 0 ? 1 : 0);
-}
-
-// Bytes of one tile plane, in every layout.
-std::size_t img_std_plane_size(const img_desc *desc);
 
 // How the samples of a band lie in a stored tile: byte of the first, bytes from one to the next.
 struct img_std_plane {

@@ -3,6 +3,7 @@
 #include "io/io_method.h"
 #include "std/std.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <limits>
 #include <new>
@@ -357,6 +358,15 @@ std::int32_t img_std_write_at(img_desc *desc, std::int64_t offset, const void *b
     if (written == count) return updated == 0 ? written : -1;
     errno = error;
     return written;
+}
+
+std::uint8_t *img_std_memory_to_write(const img_desc *desc, std::int64_t offset, std::int32_t count)
+{
+    img_std_file *const file = desc->std_file;
+    const std::int64_t last = offset + count - 1;
+    if (last > file->veof_max) return nullptr;
+    file->veof = std::max(file->veof, static_cast<std::int32_t>(last));
+    return desc->mem_image.get() + offset;
 }
 
 bool img_std_lend(const img_desc *desc, std::int64_t offset, std::int64_t count, img_io_use_fn use,

@@ -65,6 +65,19 @@ std::int32_t write_interleaved_line(img_desc *desc, std::int64_t at, std::int32_
     return result;
 }
 
+std::int32_t write_lines_in_memory(const img_desc *desc, std::int32_t line, std::int32_t samp,
+                                   std::int32_t nlines, std::int32_t nsamps, std::int32_t band,
+                                   const std::uint8_t *buffer, std::int32_t stride, bool exchange)
+{
+    for (std::int32_t i = 0; i < nlines; ++i) {
+        const std::int64_t offset = img_std_line_offset(desc, std::int64_t{line} + i, samp, band);
+        std::uint8_t *const to = img_std_memory_to_write(desc, offset, desc->nbytes * nsamps);
+        if (to == nullptr) return img_fail("img_write_nontiled: Write past virtual eof!!\n");
+        copy_row(desc, buffer + row_start(desc, i, stride), to, nsamps, exchange);
+    }
+    return 0;
+}
+
 // How many lines of a region one call may write: all, or as many as fit the processor's cache where
 // they have to be gathered first, when they lie side by side in the file and nobody counts the
 // calls.
@@ -72,8 +85,7 @@ std::int32_t lines_at_once(const img_desc *desc, std::int32_t nlines, std::int32
                            bool gathered)
 {
     constexpr std::int32_t cached_bytes = 1 << 18;
-    if (desc->mem_image || !img_std_joins_calls(desc) || nsamps != desc->std_file->padded_nsamps)
-        return 1;
+    if (!img_std_joins_calls(desc) || nsamps != desc->std_file->padded_nsamps) return 1;
     return gathered ? std::clamp(cached_bytes / (desc->nbytes * nsamps), 1, nlines) : nlines;
 }
 
@@ -188,47 +200,39 @@ std::int32_t img_std_write_lines(img_desc *desc, std::int32_t line, std::int32_t
                                  const std::uint8_t *buffer, std::int32_t stride, bool exchange)
 {
     if (nlines < 1) return 0;
+    if (desc->mem_image)
+        return write_lines_in_memory(desc, line, samp, nlines, nsamps, band, buffer, stride,
+                                     exchange);
     // The caller's rows are not to be modified.
     const bool has_gaps = stride != nsamps;
     std::int32_t count = lines_at_once(desc, nlines, nsamps, exchange || has_gaps);
-    const bool gathers = !desc->mem_image && (exchange || (has_gaps && count > 1));
-    const img_scratch gathered = gathers ? room_for_rows(desc, nsamps, &count) : img_scratch();
-    if (exchange && gathers && !gathered) return img_fail_errno("img_std_write_nontiled:malloc");
+    img_scratch gathered;
+    if (exchange || (has_gaps && count > 1)) gathered = room_for_rows(desc, nsamps, &count);
+    if (exchange && !gathered) return img_fail_errno("img_std_write_nontiled:malloc");
 
-    img_std_file *const file = desc->std_file;
     const std::int32_t row_length = desc->nbytes * nsamps;
     for (std::int32_t i = 0; i < nlines;) {
         count = std::min(count, nlines - i);
-        const std::int64_t offset = img_std_line_offset(desc, std::int64_t{line} + i, samp, band);
         const std::uint8_t *rows = buffer + row_start(desc, i, stride);
-        if (desc->mem_image) {
-            const std::int64_t last = offset + row_length - 1;
-            if (last > file->veof_max)
-                return img_fail("img_write_nontiled: Write past virtual eof!!\n");
-            copy_row(desc, rows, desc->mem_image.get() + offset, nsamps, exchange);
-            file->veof = std::max(file->veof, static_cast<std::int32_t>(last));
-            ++i;
-            continue;
-        }
         if (gathered) {
             img_std_copy_rows({rows, bytes_of(desc, stride), bytes_of(desc, 1)}, gathered.get(),
                               bytes_of(desc, nsamps), static_cast<std::size_t>(count),
                               static_cast<std::size_t>(nsamps), desc->nbytes, exchange);
             rows = gathered.get();
         }
+        const std::int64_t offset = img_std_line_offset(desc, std::int64_t{line} + i, samp, band);
         const std::int32_t written = img_std_write_at(desc, offset, rows, count * row_length);
         if (written == count * row_length) {
             i += count;
-        } else if (count >
-                   1) {  // once more, line by line from the first that was not written whole
-            i += std::max(written, 0) / row_length;
-            count = 1;
-        } else if (written == -1) {
-            return img_fail_errno("img_std_write_nontiled:write");
-        } else {
-            return img_fail("img_std_write_nontiled: %d of %d bytes written!!\n", written,
-                            row_length);
+            continue;
         }
+        if (count == 1)
+            return written == -1 ? img_fail_errno("img_std_write_nontiled:write")
+                                 : img_fail("img_std_write_nontiled: %d of %d bytes written!!\n",
+                                            written, row_length);
+        // Once more, line by line from the first that was not written whole.
+        i += std::max(written, 0) / row_length;
+        count = 1;
     }
     return 0;
 }
@@ -248,7 +252,6 @@ std::int32_t img_std_write_nontiled_interleaved(img_desc *desc, std::int32_t lin
                                                 const std::uint8_t *buffer, std::int32_t stride,
                                                 const std::uint8_t * /*fill*/)
 {
-    img_std_file *const file = desc->std_file;
     const std::size_t pixel_length = bytes_of(desc, desc->nbands);
     const std::int32_t row_length = desc->nbands * desc->nbytes * nsamps;
     for (std::int32_t i = 0; i < nlines; ++i) {
@@ -256,13 +259,12 @@ std::int32_t img_std_write_nontiled_interleaved(img_desc *desc, std::int32_t lin
         const std::int64_t at = offset + std::int64_t{band} * desc->nbytes;
         const std::uint8_t *const row = buffer + row_start(desc, i, stride);
         if (desc->mem_image) {
-            const std::int64_t last = offset + row_length - 1;
-            if (last > file->veof_max)
+            std::uint8_t *const pixels = img_std_memory_to_write(desc, offset, row_length);
+            if (pixels == nullptr)
                 return img_fail("img_std_write_nontiled_interleaved: Write past virtual eof!!\n");
-            img_std_copy_samples(row, bytes_of(desc, 1), desc->mem_image.get() + at, pixel_length,
-                                 static_cast<std::size_t>(nsamps), desc->nbytes,
+            img_std_copy_samples(row, bytes_of(desc, 1), pixels + bytes_of(desc, band),
+                                 pixel_length, static_cast<std::size_t>(nsamps), desc->nbytes,
                                  img_std_exchanges_bytes(desc));
-            file->veof = std::max(file->veof, static_cast<std::int32_t>(last));
         } else if (write_interleaved_line(desc, at, nsamps, row) == -1) {
             return -1;
         }

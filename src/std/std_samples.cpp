@@ -1,4 +1,4 @@
-// Moving and filling samples, whatever the transfer that needs it.
+// Moving samples, whatever the transfer that needs it.
 #include "api/multiversion.h"
 #include "std/std.h"
 
@@ -79,15 +79,5 @@ void img_std_copy_rows(const img_std_rows &from, std::uint8_t *to, std::size_t t
         if (row + ahead < nrows) prefetch(from.first + (row + ahead) * from.pitch, row_length);
         img_std_copy_samples(from.first + row * from.pitch, from.step, to + row * to_pitch, width,
                              nsamps, nbytes, exchange);
-    }
-}
-
-void img_fill_samples(std::uint8_t *buffer, std::size_t count, std::int32_t nbytes,
-                      const std::uint8_t *value)
-{
-    if (nbytes == 1) {
-        std::memset(buffer, *value, count);
-    } else {
-        copy_spaced<2>(value, 0, buffer, 2, count);
     }
 }

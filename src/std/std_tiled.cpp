@@ -1,4 +1,5 @@
 // Regions of tiled images: one run of whole tiles per row of tiles.
+#include "api/fill.h"
 #include "api/img.h"
 #include "api/img_desc.h"
 #include "api/report.h"
@@ -62,7 +63,7 @@ public:
     }
     std::size_t run_length() const
     {
-        return static_cast<std::size_t>(ntiles()) * img_std_plane_size(m_desc);
+        return static_cast<std::size_t>(ntiles()) * img_plane_size(m_desc);
     }
     std::int32_t tile_rows() const { return m_lines.ntiles(); }
     std::int32_t ntiles() const { return m_samps.ntiles(); }
@@ -93,8 +94,8 @@ public:
                 .nlines = extent(lines.count),
                 .nsamps = extent(samps.count),
                 .first_sample = first_sample,
-                .run_byte = extent(tile) * img_std_plane_size(m_desc) +
-                            first_sample * extent(m_desc->nbytes),
+                .run_byte =
+                    extent(tile) * img_plane_size(m_desc) + first_sample * extent(m_desc->nbytes),
                 .buffer_byte = extent(lines.place) * buffer_pitch() +
                                extent(samps.place) * extent(m_desc->nbytes),
             });
@@ -167,7 +168,7 @@ bool touches_few_lines(const img_desc *desc, const tiled_region &region, std::in
         img_std_plane_in_tile(desc, band).step == static_cast<std::size_t>(desc->nbytes);
     const auto touched = static_cast<std::size_t>(region.lines_in_tile(row).count);
     return lines_lie_together &&
-           img_std_plane_size(desc) - touched * region.plane_pitch() >= WORTH_A_CALL;
+           img_plane_size(desc) - touched * region.plane_pitch() >= WORTH_A_CALL;
 }
 
 // Writes those lines of a run that the region touches, without the rest of its tiles. Returns
@@ -191,7 +192,7 @@ bool write_touched_lines(img_desc *desc, const tiled_region &region, std::int32_
         if (img_std_write_at(desc, offset, run + skipped, static_cast<std::int32_t>(length)) !=
             static_cast<std::int32_t>(length))
             return false;
-        run += img_std_plane_size(desc);
+        run += img_plane_size(desc);
     }
     return true;
 }
@@ -211,11 +212,27 @@ std::int32_t read_stored_run(img_desc *desc, std::int32_t first_tile, std::int32
         // the file does hold: each tile is asked for by itself.
         for (std::int32_t i = 0; i < ntiles; ++i)
             img_load_tiles(desc->handle, first_tile + i, 1, band,
-                           run + static_cast<std::size_t>(i) * img_std_plane_size(desc));
+                           run + static_cast<std::size_t>(i) * img_plane_size(desc));
     } else {
         img_load_tiles(desc->handle, first_tile, ntiles, band, run);
     }
     return pre_read.result();
+}
+
+// Puts into `run` what is to survive of it under the region, and the fill where the image holds
+// nothing yet. Returns 0, or -1 after a message.
+std::int32_t fetch_run(img_desc *desc, const tiled_region &region, std::int32_t row,
+                       std::int32_t band, const std::uint8_t *fill, bool direct, std::uint8_t *run)
+{
+    const std::int32_t first_tile = region.first_tile(row), ntiles = region.ntiles();
+    const std::size_t samples = img_plane_samples(desc);
+    if (direct && region.covers_run(row)) return 0;
+    if (direct && region.run_length() >= WORTH_A_CALL &&
+        img_std_read_lent_tiles(desc, first_tile, ntiles, band, 0, samples, run))
+        return 0;
+    img_fill_samples(run, samples * static_cast<std::size_t>(ntiles), desc->nbytes,
+                     fill != nullptr ? fill : img_zero_sample.data());
+    return read_stored_run(desc, first_tile, ntiles, band, run);
 }
 
 }  // namespace
@@ -253,28 +270,16 @@ std::int32_t img_std_write_tiled(img_desc *desc, std::int32_t line, std::int32_t
     const tiled_region region(desc, line, samp, nlines, nsamps, stride);
     const img_scratch run = img_take_scratch(region.run_length());
     if (!run) return img_fail_errno("img_std_write_tiled:malloc");
-    const std::size_t plane_samples =
-        img_std_plane_size(desc) / static_cast<std::size_t>(desc->nbytes);
     // Who may not read a tile may not replace it either, even a whole one.
     const bool direct = reaches_stored_tiles(desc) && img_access_mode(desc) == IMG_OPEN_READ_WRITE;
     for (std::int32_t row = 0; row < region.tile_rows(); ++row) {
-        const std::int32_t first_tile = region.first_tile(row);
         if (direct && touches_few_lines(desc, region, row, band) &&
             write_touched_lines(desc, region, row, band, buffer, run.get()))
             continue;
-        const bool is_known =
-            direct && (region.covers_run(row) ||
-                       (region.run_length() >= WORTH_A_CALL &&
-                        img_std_read_lent_tiles(desc, first_tile, region.ntiles(), band, 0,
-                                                plane_samples, run.get())));
-        if (!is_known) {
-            img_fill_samples(run.get(), plane_samples * static_cast<std::size_t>(region.ntiles()),
-                             desc->nbytes, fill != nullptr ? fill : img_zero_sample.data());
-            if (read_stored_run(desc, first_tile, region.ntiles(), band, run.get()) == -1)
-                return -1;
-        }
+        if (fetch_run(desc, region, row, band, fill, direct, run.get()) == -1) return -1;
         lay_over(desc, region, row, buffer, run.get());
-        if (img_dump_tiles(desc->handle, first_tile, region.ntiles(), band, run.get()) == -1)
+        if (img_dump_tiles(desc->handle, region.first_tile(row), region.ntiles(), band,
+                           run.get()) == -1)
             return -1;
     }
     return 0;

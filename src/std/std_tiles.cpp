@@ -39,12 +39,6 @@ bool has_planes_between(const img_desc *desc)
     return desc->layout == IMG_LAYOUT_TILED && desc->nbands > 1;
 }
 
-std::size_t plane_samples(const img_desc *desc)
-{
-    return static_cast<std::size_t>(desc->tile_nlines) *
-           static_cast<std::size_t>(desc->tile_nsamps);
-}
-
 std::int32_t run_bytes(const img_desc *desc, std::int32_t ntiles)
 {
     return ntiles * desc->std_file->tile_size;
@@ -57,7 +51,7 @@ img_scratch new_run(std::int32_t length)
 
 img_scratch new_zero_plane(const img_desc *desc)
 {
-    const std::size_t size = img_std_plane_size(desc);
+    const std::size_t size = img_plane_size(desc);
     img_scratch plane = img_take_scratch(size);
     if (plane) std::memset(plane.get(), 0, size);
     return plane;
@@ -95,13 +89,10 @@ std::int32_t read_bytes(img_desc *desc, std::int64_t offset, std::uint8_t *buffe
 std::int32_t write_bytes(img_desc *desc, std::int64_t offset, const std::uint8_t *buffer,
                          std::int32_t length, bool per_tile)
 {
-    img_std_file *const file = desc->std_file;
     if (desc->mem_image) {
-        const std::int64_t last = offset + length - 1;
-        if (last > file->veof_max)
-            return img_fail("img_std_write_tiles: write past virtual eof!!\n");
-        std::memcpy(desc->mem_image.get() + offset, buffer, static_cast<std::size_t>(length));
-        file->veof = std::max(file->veof, static_cast<std::int32_t>(last));
+        std::uint8_t *const to = img_std_memory_to_write(desc, offset, length);
+        if (to == nullptr) return img_fail("img_std_write_tiles: write past virtual eof!!\n");
+        std::memcpy(to, buffer, static_cast<std::size_t>(length));
         return 0;
     }
     const std::int32_t written = img_std_write_at(desc, offset, buffer, length);
@@ -177,7 +168,7 @@ std::int32_t read_interleaved(img_desc *desc, std::int32_t first_tile, std::int3
         split_tile_into_cache(desc, pixels, tile, band, buffer);
         pixels += tile_size;
         left -= tile_size;
-        buffer += img_std_plane_size(desc);
+        buffer += img_plane_size(desc);
     }
     if (got == length) return 0;
     std::array<std::uint8_t *, 3> planes{};  // the tile in which the file ends
@@ -219,8 +210,7 @@ std::int32_t write_interleaved(img_desc *desc, std::int32_t first_tile, std::int
     for (std::int32_t i = 0; i < ntiles; ++i) {
         const auto at = static_cast<std::size_t>(i);
         const auto tile_size = static_cast<std::size_t>(desc->std_file->tile_size);
-        if (merge_with_other_bands(desc, first_tile + i, band,
-                                   buffer + at * img_std_plane_size(desc),
+        if (merge_with_other_bands(desc, first_tile + i, band, buffer + at * img_plane_size(desc),
                                    run.get() + at * tile_size) == -1)
             return -1;
     }
@@ -238,6 +228,19 @@ virtual_tile virtual_tile_at(const img_desc *desc, std::int32_t tile)
     const std::int32_t samp = desc->tile_nsamps * (tile % desc->std_file->tiles_across);
     return {line, samp, std::min(desc->tile_nlines, desc->nlines - line),
             std::min(desc->tile_nsamps, desc->nsamps - samp)};
+}
+
+// Calls `move(part, first_byte)` for each tile of a run, until one answers other than 0.
+template <typename Move>
+std::int32_t move_virtual_tiles(const img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,
+                                Move move)
+{
+    for (std::int32_t i = 0; i < ntiles; ++i) {
+        const std::int32_t result = move(virtual_tile_at(desc, first_tile + i),
+                                         static_cast<std::size_t>(i) * img_plane_size(desc));
+        if (result != 0) return result;
+    }
+    return 0;
 }
 
 }  // namespace
@@ -263,11 +266,6 @@ std::int32_t img_std_pre_read::result() const
     return img_fail_errno("img_std_read_tiles:read");
 }
 
-std::size_t img_std_plane_size(const img_desc *desc)
-{
-    return plane_samples(desc) * static_cast<std::size_t>(desc->nbytes);
-}
-
 img_std_plane img_std_plane_in_tile(const img_desc *desc, std::int32_t band)
 {
     const auto width = static_cast<std::size_t>(desc->nbytes);
@@ -289,7 +287,7 @@ bool img_std_read_lent_tiles(const img_desc *desc, std::int32_t first_tile, std:
         img_std_copy_rows({bytes + plane.first + first_sample * plane.step,
                            static_cast<std::size_t>(next - begin), plane.step},
                           buffer + first_sample * static_cast<std::size_t>(desc->nbytes),
-                          img_std_plane_size(desc), static_cast<std::size_t>(ntiles), nsamps,
+                          img_plane_size(desc), static_cast<std::size_t>(ntiles), nsamps,
                           desc->nbytes, false);
     });
 }
@@ -303,7 +301,7 @@ std::int32_t img_std_read_tiles(img_desc *desc, std::int32_t first_tile, std::in
     // A read of one band of interleaved tiles leaves the others in the cache.
     const bool for_cache = is_interleaved(desc) && desc->tile_cache != nullptr;
     if (!for_cache &&
-        img_std_read_lent_tiles(desc, first_tile, ntiles, band, 0, plane_samples(desc), buffer))
+        img_std_read_lent_tiles(desc, first_tile, ntiles, band, 0, img_plane_samples(desc), buffer))
         return 0;
     if (is_interleaved(desc)) return read_interleaved(desc, first_tile, ntiles, band, buffer);
 
@@ -342,37 +340,22 @@ std::int32_t img_std_read_virtual_tiles(img_desc *desc, std::int32_t first_tile,
                                         std::int32_t ntiles, std::int32_t band,
                                         std::uint8_t *buffer)
 {
-    for (std::int32_t tile = first_tile; tile < first_tile + ntiles; ++tile) {
-        const virtual_tile part = virtual_tile_at(desc, tile);
-        const std::int32_t result =
-            img_std_read_lines(desc, part.line, part.samp, part.nlines, part.nsamps, band, buffer,
-                               desc->tile_nsamps, false);
-        if (result != 0) return result;
-        buffer += img_std_plane_size(desc);
-    }
-    return 0;
+    return move_virtual_tiles(
+        desc, first_tile, ntiles, [=](const virtual_tile &part, std::size_t at) {
+            return img_std_read_lines(desc, part.line, part.samp, part.nlines, part.nsamps, band,
+                                      buffer + at, desc->tile_nsamps, false);
+        });
 }
 
 std::int32_t img_std_write_virtual_tiles(img_desc *desc, std::int32_t first_tile,
                                          std::int32_t ntiles, std::int32_t band,
                                          const std::uint8_t *buffer)
 {
-    for (std::int32_t tile = first_tile; tile < first_tile + ntiles; ++tile) {
-        const virtual_tile part = virtual_tile_at(desc, tile);
-        const std::int32_t result =
-            img_std_write_lines(desc, part.line, part.samp, part.nlines, part.nsamps, band, buffer,
-                                desc->tile_nsamps, false);
-        if (result != 0) return result;
-        buffer += img_std_plane_size(desc);
-    }
-    return 0;
-}
-
-std::int32_t img_std_write_tile(void *desc, std::int32_t band, std::int32_t tile,
-                                const std::uint8_t *buffer)
-{
-    auto *const image = static_cast<img_desc *>(desc);
-    return img_type_of(image).write_tiles(image, tile, 1, band, buffer);
+    return move_virtual_tiles(
+        desc, first_tile, ntiles, [=](const virtual_tile &part, std::size_t at) {
+            return img_std_write_lines(desc, part.line, part.samp, part.nlines, part.nsamps, band,
+                                       buffer + at, desc->tile_nsamps, false);
+        });
 }
 
 void img_std_split_tile(const std::uint8_t *tile, std::int32_t tile_nsamps,

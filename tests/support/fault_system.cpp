@@ -2,7 +2,9 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <csignal>
 #include <ctime>
+#include <utility>
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -34,6 +36,7 @@ int __real_fstat(int fd, struct stat *status);
 int __real_fstatfs(int fd, struct statfs *status);
 int __real_clock_gettime(clockid_t clock, std::timespec *now);
 std::time_t __real_time(std::time_t *now);
+int __real_sigaction(int signal, const struct sigaction *action, struct sigaction *found);
 std::tm *__real_localtime_r(const std::time_t *time, std::tm *local);
 
 int __wrap_open(const char *name, int flags, mode_t mode)
@@ -100,6 +103,13 @@ int __wrap_clock_gettime(clockid_t clock, std::timespec *now)
 std::time_t __wrap_time(std::time_t *now)
 {
     return host.has_no_time ? -1 : __real_time(now);
+}
+
+int __wrap_sigaction(int signal, const struct sigaction *action, struct sigaction *found)
+{
+    const int result = __real_sigaction(signal, action, found);
+    if (host.after_sigaction) std::exchange(host.after_sigaction, nullptr)();
+    return result;
 }
 
 std::tm *__wrap_localtime_r(const std::time_t *time, std::tm *local)

@@ -3,6 +3,7 @@
 #define IMG_TEST_FAULT_SYSTEM_H
 
 #include <csignal>
+#include <functional>
 #include <sys/resource.h>
 
 // What the library's calls of the system meet with; the default is nothing.
@@ -19,7 +20,8 @@ struct fault_host {
     bool half_done = false;    // that one moves half of what it should
     int last_words = 0;        // what the process returns then
     int seconds_later = 1;     // than it is: what others wrote a moment ago counts as old
-    long stamp = 0, now = 0;   // of all files, and of the clock, in nanoseconds; 0: as it is
+    std::function<void()> after_sigaction = nullptr;  // called once
+    long stamp = 0, now = 0;  // of all files, and of the clock, in nanoseconds; 0: as it is
 };
 inline fault_host host;
 

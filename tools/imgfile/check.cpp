@@ -13,7 +13,10 @@
 
 namespace {
 
-constexpr std::size_t IMAGE_BLOCK = 112;  // where the library places it
+// Where the library places the image block, and how far behind it the pixels.
+constexpr std::size_t IMAGE_BLOCK = sizeof(img_vitec_file_block) + IMG_VITEC_RESERVED;
+constexpr std::int32_t IMAGE_BLOCK_LINK = IMAGE_BLOCK - 4;
+constexpr std::int32_t HEADER_LENGTH = IMG_VITEC_DATA_OFFSET - std::int32_t{IMAGE_BLOCK};
 
 class findings {
 public:
@@ -49,14 +52,16 @@ void check_date(const vitec_header &header, findings &found)
 // Bytes of a file that begins as the library writes it.
 void check_reserved_bytes(const std::string &name, findings &found)
 {
-    std::array<std::uint8_t, 244> start{};
+    std::array<std::uint8_t, IMG_VITEC_DATA_OFFSET> start{};
     std::ifstream(name, std::ios::binary)
         .read(reinterpret_cast<char *>(start.data()), std::ssize(start));
-    for (const auto &[from, end] : {std::pair<std::size_t, std::size_t>{8, 16},
-                                    {22, 32},
-                                    {38, IMAGE_BLOCK},
-                                    {IMAGE_BLOCK + 28, IMAGE_BLOCK + 36},
-                                    {IMAGE_BLOCK + 64, start.size()}})
+    for (const auto &[from, end] :
+         {std::pair<std::size_t, std::size_t>{IMG_VITEC_AT_IMAGE_BLOCK_LINK + 4,
+                                              IMG_VITEC_FILE_WORDS_END},
+          {IMG_VITEC_AT_CREATE_DATE + 6, IMG_VITEC_AT_SIGNATURE},
+          {IMG_VITEC_AT_SIGNATURE + 6, IMAGE_BLOCK},
+          {IMAGE_BLOCK + IMG_VITEC_AT_VERSION + 4, IMAGE_BLOCK + IMG_VITEC_AT_NSAMPS},
+          {IMAGE_BLOCK + IMG_VITEC_AT_NBYTES_CODE + 4, start.size()}})
         if (!is_all_zero(&start.at(from), end - from))
             found.add(text("bytes ", from, " to ", end - 1, ", which are reserved, are not 0"));
 }
@@ -65,7 +70,7 @@ void check_tile_sizes(std::int32_t tile_nlines, std::int32_t tile_nsamps, findin
 {
     for (const auto &[field, size] :
          {std::pair{"tile_nlines", tile_nlines}, {"tile_nsamps", tile_nsamps}})
-        if (size < 0 || (size != 0 && (size < 8 || size > 32768 || (size & (size - 1)) != 0)))
+        if (size != 0 && !is_vitec_tile_side(size))
             found.add(text(field, " is ", size, ", neither 0 nor a power of two from 8 to 32768"));
     if ((tile_nlines == 0) != (tile_nsamps == 0))
         found.add("only one of tile_nlines and tile_nsamps is 0: the image is untiled, but padded");
@@ -75,13 +80,14 @@ void check_tile_sizes(std::int32_t tile_nlines, std::int32_t tile_nsamps, findin
 void check_vitec_header(const std::string &file, const vitec_header &header, findings &found)
 {
     const auto field = [&header](std::size_t at) { return header.word(at); };
-    found.expect("image_block_link", header.file_word(IMG_VITEC_AT_IMAGE_BLOCK_LINK), 108);
+    found.expect("image_block_link", header.file_word(IMG_VITEC_AT_IMAGE_BLOCK_LINK),
+                 IMAGE_BLOCK_LINK);
     if (std::memcmp(&header.file.bytes[IMG_VITEC_AT_SIGNATURE], "VITec", 6) != 0)
         found.add("signature is not VITec");
     check_date(header, found);
     found.expect("version", field(IMG_VITEC_AT_VERSION), std::int32_t{IMG_VITEC_VERSION});
-    found.expect("header_length", field(IMG_VITEC_AT_HEADER_LENGTH), 132);
-    if (header.image_block_at == IMAGE_BLOCK && field(IMG_VITEC_AT_HEADER_LENGTH) == 132)
+    found.expect("header_length", field(IMG_VITEC_AT_HEADER_LENGTH), HEADER_LENGTH);
+    if (header.image_block_at == IMAGE_BLOCK && field(IMG_VITEC_AT_HEADER_LENGTH) == HEADER_LENGTH)
         check_reserved_bytes(file, found);
 
     const std::int32_t nlines = field(IMG_VITEC_AT_NLINES), nsamps = field(IMG_VITEC_AT_NSAMPS);

@@ -4,10 +4,14 @@
 #include "image.h"
 #include "output.h"
 
+#include "formats/helava.h"
+#include "formats/vitec.h"
+
 #include <algorithm>
 #include <array>
 #include <cerrno>
 #include <cstdlib>
+#include <cstring>
 #include <filesystem>
 
 #include <fcntl.h>
@@ -140,6 +144,13 @@ file_format format_of_output(const std::string &name, const std::string &wanted,
 
 namespace {
 
+bool is_word(const std::string &bytes, std::uint32_t magic, std::uint32_t swapped_magic)
+{
+    std::uint32_t word = 0;
+    if (bytes.size() == sizeof word) std::memcpy(&word, bytes.data(), sizeof word);
+    return word == magic || word == swapped_magic;
+}
+
 std::unique_ptr<image_reader> open_by_first_bytes(const std::string &name)
 {
     descriptor file(open_to_read(name));
@@ -147,9 +158,8 @@ std::unique_ptr<image_reader> open_by_first_bytes(const std::string &name)
     const std::string start = bytes_at(file, 0, 4);
     // Samples of a Helava file come first, and may look like the beginning of anything.
     const std::string end = bytes_at(file, ::lseek(file, 0, SEEK_END) - 4, 4);
-    const bool is_native = start == std::string("\x00\x5B\x07\x20", 4) ||
-                           start == std::string("\x20\x07\x5B\x00", 4) ||
-                           end == "\x48\x41\x14\x84" || end == "\x84\x14\x41\x48";
+    const bool is_native = is_word(start, IMG_VITEC_MAGIC, IMG_VITEC_SWAPPED_MAGIC) ||
+                           is_word(end, IMG_HELAVA_MAGIC, IMG_HELAVA_SWAPPED_MAGIC);
     ::lseek(file, 0, SEEK_SET);
     if (start.empty()) throw failure(shown, "is empty");
     if (!is_native) {

@@ -63,6 +63,11 @@ std::string vitec_header::date() const
     return date;
 }
 
+bool is_vitec_tile_side(std::int32_t side)
+{
+    return side >= 8 && side <= 32768 && std::has_single_bit(static_cast<std::uint32_t>(side));
+}
+
 std::optional<vitec_header> read_vitec_header(const std::string &name)
 {
     std::ifstream file = open_file(name);

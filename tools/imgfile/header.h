@@ -28,6 +28,9 @@ struct helava_trailer {
     std::int32_t nbands, nsamps, nlines;
 };
 
+// Whether tiles of a VITec file may be so many lines high, or samples wide.
+bool is_vitec_tile_side(std::int32_t side);
+
 // Return nothing when the file does not have the magic word, or ends before the header does; throw
 // `failure` when it cannot be opened.
 std::optional<vitec_header> read_vitec_header(const std::string &name);

@@ -200,7 +200,7 @@ std::int64_t padded(std::int32_t extent, std::int32_t tile_extent)
 
 void check_tile_side(const std::string &name, std::int32_t side)
 {
-    if (side < 8 || side > 32768 || (side & (side - 1)) != 0)
+    if (!is_vitec_tile_side(side))
         throw failure(name, "tiles of VITec files are powers of two from 8 to 32768 high and wide");
 }
 
@@ -241,7 +241,7 @@ native_image::native_image(const std::string &path) : m_name(register_name(path)
 {
     check_is_readable(path);
     m_handle = img_openfile(text(m_name, "@plain").c_str(), IMG_OPEN_READ_ONLY);
-    if (m_handle != -1 && img_is_tiled(&desc()) && img_std_plane_size(&desc()) > LARGEST_TILE) {
+    if (m_handle != -1 && img_is_tiled(&desc()) && img_plane_size(&desc()) > LARGEST_TILE) {
         img_closefile(m_handle);
         m_handle = img_openfile(text(m_name, "@mapped").c_str(), IMG_OPEN_READ_ONLY);
     }

@@ -66,8 +66,8 @@ public:
         if (form.nbands == 3) format = file_format::ppm;
         header_text header(start);
         const auto nsamps = header.number(), nlines = header.number(), highest = header.number();
-        if (!highest || *nsamps < 1 || *nlines < 1 || *highest < 1 || *highest > 65535 ||
-            !is_blank(header.next()))
+        if (!nsamps || !nlines || !highest || *nsamps < 1 || *nlines < 1 || *highest < 1 ||
+            *highest > 65535 || !is_blank(header.next()))
             throw failure(name, "has no usable PGM or PPM header");
         form.nlines = *nlines;
         form.nsamps = *nsamps;

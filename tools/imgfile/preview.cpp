@@ -5,7 +5,7 @@
 #include "stretch.h"
 #include "walk.h"
 
-#include "std/std.h"
+#include "api/img_desc.h"
 
 #include <algorithm>
 #include <map>
