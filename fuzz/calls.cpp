@@ -4,9 +4,9 @@
 
 namespace {
 
-class session {
+class call_sequence {
 public:
-    explicit session(fuzz_input &in) : m_in(in)
+    explicit call_sequence(fuzz_input &in) : m_in(in)
     {
         for (img_handle handle = IMG_MAX_HANDLES; handle-- > 0;) m_free.push_back(handle);
     }
@@ -82,6 +82,6 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size
 {
     const fuzz_run run;
     fuzz_input in({data, size});
-    for (session calls(in); !in.ended();) calls.call();
+    for (call_sequence calls(in); !in.ended();) calls.call();
     return 0;
 }

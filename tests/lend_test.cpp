@@ -1,7 +1,7 @@
 // Bytes that are read where they lie, what may become of them meanwhile, and the kernels that
 // move and map them.
 #include "api/scratch.h"
-#include "chain/line.h"
+#include "chain/ramp.h"
 #include "io/platform.h"
 #include "std/std.h"
 #include "support/effort.h"
@@ -494,14 +494,14 @@ TEST(Kernels, CopyRowsAsSampleAfterSampleDoes)
     }
 }
 
-TEST(Kernels, MapAlongALineAsTheTableDoes)
+TEST(Kernels, MapAlongARampAsTheTableDoes)
 {
     random_numbers random(1);
     samples given(70'000);
     for (std::size_t i = 0; i < given.size(); ++i) given[i] = static_cast<std::uint16_t>(i);
     const img_buffer_def from{7, 10'000, 0, 0, 10'000, 2, 12, 0},
         to{7, 10'000, 0, 0, 10'000, 1, 8, 0};
-    int lines = 0, tables = 0;
+    int ramps = 0, tables = 0;
     for (; tables < 40 + rounds(1000); ++tables) {
         const std::int32_t bits = tables % 4 == 0 ? random.within(1, 13) : 12, size = 1 << bits;
         counters histogram(static_cast<std::size_t>(size));
@@ -512,8 +512,8 @@ TEST(Kernels, MapAlongALineAsTheTableDoes)
             std::ranges::fill(table,
                               samples{0, 1, 255, 256, 300}[static_cast<std::size_t>(tables % 5)]);
         if (tables % 5 == 0) table[random.below(static_cast<std::uint32_t>(size))] ^= 1;
-        img_chain_line line;
-        lines += img_chain_find_line(table.data(), size, &line) ? 1 : 0;
+        img_chain_ramp ramp;
+        ramps += img_chain_find_ramp(table.data(), size, &ramp) ? 1 : 0;
         img_chain_lut record{static_cast<std::uint8_t>(bits), 8, size, table.data(), 0};
         bytes mapped(given.size());
         img_buffer_def narrow = from;
@@ -524,8 +524,8 @@ TEST(Kernels, MapAlongALineAsTheTableDoes)
         for (std::size_t i = 0; i < given.size(); ++i)
             ASSERT_EQ(mapped[i], table[std::min<std::size_t>(given[i], table.size() - 1)] % 256);
     }
-    EXPECT_GT(lines, tables / 4);
-    EXPECT_LT(lines, tables);
+    EXPECT_GT(ramps, tables / 4);
+    EXPECT_LT(ramps, tables);
 }
 
 }  // namespace

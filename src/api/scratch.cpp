@@ -30,7 +30,7 @@ std::size_t kept_bytes = 0;
 constexpr std::align_val_t ALIGNMENT{IMG_SCRATCH_ALIGNMENT};
 
 // Tells a checker of addresses what of a block may be touched.
-void allow([[maybe_unused]] const kept_block &of, [[maybe_unused]] std::size_t size)
+void mark_usable([[maybe_unused]] const kept_block &of, [[maybe_unused]] std::size_t size)
 {
 #ifdef IMG_CHECKED_ADDRESSES
     ASAN_UNPOISON_MEMORY_REGION(of.block, size);
@@ -40,7 +40,7 @@ void allow([[maybe_unused]] const kept_block &of, [[maybe_unused]] std::size_t s
 
 void free_block(const kept_block &of)
 {
-    allow(of, of.capacity);
+    mark_usable(of, of.capacity);
     ::operator delete[](of.block, ALIGNMENT);
 }
 
@@ -54,7 +54,7 @@ kept_block take_kept(kept_block *place)
 }
 
 // Returns a block of that capacity, if there is none among those that are kept a new one.
-std::uint8_t *find_block(std::size_t capacity)
+std::uint8_t *take_block(std::size_t capacity)
 {
     kept_block *const found = std::ranges::find(kept, capacity, &kept_block::capacity);
     return found != kept.end() ? take_kept(found).block
@@ -69,8 +69,8 @@ img_scratch img_take_scratch(std::size_t size)
     // Sizes that differ a little fit the same block.
     const std::size_t capacity =
         std::max(size > IMG_SCRATCH_LIMIT ? size : std::bit_ceil(size), IMG_SCRATCH_ALIGNMENT);
-    img_scratch block(find_block(capacity), {capacity});
-    if (block) allow({block.get(), capacity}, size);
+    img_scratch block(take_block(capacity), {capacity});
+    if (block) mark_usable({block.get(), capacity}, size);
     return block;
 }
 
@@ -85,7 +85,7 @@ void img_scratch_return::operator()(std::uint8_t *block) const
         free_block(take_kept(kept.begin()));
     *std::ranges::find(kept, std::size_t{0}, &kept_block::capacity) = back;
     kept_bytes += capacity;
-    allow(back, 0);
+    mark_usable(back, 0);
 }
 
 void img_free_scratch()

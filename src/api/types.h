@@ -58,8 +58,11 @@ struct img_type_desc {
     img_write_fn write;
     img_read_tiles_fn read_tiles;
     img_write_tiles_fn write_tiles;
+    // Moves the window of `mem_desc`, an image in memory, from or to the image; img_std_io_virtual
+    // says how.
     std::int32_t (*io_virtual)(std::int32_t writing, img_desc *desc, img_desc *mem_desc,
                                std::int32_t line0, std::int32_t samp0);
+    // Moves one sample, as img_std_pix_io_virtual does.
     std::int32_t (*pix_io_virtual)(std::int32_t writing, img_desc *desc, std::int32_t line,
                                    std::int32_t samp, std::int32_t band, std::uint8_t *value);
     img_image_fn delete_image;  // closes the image and removes its files
@@ -83,15 +86,6 @@ inline std::array<img_type_hooks, IMG_MAX_TYPES + 1> img_type_hooks_table{};
 
 // Returns the slot of the image's type; the empty one for an image without.
 const img_type_desc &img_type_of(const img_desc *desc);
-
-// Fills type slot and hook slot `slot` with the standard driver's operations and the hooks given;
-// note that the tiled layout comes before the untiled one. The strings are referenced. Returns 0.
-std::int32_t img_std_fill_type(std::int32_t slot, const char *name, const char *extension,
-                               std::int32_t tiled_layout, std::int32_t untiled_layout,
-                               img_image_fn probe, img_image_fn read_header,
-                               img_image_fn write_header, img_image_fn padded_nlines_fn,
-                               img_image_fn padded_nsamps_fn, img_type_op_fn type_op,
-                               img_type_desc *slot_record);
 
 // Fills the tables and makes the handle pool, once per process. Does nothing afterwards.
 void img_library_init();

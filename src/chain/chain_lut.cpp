@@ -1,6 +1,6 @@
 // Lookup tables at work: over a buffer, from one buffer to another, and for other widths.
 #include "chain/chain.h"
-#include "chain/line.h"
+#include "chain/ramp.h"
 
 #include <cstring>
 
@@ -38,19 +38,19 @@ void map_window(const std::uint8_t *from, const img_buffer_def &from_def, std::u
     }
 }
 
-// Maps two bytes to one along a line, if the table is one and the window is worth finding out.
+// Maps two bytes to one by computing, if the table is a ramp and the window is worth finding out.
 // Returns false when it was not done.
-bool map_along_line(const std::uint16_t *table, std::int32_t size, const std::uint8_t *from,
+bool map_along_ramp(const std::uint16_t *table, std::int32_t size, const std::uint8_t *from,
                     const img_buffer_def &from_def, std::uint8_t *to, const img_buffer_def &to_def)
 {
     constexpr std::int64_t worth_it = 4;  // samples for each entry
-    img_chain_line line;
+    img_chain_ramp ramp;
     if (std::int64_t{from_def.nlines} * from_def.nsamps < worth_it * size ||
-        !img_chain_find_line(table, size, &line))
+        !img_chain_find_ramp(table, size, &ramp))
         return false;
     for (std::int64_t row = 0; row < from_def.nlines; ++row)
-        img_chain_map_line(from + row * from_def.stride * 2, to + row * to_def.stride,
-                           static_cast<std::size_t>(from_def.nsamps), line);
+        img_chain_map_ramp(from + row * from_def.stride * 2, to + row * to_def.stride,
+                           static_cast<std::size_t>(from_def.nsamps), ramp);
     return true;
 }
 
@@ -72,7 +72,7 @@ void img_chain_convert_lut(const std::uint16_t *src_table, const img_chain_lut *
 {
     const std::int32_t in_shift = dst->bits_in - src->bits_in;
     const std::int32_t out_shift = dst->bits_out - src->bits_out;
-    // Chains only widen; a narrower index or value takes the high bits of the wider one.
+    // A narrower index or value takes the high bits of the wider one.
     for (std::int32_t i = 0; i < dst->size; ++i) {
         const std::int32_t from = in_shift >= 0 ? i >> in_shift : i << -in_shift;
         const std::int64_t value = src_table[from];
@@ -115,7 +115,7 @@ std::int32_t img_chain_lut_remap(void *record, const std::uint8_t *in_buffer,
     // A buffer of bytes gets bytes, whatever width the data before is said to have.
     const bool to_bytes = in_def->nbytes != 1 && out_def->nbytes == 1;
     if (to_bytes && pending == 0 &&
-        map_along_line(table, size, in_buffer, *in_def, out_buffer, *out_def))
+        map_along_ramp(table, size, in_buffer, *in_def, out_buffer, *out_def))
         return 0;
     const auto map = [=](std::uint32_t sample) {
         return img_chain_entry(table, size,

@@ -21,8 +21,9 @@ void count_samples(const std::uint8_t *buffer, const img_buffer_def &def, std::u
                    std::size_t size)
 {
     const auto line_length = static_cast<std::size_t>(def.stride) * sizeof(Sample);
-    const auto nlines = static_cast<std::size_t>(std::max(def.nlines, 0));  // no counter can
-    const auto nsamps = static_cast<std::size_t>(std::max(def.nsamps, 0));  // change these
+    // Copies, which no counter can change.
+    const auto nlines = static_cast<std::size_t>(std::max(def.nlines, 0));
+    const auto nsamps = static_cast<std::size_t>(std::max(def.nsamps, 0));
     for (std::size_t line = 0; line < nlines; ++line) {
         const std::uint8_t *const row = buffer + line * line_length;
         for (std::size_t samp = 0; samp < nsamps; samp += 4) {

@@ -236,7 +236,7 @@ bool img_file_mapping::shows_changes() const
 
 // Makes the mapping reach `end`, which lies in the file. It is made larger than the file, so that
 // one that grows is not mapped anew for each of its lines.
-bool img_file_mapping::covers(int fd, std::int64_t end)
+bool img_file_mapping::reach(int fd, std::int64_t end)
 {
     if (end <= m_size && is_same_file(m_mapped, m_seen)) return true;
     drop();
@@ -272,7 +272,7 @@ std::int32_t img_file_mapping::lend(int fd, std::int32_t offset, std::int32_t co
     if (m_unfit || offset < 0 || count < 1 || !look_at(fd) || end > m_seen.length ||
         !shows_changes())
         return -1;
-    m_unfit = !covers(fd, end);
+    m_unfit = !reach(fd, end);
     // Reading a mapping takes room for what is missing of a file in memory.
     if (m_unfit || (m_is_in_memory && m_seen.has_holes)) return -1;
 

@@ -33,7 +33,7 @@ private:
     static bool is_same_file(const state &a, const state &b);
     bool look_at(int fd);
     bool shows_changes() const;
-    bool covers(int fd, std::int64_t end);
+    bool reach(int fd, std::int64_t end);
 
     state m_seen = {};               // when it was last looked at
     bool m_has_fine_stamps = false;  // each change after a look shows

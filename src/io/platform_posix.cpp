@@ -7,7 +7,6 @@
 #include <cerrno>
 #include <cstddef>
 #include <ctime>
-#include <limits>
 #include <utility>
 
 #include <fcntl.h>
@@ -80,7 +79,7 @@ int system_flags(std::int32_t oflags)
     return flags;
 }
 
-constexpr std::int32_t MAX_POSITION = std::numeric_limits<std::int32_t>::max();
+constexpr std::int32_t MAX_POSITION = INT32_MAX;
 
 // Reads from the head of a file that was just opened. Returns the bytes read, or -1 when they are
 // not to be had there.

@@ -99,8 +99,24 @@ bool img_std_lend(const img_desc *desc, std::int64_t offset, std::int64_t count,
 // True when nobody counts the calls by which the image's file is reached. Not for images in memory.
 bool img_std_joins_calls(const img_desc *desc);
 
+// --- Types ---
+
+// Fills type slot and hook slot `slot` with the standard driver's operations and the hooks given;
+// note that the tiled layout comes before the untiled one. The strings are referenced. Returns 0.
+std::int32_t img_std_fill_type(std::int32_t slot, const char *name, const char *extension,
+                               std::int32_t tiled_layout, std::int32_t untiled_layout,
+                               img_image_fn probe, img_image_fn read_header,
+                               img_image_fn write_header, img_image_fn padded_nlines_fn,
+                               img_image_fn padded_nsamps_fn, img_type_op_fn type_op,
+                               img_type_desc *slot_record);
+
 // --- Samples ---
 
+// Returns a size or an offset as it is, or -1 when it does not fit 31 bits.
+inline std::int32_t img_std_fitting(std::int64_t size)
+{
+    return size <= INT32_MAX ? static_cast<std::int32_t>(size) : -1;
+}
 // Byte offsets from the start of the file or of mem_image: of a sample in a plane of lines, of a
 // pixel in lines of pixels, and of a tile of `band`, which in layout 4 is the tile of all bands.
 std::int64_t img_std_line_offset(const img_desc *desc, std::int64_t line, std::int32_t samp,
@@ -115,7 +131,7 @@ std::int32_t img_std_sample_offset(const img_desc *desc, std::int32_t line, std:
 bool img_std_exchanges_bytes(const img_desc *desc);
 // Copies `count` samples of `nbytes` bytes, from one to the next `from_step` and `to_step` bytes,
 // exchanging the two bytes of each if asked. Any alignment; `from` and `to` must not overlap,
-// unless they are the same.
+// unless they are the same and bytes are exchanged.
 void img_std_copy_samples(const std::uint8_t *from, std::size_t from_step, std::uint8_t *to,
                           std::size_t to_step, std::size_t count, std::int32_t nbytes,
                           bool exchange);

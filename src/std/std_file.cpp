@@ -5,24 +5,17 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <limits>
 #include <new>
 
 namespace {
 
 constexpr std::int32_t FILE_MODE = 0666;
-constexpr std::int64_t MAX_OFFSET = std::numeric_limits<std::int32_t>::max();
 
-// Every size below is either within 0..MAX_OFFSET or -1, which means that it does not fit.
-
-std::int64_t fitting(std::int64_t size)
-{
-    return size <= MAX_OFFSET ? size : -1;
-}
+// Every size below fits 31 bits or is -1, which means that it does not.
 
 std::int64_t product(std::int64_t a, std::int64_t b)
 {
-    return a < 0 || b < 0 ? -1 : fitting(a * b);
+    return a < 0 || b < 0 ? -1 : img_std_fitting(a * b);
 }
 
 template <typename... More>
@@ -33,7 +26,7 @@ std::int64_t product(std::int64_t a, std::int64_t b, More... more)
 
 std::int64_t sum(std::int64_t known, std::int64_t size)  // `known` is no -1
 {
-    return size < 0 ? -1 : fitting(known + size);
+    return size < 0 ? -1 : img_std_fitting(known + size);
 }
 
 const img_type_hooks &hooks_of(const img_desc *desc)
@@ -126,7 +119,7 @@ bool set_up_layout(img_desc *desc, img_std_file *file)
 
 std::int32_t seek(const img_desc *desc, std::int64_t offset, std::int32_t whence)
 {
-    if (fitting(offset) == -1) {
+    if (img_std_fitting(offset) == -1) {
         errno = EOVERFLOW;
         return -1;
     }
@@ -198,7 +191,8 @@ std::int32_t open_file(img_desc *desc)
 }
 
 // Grows a file that is shorter than its data to its full size, with zero bytes. What cannot be
-// completed, a file opened read-only for one, stays as it is: there is nobody to tell.
+// completed, a file opened read-only for one, stays as it is: there is nobody to tell. (A method
+// whose calls are counted is asked all the same, and refuses the write.)
 void complete(img_desc *desc)
 {
     if (img_access_mode(desc) == IMG_OPEN_READ_ONLY && img_std_joins_calls(desc)) return;
@@ -318,7 +312,8 @@ std::int32_t img_std_extend(img_desc *desc, std::int32_t count)
 
 std::int32_t img_std_seek_to_write(img_desc *desc, std::int64_t offset)
 {
-    if (offset <= desc->std_file->veof || fitting(offset) == -1) return seek_to(desc, offset);
+    if (offset <= desc->std_file->veof || img_std_fitting(offset) == -1)
+        return seek_to(desc, offset);
     // The file may have grown since it was last looked at: what is missing counts from its end.
     const std::int32_t end = seek(desc, 0, IMG_SEEK_END);
     if (end == -1) return -1;

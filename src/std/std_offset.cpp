@@ -2,24 +2,17 @@
 #include "api/img_desc.h"
 #include "std/std.h"
 
-#include <limits>
-
 namespace {
-
-constexpr std::int64_t MAX_OFFSET = std::numeric_limits<std::int32_t>::max();
-
-std::int32_t fitting(std::int64_t offset)
-{
-    return offset <= MAX_OFFSET ? static_cast<std::int32_t>(offset) : -1;
-}
 
 std::int32_t untiled_sample_offset(const img_desc *desc, std::int32_t line, std::int32_t samp,
                                    std::int32_t band)
 {
     // Beyond that many pixels the offset does not fit, and its products need not either.
-    if (std::int64_t{line} * desc->std_file->padded_nsamps + samp > MAX_OFFSET) return -1;
-    if (desc->layout == IMG_LAYOUT_BSQ) return fitting(img_std_line_offset(desc, line, samp, band));
-    return fitting(img_std_pixel_offset(desc, line, samp) + std::int64_t{band} * desc->nbytes);
+    if (std::int64_t{line} * desc->std_file->padded_nsamps + samp > INT32_MAX) return -1;
+    if (desc->layout == IMG_LAYOUT_BSQ)
+        return img_std_fitting(img_std_line_offset(desc, line, samp, band));
+    return img_std_fitting(img_std_pixel_offset(desc, line, samp) +
+                           std::int64_t{band} * desc->nbytes);
 }
 
 std::int32_t tiled_sample_offset(const img_desc *desc, std::int32_t line, std::int32_t samp,
@@ -34,7 +27,8 @@ std::int32_t tiled_sample_offset(const img_desc *desc, std::int32_t line, std::i
     const std::int64_t tile =
         img_std_tile_offset(desc, tile_row * file->tiles_across + tile_col, band);
     const bool interleaved = desc->layout == IMG_LAYOUT_TILED_BIP;
-    return fitting(tile + (interleaved ? pixel * desc->nbands + band : pixel) * desc->nbytes);
+    return img_std_fitting(tile +
+                           (interleaved ? pixel * desc->nbands + band : pixel) * desc->nbytes);
 }
 
 }  // namespace

@@ -4,7 +4,6 @@
 #include "std/std.h"
 
 #include <cstring>
-#include <limits>
 
 namespace {
 
@@ -58,7 +57,7 @@ std::int32_t img_std_io_virtual(std::int32_t writing, img_desc *desc, img_desc *
     const std::int64_t size = band_bytes(mem_desc) * (at_once ? mem_desc->nbands : 1);
     for (std::int32_t band = 0; band < transfers; ++band) {
         const std::int32_t offset = img_std_sample_offset(desc, line0, samp0, band);
-        if (offset == -1 || offset + size > std::numeric_limits<std::int32_t>::max()) return -1;
+        if (offset == -1 || offset + size > INT32_MAX) return -1;
         const auto count = static_cast<std::int32_t>(size);
         const std::int32_t moved =
             transfer(writing, desc, offset, mem_desc->mem_image.get() + band * size, count);

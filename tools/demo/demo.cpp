@@ -1,6 +1,6 @@
 // imgfile_demo OUTDIR [PICTURE...]: makes image files of pictures, or of a scene of its own, opens
 // them again through the library, compares them with the pictures and tells what it saw.
-#include "check.h"
+#include "comparison.h"
 #include "scene.h"
 
 #include <algorithm>

@@ -2,7 +2,7 @@
 #ifndef DEMO_SCENE_H
 #define DEMO_SCENE_H
 
-#include "pnm.h"
+#include "picture.h"
 
 struct scene {
     picture rgb;     // 8 bits in three bands

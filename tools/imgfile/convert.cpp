@@ -1,8 +1,8 @@
 // imgfile convert: an image, or a part of it, in another format.
+#include "band_stretch.h"
 #include "commands.h"
 #include "failure.h"
 #include "output.h"
-#include "stretch.h"
 #include "walk.h"
 
 #include <algorithm>

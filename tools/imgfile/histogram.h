@@ -2,8 +2,8 @@
 #ifndef TOOL_HISTOGRAM_H
 #define TOOL_HISTOGRAM_H
 
+#include "band_stretch.h"
 #include "image.h"
-#include "stretch.h"
 
 #include <cstdint>
 #include <string>

@@ -1,8 +1,8 @@
 // imgfile preview: a picture for people.
+#include "band_stretch.h"
 #include "commands.h"
 #include "failure.h"
 #include "output.h"
-#include "stretch.h"
 #include "walk.h"
 
 #include "api/img_desc.h"

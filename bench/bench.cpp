@@ -9,7 +9,7 @@
 //   --scaling how the costs of the library alone grow with images, windows, tiles and bands
 // Options of Google Benchmark are taken, too. Exit status 1 when candidates differ in what they
 // read or write, or when something fails.
-#include "report.h"
+#include "measure.h"
 
 #include <algorithm>
 #include <benchmark/benchmark.h>

@@ -1,6 +1,6 @@
 // Pictures, and their files in the binary PGM and PPM formats.
-#ifndef DEMO_PNM_H
-#define DEMO_PNM_H
+#ifndef DEMO_PICTURE_H
+#define DEMO_PICTURE_H
 
 #include <cstddef>
 #include <cstdint>

@@ -1,4 +1,4 @@
-#include "stretch.h"
+#include "band_stretch.h"
 
 #include "walk.h"
 

@@ -1,4 +1,4 @@
-#include "check.h"
+#include "comparison.h"
 
 #include <algorithm>
 #include <array>
@@ -92,7 +92,7 @@ void check_stretched(examined &file, const window &area, std::int32_t band, img_
 
 }  // namespace
 
-open_image::open_image(img_handle handle) : handle_{handle}
+open_image::open_image(img_handle handle) : m_handle{handle}
 {
     if (handle == -1) throw std::runtime_error("cannot be opened or created");
 }

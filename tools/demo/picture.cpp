@@ -1,4 +1,4 @@
-#include "pnm.h"
+#include "picture.h"
 
 #include <array>
 #include <cstdio>

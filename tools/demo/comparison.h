@@ -1,9 +1,9 @@
 // Whether an image file holds a picture, asked as a host would ask.
-#ifndef DEMO_CHECK_H
-#define DEMO_CHECK_H
+#ifndef DEMO_COMPARISON_H
+#define DEMO_COMPARISON_H
 
 #include "img.h"
-#include "pnm.h"
+#include "picture.h"
 
 #include <cstdint>
 #include <string>
@@ -15,11 +15,11 @@ public:
     explicit open_image(img_handle handle);
     open_image(const open_image &) = delete;
     open_image &operator=(const open_image &) = delete;
-    ~open_image() { img_closefile(handle_); }
-    operator img_handle() const { return handle_; }
+    ~open_image() { img_closefile(m_handle); }
+    operator img_handle() const { return m_handle; }
 
 private:
-    img_handle handle_;
+    img_handle m_handle;
 };
 
 struct window {

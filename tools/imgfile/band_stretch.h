@@ -1,6 +1,6 @@
 // How often each value occurs, and the stretch to bytes that follows from it.
-#ifndef TOOL_STRETCH_H
-#define TOOL_STRETCH_H
+#ifndef TOOL_BAND_STRETCH_H
+#define TOOL_BAND_STRETCH_H
 
 #include "image.h"
 

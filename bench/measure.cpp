@@ -1,4 +1,4 @@
-#include "report.h"
+#include "measure.h"
 
 #include <algorithm>
 #include <array>

@@ -1,6 +1,6 @@
 // Running the tasks under Google Benchmark, and the table of what they took.
-#ifndef BENCH_REPORT_H
-#define BENCH_REPORT_H
+#ifndef BENCH_MEASURE_H
+#define BENCH_MEASURE_H
 
 #include "task.h"
 
