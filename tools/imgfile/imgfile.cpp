@@ -161,10 +161,8 @@ int tell_usage(const CLI::App &app, const std::string &what)
     return 2;
 }
 
-int run(int argc, char **argv)
+void describe(CLI::App &app)
 {
-    CLI::App app("Looks at VITec and Helava images, checks them, and moves them to and from\n"
-                 "PGM, PPM, PNG and TIFF files.");
     app.name("imgfile");
     app.require_subcommand(1);
     app.set_version_flag("--version", text("imgfile ", VERSION), "Print the version and exit");
@@ -174,7 +172,25 @@ int run(int argc, char **argv)
     app.get_formatter()->label("SUBCOMMAND", "COMMAND");
     app.footer("Exit status: 0 done, 1 failed or found something, 2 wrong usage.\n"
                "\"imgfile COMMAND --help\" and \"man imgfile-COMMAND\" tell more.");
+}
 
+// Returns what is left to say about arguments that could not be parsed.
+std::string complaint(const CLI::App &app, const CLI::ParseError &error)
+{
+    const std::vector<std::string> left = app.remaining();
+    if (!app.get_subcommands().empty()) {
+        const std::string what = error.what();
+        return what.substr(0, what.find('\n'));
+    }
+    if (left.empty()) return "a command is required";
+    return (left[0].starts_with('-') ? "there is no option " : "there is no command ") + left[0];
+}
+
+int run(int argc, char **argv)
+{
+    CLI::App app("Looks at VITec and Helava images, checks them, and moves them to and from\n"
+                 "PGM, PPM, PNG and TIFF files.");
+    describe(app);
     info_options info;
     check_options check;
     convert_options convert;
@@ -198,14 +214,7 @@ int run(int argc, char **argv)
         app.exit(wanted);
         return 0;
     } catch (const CLI::ParseError &error) {
-        std::string what = error.what();
-        const std::vector<std::string> left = app.remaining();
-        if (app.get_subcommands().empty() && left.empty())
-            what = "a command is required";
-        else if (app.get_subcommands().empty())
-            what = (left[0].starts_with('-') ? "there is no option " : "there is no command ") +
-                   left[0];
-        return tell_usage(app, what.substr(0, what.find('\n')));
+        return tell_usage(app, complaint(app, error));
     }
     try {
         for (const auto &[command, action] : commands)

@@ -97,23 +97,10 @@ public:
         m_planar = form.nbands > 1 &&
                    field<std::uint16_t>(m_file, TIFFTAG_PLANARCONFIG, PLANARCONFIG_CONTIG) ==
                        PLANARCONFIG_SEPARATE;
-        if (TIFFIsTiled(m_file.get()) != 0) {
-            tiles = {static_cast<std::int32_t>(field<std::uint32_t>(m_file, TIFFTAG_TILELENGTH, 0)),
-                     static_cast<std::int32_t>(field<std::uint32_t>(m_file, TIFFTAG_TILEWIDTH, 0))};
-            const std::uint64_t size = TIFFTileSize64(m_file.get());
-            refuse_unless(size > 0, "tiles of no usable size");
-            if (size > LARGEST_PIECE)
-                throw failure(name, text("has tiles of ", size, " bytes; 48 MiB are the most"));
-        } else {
-            in_order = true;
-            m_plain = field<std::uint16_t>(m_file, TIFFTAG_COMPRESSION, COMPRESSION_NONE) ==
-                          COMPRESSION_NONE &&
-                      field<std::uint16_t>(m_file, TIFFTAG_FILLORDER, FILLORDER_MSB2LSB) ==
-                          FILLORDER_MSB2LSB;
-            m_strip_nlines =
-                std::max(field<std::uint32_t>(m_file, TIFFTAG_ROWSPERSTRIP, nlines), 1U);
-            refuse_unless(TIFFScanlineSize64(m_file.get()) > 0, "lines of no usable size");
-        }
+        if (TIFFIsTiled(m_file.get()) != 0)
+            set_up_tiles();
+        else
+            set_up_strips();
         if (const int orientation =
                 field<std::uint16_t>(m_file, TIFFTAG_ORIENTATION, ORIENTATION_TOPLEFT);
             orientation != ORIENTATION_TOPLEFT)
@@ -139,6 +126,26 @@ private:
         if (!fit)
             throw failure(name,
                           "has " + what + "; TIFF files of 8 or 16 bits, gray or RGB, are read");
+    }
+    void set_up_tiles()
+    {
+        tiles = {static_cast<std::int32_t>(field<std::uint32_t>(m_file, TIFFTAG_TILELENGTH, 0)),
+                 static_cast<std::int32_t>(field<std::uint32_t>(m_file, TIFFTAG_TILEWIDTH, 0))};
+        const std::uint64_t size = TIFFTileSize64(m_file.get());
+        refuse_unless(size > 0, "tiles of no usable size");
+        if (size > LARGEST_PIECE)
+            throw failure(name, text("has tiles of ", size, " bytes; 48 MiB are the most"));
+    }
+    void set_up_strips()
+    {
+        in_order = true;
+        m_plain =
+            field<std::uint16_t>(m_file, TIFFTAG_COMPRESSION, COMPRESSION_NONE) ==
+                COMPRESSION_NONE &&
+            field<std::uint16_t>(m_file, TIFFTAG_FILLORDER, FILLORDER_MSB2LSB) == FILLORDER_MSB2LSB;
+        const auto nlines = static_cast<std::uint32_t>(form.nlines);
+        m_strip_nlines = std::max(field<std::uint32_t>(m_file, TIFFTAG_ROWSPERSTRIP, nlines), 1U);
+        refuse_unless(TIFFScanlineSize64(m_file.get()) > 0, "lines of no usable size");
     }
     [[noreturn]] void fail_at(std::int64_t line, std::uint16_t plane) const
     {
