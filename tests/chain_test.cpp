@@ -117,6 +117,9 @@ TEST_F(Chain, WhatLinksOwnGoesWithThem)  // and nothing twice: the leak checker 
                                   own.data(), 0);
     EXPECT_EQ(load(), 0);
     EXPECT_NE(own.back(), 0);
+    add_lut(4, 4, 4, true);
+    img_closefile(image);
+    EXPECT_EQ(of_links(&img_chain_link::kind), codes(10, IMG_CHAIN_EMPTY));
 }
 
 TEST_F(Chain, RefusesWhatIsNoLink)

@@ -3,6 +3,7 @@
 #include "access/tile_cache.h"
 #include "api/report.h"
 #include "api/types.h"
+#include "chain/chain.h"
 #include "io/io_method.h"
 
 #include <cerrno>
@@ -94,6 +95,7 @@ void img_release_image(img_handle handle, std::int32_t flush)
         if (img_type_of(desc).close != nullptr) img_type_of(desc).close(desc);
         delete desc;
         table_slot(handle) = nullptr;
+        img_chain_init(handle);
     }
     img_pool_give_back(img_handle_pool, handle);
 }

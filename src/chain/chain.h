@@ -94,7 +94,8 @@ struct img_chain_link {
     };
 };
 
-// The chain of one handle. It lives as long as the process; img_chain_init resets it.
+// The chain of one handle. It lives as long as the process; img_chain_init resets it, as the image
+// is opened and when it is released.
 struct img_chain {
     std::uint8_t identity;       // 1: no slot holds a link, the data is left as it is
     std::uint8_t prepared;       // 1: between preparation and the successful end of application

@@ -224,7 +224,8 @@ std::int32_t read_stored_run(img_desc *desc, std::int32_t first_tile, std::int32
 std::int32_t fetch_run(img_desc *desc, const tiled_region &region, std::int32_t row,
                        std::int32_t band, const std::uint8_t *fill, bool direct, std::uint8_t *run)
 {
-    const std::int32_t first_tile = region.first_tile(row), ntiles = region.ntiles();
+    const std::int32_t first_tile = region.first_tile(row);
+    const std::int32_t ntiles = region.ntiles();
     const std::size_t samples = img_plane_samples(desc);
     if (direct && region.covers_run(row)) return 0;
     if (direct && region.run_length() >= WORTH_A_CALL &&
