@@ -125,7 +125,7 @@ void describe(const std::string &name, const picture &source)
         std::int64_t beyond = 0;  // the bands are counted as lines: they lie one after the other
         for (std::int32_t line = 0; line < source.nlines * source.nbands; ++line)
             for (std::int32_t samp = 0; samp < source.nsamps; ++samp)
-                beyond += source.sample(0, line, samp) > 4095;
+                beyond += source.sample(0, line, samp) > 4095 ? 1 : 0;
         std::printf("  %s samples lie beyond 12 bits%s\n", grouped(beyond).c_str(),
                     beyond == 0 ? "" : "; windows show them as 4095, tiles hold them");
     }
@@ -162,7 +162,7 @@ std::string choose_stem(const std::string &outdir, const std::string &name)
 std::vector<std::string> write_scene(const std::string &outdir)
 {
     const scene made = make_scene();
-    const std::vector<std::string> names{outdir + "/scene_rgb.ppm", outdir + "/scene_gray12.pgm"};
+    std::vector<std::string> names{outdir + "/scene_rgb.ppm", outdir + "/scene_gray12.pgm"};
     write_pnm(names[0], made.rgb);
     write_pnm(names[1], made.gray12);
     return names;

@@ -6,10 +6,10 @@
 
 double hash_noise(int line, int samp, unsigned seed)
 {
-    auto h = static_cast<std::uint32_t>(line) * 0x9E3779B9u ^
-             static_cast<std::uint32_t>(samp) * 0x6A09E667u ^ (seed + 1u) * 0xBB67AE85u;
-    h = (h ^ h >> 15) * 0x9E3779B9u;
-    h = (h ^ h >> 12) * 0xA54FF53Bu;
+    auto h = static_cast<std::uint32_t>(line) * 0x9E3779B9U ^
+             static_cast<std::uint32_t>(samp) * 0x6A09E667U ^ (seed + 1U) * 0xBB67AE85U;
+    h = (h ^ h >> 15) * 0x9E3779B9U;
+    h = (h ^ h >> 12) * 0xA54FF53BU;
     return static_cast<double>(h ^ h >> 15) / 4294967296.0;
 }
 

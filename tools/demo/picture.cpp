@@ -52,7 +52,7 @@ picture read_header(std::istream &file, std::uintmax_t length)
 
     // What the file must hold is held against its length before any memory is taken for it.
     const std::int64_t pixel = std::int64_t{nbands} * (maxval > 255 ? 2 : 1);
-    const std::uintmax_t expected = static_cast<std::uintmax_t>(nlines * nsamps);
+    const auto expected = static_cast<std::uintmax_t>(nlines * nsamps);
     const std::uintmax_t left = length - static_cast<std::uintmax_t>(file.tellg());
     if (expected > left / static_cast<std::uintmax_t>(pixel))
         throw std::runtime_error("cut short: its header announces more samples than it holds");

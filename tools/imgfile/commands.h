@@ -54,10 +54,10 @@ struct create_options {
 int run_create(const create_options &asked);
 
 // "none", "256" or "128x256", lines first; throws `wrong_usage`.
-tile_size parse_tile(const std::string &text);
+tile_size parse_tile(const std::string &from);
 
 // "0,2" as bands that the image has; nothing as `otherwise`. Throws `wrong_usage` and `failure`.
-band_list parse_bands(const std::optional<std::string> &text, const image_reader &image,
+band_list parse_bands(const std::optional<std::string> &from, const image_reader &image,
                       const band_list &otherwise);
 
 #endif

@@ -57,7 +57,7 @@ band_list parse_bands(const std::optional<std::string> &from, const image_reader
                       const band_list &otherwise)
 {
     if (!from) return otherwise;
-    const band_list bands = parse_numbers("--band", *from, ',');
+    band_list bands = parse_numbers("--band", *from, ',');
     for (const std::int32_t band : bands)
         if (band >= image.form.nbands)
             throw failure(image.name, text("has no band ", band, ": it has ", image.form.nbands,

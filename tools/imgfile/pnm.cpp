@@ -58,8 +58,8 @@ public:
     {
         std::string start(65536, '\0');  // comments may be long
         start.resize(
-            static_cast<std::size_t>(std::max<ssize_t>(read_at(0, &start[0], start.size()), 0)));
-        if (start[1] != '5' && start[1] != '6')
+            static_cast<std::size_t>(std::max<ssize_t>(read_at(0, start.data(), start.size()), 0)));
+        if (start.size() < 2 || (start[1] != '5' && start[1] != '6'))
             throw failure(name, "is a PNM file of a kind that is not read: only binary PGM (P5) "
                                 "and PPM (P6) are");
         form.nbands = start[1] == '6' ? 3 : 1;
@@ -72,7 +72,9 @@ public:
         form.nlines = *nlines;
         form.nsamps = *nsamps;
         form.nbytes = *highest > 255 ? 2 : 1;
-        form.nbits = form.nbytes == 1 ? 8 : static_cast<int>(std::bit_width(unsigned(*highest)));
+        form.nbits = form.nbytes == 1
+                         ? 8
+                         : static_cast<int>(std::bit_width(static_cast<std::uint32_t>(*highest)));
         m_first = static_cast<std::int64_t>(header.m_at) + 1;
         m_line_length = std::int64_t{form.nsamps} * form.nbands * form.nbytes;
         if (form.nlines <= INT64_MAX / 2 / m_line_length)
