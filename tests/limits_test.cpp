@@ -1,6 +1,7 @@
 // What docs/limits.md promises and no other test holds: the memory that a call takes, and two
 // images of one file.
 #include "api/scratch.h"
+#include "chain/chain.h"
 #include "support/fault_memory.h"
 #include "support/file_test.h"
 
@@ -43,9 +44,33 @@ TEST_F(Limits, MemoryOfACall)
         EXPECT_LE(memory_requested(), dump);
         memory_arm(0);
         EXPECT_EQ(img_load_tiles(handle, 0, 1, 0, buffer.data()), 0);
+        EXPECT_EQ(memory_requested(), 0U);
+        std::filesystem::resize_file(m_file, 244);
+        const stderr_capture quiet;
+        EXPECT_EQ(img_load_buffer(handle, 60, 60, 30, 100, 0, buffer.data(), 100, nullptr), -1);
+        EXPECT_EQ(img_chain_of(handle).work_memory, nullptr);
+        memory_arm(0);
         EXPECT_EQ(img_closefile(handle), 0);
         EXPECT_EQ(memory_requested(), 0U);
     }
+}
+
+TEST_F(Limits, AnImageGoesOnWithTheFileThatWasOpened)
+{
+    std::uint8_t sample = 1;
+    const img_handle handle = creating(m_name, IMG_TYPE_VITEC, {}).result;
+    EXPECT_EQ(img_dump_buffer(handle, 0, 0, 1, 1, 0, &sample, 1, nullptr), 0);
+    const bytes other = vitec_file({}, 245);
+    write_file(m_folder / "other", other);
+    std::filesystem::rename(m_folder / "other", m_file);
+    for (const bool removed : {false, true}) {
+        if (removed) std::filesystem::remove(m_file);
+        EXPECT_EQ(img_load_buffer(handle, 0, 0, 1, 1, 0, &sample, 1, nullptr), 0);
+        EXPECT_EQ(sample, removed ? 2 : 1);
+        EXPECT_EQ(img_dump_buffer(handle, 0, 0, 1, 1, 0, &++sample, 1, nullptr), 0);
+        EXPECT_TRUE(removed || read_file(m_file) == other);
+    }
+    EXPECT_EQ(img_closefile(handle), 0);
 }
 
 TEST_F(Limits, TwoImagesOfOneFileSeeAndKeepWhatTheOtherWroteElsewhere)

@@ -183,17 +183,21 @@ TEST_F(Memory, ShortageFailsTheCallThatNeedsIt)
         EXPECT_EQ(denied_requests(use, cache_mb, true), lasting);
     }
 
-    // Rows that are gathered for want of calls alone can do without.
+    // Rows that are gathered for want of calls alone can do without, or with room for one of them.
     m_name = m_file;
-    const call dumps_apart = [&] {
-        return img_dump_buffer(m_image, 0, 0, 2, 8, 0, m_buffer.data(), 8 + 8 / m_geometry.nbytes,
-                               nullptr);
+    std::int32_t stride = 0;
+    const call dumps_all = [&] {
+        return img_dump_buffer(m_image, 0, 0, 2, 8, 0, m_buffer.data(), stride, nullptr);
     };
-    for (const auto &[image, letters] :
-         {std::pair{lines, "+"}, {deep, IMG_WRITES_SWAPPED ? "n" : "+"}}) {
-        m_type = vitec;
-        m_geometry = image;
-        EXPECT_EQ(denied_requests(dumps_apart, 0, true), letters);
+    m_type = vitec;
+    m_geometry = lines;
+    stride = 16;
+    EXPECT_EQ(denied_requests(dumps_all, 0, true), "+");
+    m_geometry = deep;
+    for (const std::int32_t each : {8, 12}) {
+        stride = each;
+        EXPECT_EQ(denied_requests(dumps_all, 0, false), "+");
+        EXPECT_EQ(denied_requests(dumps_all, 0, true), IMG_WRITES_SWAPPED ? "n" : "+");
     }
 }
 

@@ -1,6 +1,7 @@
 #include "chain/chain.h"
 #include "io/io_method.h"
 #include "std/std.h"
+#include "support/fault_memory.h"
 #include "support/file_test.h"
 
 #include <sys/stat.h>
@@ -14,6 +15,9 @@ TEST(Library, StartsWithTheFirstOpen)
     if (img_io_method_count != 0) GTEST_SKIP() << "the library is in use: not the first test";
     EXPECT_EQ(img_query_image_type(0) + img_closefile(0) + img_mgr_cleanup(), IMG_NO_TYPE);
     EXPECT_EQ(img_io_method_count, 0);
+    memory_arm(1);
+    EXPECT_EQ(opening("no such file"), NO_FREE_HANDLE);
+    memory_arm(0);
     for (int round = 0; round < 2; ++round) {
         EXPECT_EQ(opening("no such file"), REFUSED_QUIETLY);
         EXPECT_EQ(img_io_method_count, 1);

@@ -8,6 +8,7 @@
 
 #include <atomic>
 #include <csignal>
+#include <fstream>
 #include <thread>
 
 #include <fcntl.h>
@@ -177,15 +178,23 @@ TEST_F(System, OpensLeaveNothingBehind)
         for (const std::string &name : {m_file, m_folder / "cut"}) {
             const img_handle handle = img_openfile(name.c_str(), IMG_OPEN_READ_WRITE);
             EXPECT_EQ(handle, name == m_file ? 0 : -1);
+            bytes window(16);
+            img_load_buffer(handle, 0, 0, 4, 4, 0, window.data(), 4, nullptr);
             img_closefile(handle);
         }
     };
+    const auto mappings = [] {
+        std::ifstream list("/proc/self/maps");
+        return std::count(std::istreambuf_iterator(list), {}, '\n');
+    };
     open_both();
+    const auto mapped = mappings();
     const auto memory = ::mallinfo2().uordblks;  // always 0 where a sanitizer looks for leaks
     const auto in_use = descriptors_in_use();
     for (int i = rounds(100'000); i > 0; --i) open_both();
     EXPECT_LE(::mallinfo2().uordblks, memory + 4096);
     EXPECT_EQ(descriptors_in_use(), in_use);
+    EXPECT_LE(mappings(), mapped + 100);
 }
 
 TEST_F(System, FilesBearTheLocalTimeOrNone)

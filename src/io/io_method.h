@@ -31,7 +31,8 @@ using img_io_lend_fn = std::int32_t (*)(std::int32_t fd, std::int32_t offset, st
                                         img_io_use_fn use, void *arg);
 
 // One access method. Its operations have the meaning of the low-level file calls of those names;
-// all of them return -1 for failure and leave the reason in errno.
+// all of them return -1 for failure and leave the reason in errno. None may call the library for
+// the image that it works for.
 struct img_io_method {
     const char *name;      // referenced: the registrant keeps it valid for the life of the process
     std::int32_t enabled;  // 1: it can be found; 0: its initialisation failed
