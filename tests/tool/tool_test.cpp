@@ -310,6 +310,7 @@ TEST_F(Tool, RefusesInOneLineAndLeavesTheTargetAsItWas)
     write_content("junk", "nothing in particular, but long enough to hold a header of some kind");
     write_content("old", "what was there before");
     write_content("empty", "");
+    write_content("vast.pgm", "P5 99999999999 5 255\n");
     fs::create_hard_link("rgb.ppm", "twin.ppm");
     fs::create_symlink("rgb.ppm", "link.ppm");
     ASSERT_EQ(::mkfifo("pipe", 0600), 0);
@@ -328,6 +329,8 @@ TEST_F(Tool, RefusesInOneLineAndLeavesTheTargetAsItWas)
               "missing.img: No such file or directory"},
              {"convert . old --format png --overwrite", 1, ".: is a folder"},
              {"convert pipe old --format png --overwrite", 1, "pipe: is not a regular file"},
+             {"convert vast.pgm old --format png --overwrite", 1,
+              "vast.pgm: has no usable PGM or PPM header"},
              {"convert rgb.ppm pipe --format png --overwrite", 1,
               "pipe: exists and is not a regular file"},
              {"convert rgb.ppm nowhere/new.png", 1,
