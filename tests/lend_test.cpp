@@ -201,53 +201,110 @@ void mend_hosts_page()
            MAP_PRIVATE | MAP_ANONYMOUS | MAP_FIXED, -1, 0);
 }
 
-TEST_F(Lending, LeavesTheHostItsBusErrors)
+class HostsBusErrors : public Lending {
+protected:
+    HostsBusErrors()
+    {
+        open(0);
+        hosts_errors = 0;
+        m_plain.sa_handler = [](int) { mend_hosts_page(); };
+        m_informed.sa_flags = SA_SIGINFO;
+        m_informed.sa_sigaction = [](int, siginfo_t *info, void *context) {
+            EXPECT_TRUE(info->si_addr == hosts_page && context != nullptr);
+            mend_hosts_page();
+        };
+    }
+    ~HostsBusErrors() override
+    {
+        ::signal(SIGBUS, SIG_DFL);
+        ::close(m_empty);
+        img_platform_close(m_fd);
+    }
+    // Makes the page where reading raises a bus error.
+    void map_page(void *hint = nullptr) const
+    {
+        hosts_page =
+            static_cast<std::uint8_t *>(::mmap(hint, 4096, PROT_READ, MAP_SHARED, m_empty, 0));
+    }
+    static void touch_page() { EXPECT_EQ(*hosts_page, 0); }
+    static struct sigaction installed()
+    {
+        struct sigaction found;
+        ::sigaction(SIGBUS, nullptr, &found);
+        return found;
+    }
+    // How a process ends that meets a bus error while bytes are lent, be it `sent` or its own:
+    // minus a signal's number, or what was answered.
+    int end_of_child(void (*handler)(int), bool sent, unsigned flags = 0)
+    {
+        const pid_t child = ::fork();
+        if (child == 0) {
+            struct sigaction action = {};
+            action.sa_handler = handler;
+            action.sa_flags = static_cast<int>(flags);
+            ::sigaction(SIGBUS, &action, nullptr);
+            map_page();
+            ::_exit(lend(0, SIZE,
+                         [=](auto) { sent ? static_cast<void>(::raise(SIGBUS)) : touch_page(); }));
+        }
+        int status = -1;
+        ::waitpid(child, &status, 0);
+        return WIFSIGNALED(status) ? -WTERMSIG(status) : WEXITSTATUS(status);
+    }
+
+    const int m_empty = ::open((m_folder / "empty").c_str(), O_RDWR | O_CREAT, 0600);
+    struct sigaction m_plain = {}, m_informed = {};
+};
+
+TEST_F(HostsBusErrors, ReachItsHandler)
 {
-    open(0);
-    const int empty = ::open((m_folder / "empty").c_str(), O_RDWR | O_CREAT, 0600);
-    struct sigaction plain = {}, informed = {}, once, found;
-    plain.sa_handler = [](int) { mend_hosts_page(); };
-    informed.sa_flags = SA_SIGINFO;
-    informed.sa_sigaction = [](int, siginfo_t *info, void *context) {
-        EXPECT_TRUE(info->si_addr == hosts_page && context != nullptr);
-        mend_hosts_page();
-    };
-    once = plain;
+    struct sigaction once = m_plain;
     once.sa_flags = static_cast<int>(SA_RESETHAND);
     // A page of the host below the bytes that are lent, or above them; in this thread or another.
     for (const std::ptrdiff_t distance : {-(1 << 22), 1 << 22})
         for (const bool elsewhere : {false, true})
-            for (const auto *const action : {&plain, &informed, &once}) {
+            for (const auto *const action : {&m_plain, &m_informed, &once}) {
                 ::sigaction(SIGBUS, action, nullptr);
                 const std::int32_t result = lend(0, SIZE, [&](const std::uint8_t *lent) {
-                    void *const hint = const_cast<std::uint8_t *>(lent + distance);
-                    hosts_page = static_cast<std::uint8_t *>(
-                        ::mmap(hint, 4096, PROT_READ, MAP_SHARED, empty, 0));
-                    const auto touch = [] { EXPECT_EQ(*hosts_page, 0); };
+                    map_page(const_cast<std::uint8_t *>(lent + distance));
                     if (elsewhere)
-                        std::thread(touch).join();
+                        std::thread(touch_page).join();
                     else
-                        touch();
+                        touch_page();
                 });
                 EXPECT_EQ(result, 0);
-                ::sigaction(SIGBUS, nullptr, &found);
-                EXPECT_TRUE(found.sa_handler == (action == &once ? SIG_DFL : action->sa_handler));
+                EXPECT_TRUE(installed().sa_handler ==
+                            (action == &once ? SIG_DFL : action->sa_handler));
                 ::munmap(const_cast<std::uint8_t *>(hosts_page), 4096);
             }
     EXPECT_EQ(hosts_errors, 12);
 
+    // Another thread reads what is cut off.
+    ::sigaction(SIGBUS, &m_plain, nullptr);
+    EXPECT_EQ(lend(0, SIZE,
+                   [&](const std::uint8_t *lent) {
+                       hosts_page = const_cast<std::uint8_t *>(lent);
+                       cut(0);
+                       std::thread(touch_page).join();
+                   }),
+              -1);
+    EXPECT_EQ(hosts_errors, 13);
+    restore();
+}
+
+TEST_F(HostsBusErrors, ReachTheHandlerOfThatMoment)
+{
     // Another thread has a handler of its own for a while, which ends at the wrong time.
     struct sigaction during;
-    ::sigaction(SIGBUS, &plain, nullptr);
-    EXPECT_EQ(lend(0, SIZE, [&](auto) { ::sigaction(SIGBUS, &informed, &during); }), 0);
-    ::sigaction(SIGBUS, &during, &found);
-    EXPECT_TRUE(found.sa_sigaction == informed.sa_sigaction);
+    ::sigaction(SIGBUS, &m_plain, nullptr);
+    EXPECT_EQ(lend(0, SIZE, [&](auto) { ::sigaction(SIGBUS, &m_informed, &during); }), 0);
+    EXPECT_TRUE(installed().sa_sigaction == m_informed.sa_sigaction);
+    ::sigaction(SIGBUS, &during, nullptr);
     ::raise(SIGBUS);
-    EXPECT_EQ(hosts_errors, 13);
+    EXPECT_EQ(hosts_errors, 1);
     EXPECT_EQ(lend(0, SIZE, [](auto) { ::raise(SIGBUS); }), 0);
-    EXPECT_EQ(hosts_errors, 14);
-    ::sigaction(SIGBUS, nullptr, &found);
-    EXPECT_TRUE(found.sa_handler == plain.sa_handler);
+    EXPECT_EQ(hosts_errors, 2);
+    EXPECT_TRUE(installed().sa_handler == m_plain.sa_handler);
 
     // They come before the library knows whose they are.
     struct sigaction fresh = {};
@@ -258,68 +315,33 @@ TEST_F(Lending, LeavesTheHostItsBusErrors)
     ::sigaction(SIGBUS, &fresh, nullptr);
     std::thread other;
     host.after_sigaction = [&] {
-        hosts_page =
-            static_cast<std::uint8_t *>(::mmap(nullptr, 4096, PROT_READ, MAP_SHARED, empty, 0));
-        other = std::thread([] { EXPECT_EQ(*hosts_page, 0); });
+        map_page();
+        other = std::thread(touch_page);
         std::this_thread::sleep_for(std::chrono::milliseconds(20));
     };
     EXPECT_EQ(lend(0, SIZE, [](auto) {}), 0);
     other.join();
-    EXPECT_EQ(hosts_errors, 115);
-    ::sigaction(SIGBUS, &plain, nullptr);
+    EXPECT_EQ(hosts_errors, 103);
+    ::sigaction(SIGBUS, &m_plain, nullptr);
     host.after_sigaction = [] { ::raise(SIGBUS); };
     EXPECT_EQ(lend(0, SIZE, [](auto) {}), 0);
-    EXPECT_EQ(hosts_errors, 116);
+    EXPECT_EQ(hosts_errors, 104);
+}
 
-    // Another thread reads what is cut off.
-    EXPECT_EQ(lend(0, SIZE,
-                   [&](const std::uint8_t *lent) {
-                       hosts_page = const_cast<std::uint8_t *>(lent);
-                       cut(0);
-                       std::thread([=] { EXPECT_EQ(*hosts_page, 0); }).join();
-                   }),
-              -1);
-    EXPECT_EQ(hosts_errors, 117);
-    restore();
-
-    // A signal that another program sends, and an error of the host that nobody handles.
-    const auto end_of_child = [&](auto handler, bool sent, auto flags) {
-        const pid_t child = ::fork();
-        if (child == 0) {
-            struct sigaction action = {};
-            action.sa_handler = handler;
-            action.sa_flags = static_cast<int>(flags);
-            ::sigaction(SIGBUS, &action, nullptr);
-            hosts_page =
-                static_cast<std::uint8_t *>(::mmap(nullptr, 4096, PROT_READ, MAP_SHARED, empty, 0));
-            const std::int32_t result = lend(0, SIZE, [&](const std::uint8_t *) {
-                if (sent)
-                    ::raise(SIGBUS);
-                else
-                    hosts_errors += *hosts_page;
-            });
-            ::_exit(result);
-        }
-        int status = -1;
-        ::waitpid(child, &status, 0);
-        return WIFSIGNALED(status) ? -WTERMSIG(status) : WEXITSTATUS(status);
-    };
-    EXPECT_EQ(end_of_child(SIG_DFL, true, 0), -SIGBUS);
-    EXPECT_EQ(end_of_child(SIG_IGN, true, 0), 0);
-    EXPECT_EQ(end_of_child(SIG_DFL, false, 0), -SIGBUS);
-    EXPECT_EQ(end_of_child(SIG_IGN, false, 0), -SIGBUS);
+TEST_F(HostsBusErrors, EndTheProcessThatHandlesNone)
+{
+    EXPECT_EQ(end_of_child(SIG_DFL, true), -SIGBUS);
+    EXPECT_EQ(end_of_child(SIG_IGN, true), 0);
+    EXPECT_EQ(end_of_child(SIG_DFL, false), -SIGBUS);
+    EXPECT_EQ(end_of_child(SIG_IGN, false), -SIGBUS);
     EXPECT_EQ(end_of_child([](int) {}, false, SA_RESETHAND), -SIGBUS);  // after the first
     ::signal(SIGBUS, SIG_IGN);
-    EXPECT_EQ(lend(0, SIZE, [](const std::uint8_t *) { ::raise(SIGBUS); }), 0);
-    ::signal(SIGBUS, SIG_DFL);
-    ::close(empty);
-    img_platform_close(m_fd);
+    EXPECT_EQ(lend(0, SIZE, [](auto) { ::raise(SIGBUS); }), 0);
 }
 
 // Valgrind itself ends there.
-TEST_F(Lending, LeavesBlockedBusErrorsPending)
+TEST_F(HostsBusErrors, StayPendingWhereTheyAreBlocked)
 {
-    open(0);
     sigset_t bus_errors;
     ::sigemptyset(&bus_errors);
     ::sigaddset(&bus_errors, SIGBUS);
@@ -330,7 +352,6 @@ TEST_F(Lending, LeavesBlockedBusErrorsPending)
     EXPECT_EQ(::sigtimedwait(&bus_errors, nullptr, &now), SIGBUS);
     EXPECT_EQ(::sigtimedwait(&bus_errors, nullptr, &now), -1);
     ::pthread_sigmask(SIG_UNBLOCK, &bus_errors, nullptr);
-    img_platform_close(m_fd);
 }
 
 // Another program cuts the file short and puts back what was there, all the time.
