@@ -220,11 +220,14 @@ protected:
         ::close(m_empty);
         img_platform_close(m_fd);
     }
-    // Makes the page where reading raises a bus error.
-    void map_page(void *hint = nullptr) const
+    // Makes the page where reading raises a bus error, at `place` if that is free.
+    bool map_page(const std::uint8_t *place = nullptr) const
     {
-        hosts_page =
-            static_cast<std::uint8_t *>(::mmap(hint, 4096, PROT_READ, MAP_SHARED, m_empty, 0));
+        const int flags = MAP_SHARED | (place != nullptr ? MAP_FIXED_NOREPLACE : 0);
+        void *const page =
+            ::mmap(const_cast<std::uint8_t *>(place), 4096, PROT_READ, flags, m_empty, 0);
+        hosts_page = static_cast<std::uint8_t *>(page);
+        return page != MAP_FAILED;
     }
     static void touch_page() { EXPECT_EQ(*hosts_page, 0); }
     static struct sigaction installed()
@@ -261,12 +264,12 @@ TEST_F(HostsBusErrors, ReachItsHandler)
     struct sigaction once = m_plain;
     once.sa_flags = static_cast<int>(SA_RESETHAND);
     // A page of the host below the bytes that are lent, or above them; in this thread or another.
-    for (const std::ptrdiff_t distance : {-(1 << 22), 1 << 22})
+    for (const std::ptrdiff_t step : {-(1 << 20), 1 << 20})
         for (const bool elsewhere : {false, true})
             for (const auto *const action : {&m_plain, &m_informed, &once}) {
                 ::sigaction(SIGBUS, action, nullptr);
                 const std::int32_t result = lend(0, SIZE, [&](const std::uint8_t *lent) {
-                    map_page(const_cast<std::uint8_t *>(lent + distance));
+                    while (!map_page(lent += step)) continue;
                     if (elsewhere)
                         std::thread(touch_page).join();
                     else
