@@ -130,6 +130,13 @@ TEST_F(Platform, AsksForTheHeadOfAFileOnce)
     ::close(fd);
     EXPECT_EQ(img_platform_seek(fd, 0, 2), -1);
     EXPECT_EQ(img_platform_close(fd), -1);
+    write_file(m_file, content);
+    const std::int32_t cut = img_platform_open(m_file.c_str(), 0, 0);
+    ASSERT_EQ(::truncate(m_file.c_str(), 100), 0);
+    bytes block(100);
+    EXPECT_EQ(img_platform_read(cut, &block[0], 100), 100);
+    EXPECT_EQ(block, part(0, 100));
+    img_platform_close(cut);
 
     std::vector<std::int32_t> all;
     for (int i = 0; i < 65; ++i) all.push_back(img_platform_open(m_file.c_str(), 0, 0));

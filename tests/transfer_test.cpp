@@ -380,6 +380,12 @@ TEST_F(Transfers, StayWithinAnImageInMemory)
         EXPECT_EQ(refusal(load), text.first + " beyond virtual eof!!\n");
         EXPECT_EQ(refusal([&] { return dump(3, 9); }), text.second + " past virtual eof!!\n");
         EXPECT_EQ(desc->mem_image[static_cast<std::size_t>(last)], 0);
+        if (!img_is_tiled(desc)) {  // the first three lines, and no more
+            std::ranges::fill(buffer, 9);
+            file->veof = last - 20 * (layout == IMG_LAYOUT_BIP ? nbands : 1);
+            EXPECT_EQ(refusal(load), text.first + " beyond virtual eof!!\n");
+            EXPECT_TRUE(buffer[59] == 0 && buffer[60] == 9);
+        }
         file->veof_max = last;
         EXPECT_EQ(dump(3, 9) + dump(0, 0), 0);
         EXPECT_EQ(file->veof, last);

@@ -130,7 +130,7 @@ TEST_F(VirtualIo, ReachesThePixelsInMemoryAndNoneBeyond)
         const auto refused = [&](auto... place) { return refusal(pixel, 1, place...); };
         EXPECT_EQ(pixel(1, 6, 5, 1) + pixel(0, 6, 5, 2), 0);
         EXPECT_EQ(value.back(), (126 * nbytes) % 256);
-        EXPECT_EQ(pixel(0, 6, 5, 1), 0);
+        EXPECT_EQ(pixel(1, 0, 0, 0) + pixel(0, 6, 5, 1), 0);
         EXPECT_EQ(value, bytes(value.size(), 99));
         EXPECT_EQ(refused(6, 5, 3), beyond);
         EXPECT_EQ(refused(INT32_MAX, 0, 0), beyond);
