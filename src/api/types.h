@@ -58,8 +58,8 @@ struct img_type_desc {
     img_write_fn write;
     img_read_tiles_fn read_tiles;
     img_write_tiles_fn write_tiles;
-    // Moves the window of `mem_desc`, an image in memory, from or to the image; img_std_io_virtual
-    // says how.
+    // Moves all of `mem_desc`, an image in memory, from or to the image, as img_std_io_virtual
+    // does.
     std::int32_t (*io_virtual)(std::int32_t writing, img_desc *desc, img_desc *mem_desc,
                                std::int32_t line0, std::int32_t samp0);
     // Moves one sample, as img_std_pix_io_virtual does.

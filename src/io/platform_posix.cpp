@@ -79,8 +79,6 @@ int system_flags(std::int32_t oflags)
     return flags;
 }
 
-constexpr std::int32_t MAX_POSITION = INT32_MAX;
-
 // Reads from the head of a file that was just opened. Returns the bytes read, or -1 when they are
 // not to be had there.
 std::int32_t read_head(open_file *file, void *buffer, std::uint32_t count)
@@ -116,7 +114,7 @@ std::int32_t close_and_fail(int fd, int error)
 template <typename Transfer>
 std::int32_t transfer_whole(open_file *file, std::uint32_t count, Transfer transfer)
 {
-    if (count > static_cast<std::uint32_t>(MAX_POSITION - file->position)) {
+    if (count > static_cast<std::uint32_t>(INT32_MAX - file->position)) {
         errno = EINVAL;
         return -1;
     }
@@ -215,8 +213,8 @@ std::int32_t img_platform_seek(std::int32_t fd, std::int32_t offset, std::int32_
         if (base == -1) return -1;
     }
     const std::int64_t at = base + offset;
-    if (whence < IMG_SEEK_START || whence > IMG_SEEK_END || at < 0 || at > MAX_POSITION) {
-        errno = at > MAX_POSITION ? EOVERFLOW : EINVAL;
+    if (whence < IMG_SEEK_START || whence > IMG_SEEK_END || at < 0 || at > INT32_MAX) {
+        errno = at > INT32_MAX ? EOVERFLOW : EINVAL;
         return -1;
     }
     file->position = static_cast<std::int32_t>(at);

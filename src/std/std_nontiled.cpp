@@ -256,7 +256,6 @@ std::int32_t img_std_write_nontiled_interleaved(img_desc *desc, std::int32_t lin
     const std::int32_t row_length = desc->nbands * desc->nbytes * nsamps;
     for (std::int32_t i = 0; i < nlines; ++i) {
         const std::int64_t offset = img_std_pixel_offset(desc, std::int64_t{line} + i, samp);
-        const std::int64_t at = offset + std::int64_t{band} * desc->nbytes;
         const std::uint8_t *const row = buffer + row_start(desc, i, stride);
         if (desc->mem_image) {
             std::uint8_t *const pixels = img_std_memory_to_write(desc, offset, row_length);
@@ -265,7 +264,8 @@ std::int32_t img_std_write_nontiled_interleaved(img_desc *desc, std::int32_t lin
             img_std_copy_samples(row, bytes_of(desc, 1), pixels + bytes_of(desc, band),
                                  pixel_length, static_cast<std::size_t>(nsamps), desc->nbytes,
                                  img_std_exchanges_bytes(desc));
-        } else if (write_interleaved_line(desc, at, nsamps, row) == -1) {
+        } else if (write_interleaved_line(desc, offset + std::int64_t{band} * desc->nbytes, nsamps,
+                                          row) == -1) {
             return -1;
         }
     }

@@ -65,7 +65,7 @@ std::string vitec_header::date() const
 
 bool is_vitec_tile_side(std::int32_t side)
 {
-    return side >= 8 && side <= 32768 && std::has_single_bit(static_cast<std::uint32_t>(side));
+    return side >= 8 && side <= 32768 && img_is_power_of_two(side) != 0;
 }
 
 std::optional<vitec_header> read_vitec_header(const std::string &name)
