@@ -2,6 +2,9 @@
 // not, each held against what is known of the handles and the files.
 #include "checked_image.h"
 
+#include "base/id_pool.h"
+#include "base/image_table.h"
+
 namespace {
 
 class call_sequence {

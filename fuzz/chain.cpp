@@ -2,7 +2,13 @@
 // all widths. Whatever a chain is made of, it stays inside the buffers, and without it the image
 // is what it was.
 #include "chain/chain.h"
+#include "chain/chain_apply.h"
+#include "chain/chain_links.h"
+#include "chain/chain_lut.h"
+#include "chain/chain_prepare.h"
+#include "chain/stretch.h"
 #include "checked_image.h"
+#include "imgfile/img.h"
 
 #include <cstring>
 

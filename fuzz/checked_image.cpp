@@ -1,6 +1,11 @@
 #include "checked_image.h"
 
-#include "chain/chain.h"
+#include "api/library.h"
+#include "base/id_pool.h"
+#include "base/image_table.h"
+#include "base/img_desc.h"
+#include "chain/chain_links.h"
+#include "imgfile/img.h"
 
 #include <cerrno>
 #include <cstdio>

@@ -1,7 +1,8 @@
 #include "memory_disk.h"
 
-#include "api/img.h"
+#include "imgfile/img.h"
 #include "io/io_method.h"
+#include "std/std.h"
 
 #include <algorithm>
 #include <cerrno>

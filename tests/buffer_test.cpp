@@ -1,6 +1,11 @@
 // Windows: which part of them the image has, the fill around it, and what is delivered, held
 // against the same done sample by sample.
-#include "access/buffer.h"
+#include "access/window.h"
+#include "base/image_table.h"
+#include "base/img_desc.h"
+#include "base/types.h"
+#include "imgfile/img.h"
+#include "std/std.h"
 #include "support/effort.h"
 #include "support/file_test.h"
 #include "support/guarded_buffer.h"

@@ -1,6 +1,13 @@
 // The image chain: its structure, where its links work, and what it makes of the data, held
 // against the same links applied to one sample after the other.
+#include "base/image_table.h"
 #include "chain/chain.h"
+#include "chain/chain_apply.h"
+#include "chain/chain_links.h"
+#include "chain/chain_lut.h"
+#include "chain/chain_prepare.h"
+#include "chain/stretch.h"
+#include "imgfile/img.h"
 #include "support/random.h"
 #include "support/refusal.h"
 #include "support/sample.h"
@@ -368,7 +375,7 @@ TEST(RandomChain, DoesToTheDataWhatItsLinksDoToEachSample)
             computed_from.push_back(static_cast<std::uint16_t>(value));
             value = through({&computed}, value, bits, bits);
             value = through({&in_place}, value, bits, wide);
-            value = through({&narrowing}, value, bits, narrowing.bits_out);  // still the image's
+            value = through({&narrowing}, value, wide, narrowing.bits_out);
             value = through({&third}, value, narrowing.bits_out, narrowing.bits_out);
             value = through({&last}, value, last.bits_in, last.bits_out);
             put(expected.data(), out, i, through({&pending}, value, last.bits_out, last.bits_out));

@@ -7,7 +7,12 @@
 #include "support/file_test.h"
 #include "support/layout_rules.h"
 
-#include "chain/chain.h"
+#include "base/image_table.h"
+#include "base/img_desc.h"
+#include "base/settings.h"
+#include "base/types.h"
+#include "chain/chain_links.h"
+#include "imgfile/img.h"
 #include "io/io_method.h"
 #include "std/std.h"
 

@@ -1,4 +1,10 @@
-#include "api/report.h"
+#include "api/open.h"
+#include "base/id_pool.h"
+#include "base/image_table.h"
+#include "base/img_desc.h"
+#include "base/report.h"
+#include "imgfile/img.h"
+#include "std/std.h"
 #include "support/file_test.h"
 
 namespace {

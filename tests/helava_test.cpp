@@ -1,6 +1,8 @@
-#include "formats/helava.h"
-
+#include "base/image_table.h"
+#include "base/img_desc.h"
+#include "imgfile/img.h"
 #include "std/std.h"
+
 #include "support/file_test.h"
 
 namespace {

@@ -1,3 +1,4 @@
+#include "base/img_desc.h"
 #include "io/io_method.h"
 
 #include "support/fault_memory.h"

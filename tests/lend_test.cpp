@@ -1,7 +1,12 @@
 // Bytes that are read where they lie, what may become of them meanwhile, and the kernels that
 // move and map them.
-#include "api/scratch.h"
+#include "base/image_table.h"
+#include "base/img_desc.h"
+#include "base/scratch.h"
+#include "chain/chain.h"
+#include "chain/chain_lut.h"
 #include "chain/ramp.h"
+#include "imgfile/img.h"
 #include "io/platform.h"
 #include "std/std.h"
 #include "support/effort.h"

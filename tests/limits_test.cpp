@@ -1,7 +1,8 @@
 // What docs/limits.md promises and no other test holds: the memory that a call takes, and two
 // images of one file.
-#include "api/scratch.h"
+#include "base/scratch.h"
 #include "chain/chain.h"
+#include "imgfile/img.h"
 #include "support/fault_memory.h"
 #include "support/file_test.h"
 

@@ -4,10 +4,19 @@
 #include "support/fault_memory.h"
 
 #include "access/tile_cache.h"
-#include "api/scratch.h"
+#include "base/id_pool.h"
+#include "base/image_table.h"
+#include "base/img_desc.h"
+#include "base/scratch.h"
+#include "base/settings.h"
 #include "chain/chain.h"
+#include "chain/chain_apply.h"
+#include "chain/chain_links.h"
+#include "chain/stretch.h"
 #include "formats/words.h"
+#include "imgfile/img.h"
 #include "io/io_method.h"
+#include "std/std.h"
 #include "support/file_test.h"
 
 #include <functional>

@@ -57,7 +57,7 @@ expect 'control files of libimgfile-dev' 'control md5sums ' "$(cat libimgfile-de
 expect 'control files of imgfile' 'control md5sums ' "$(cat imgfile.control)"
 
 documents() { printf "usr/share/doc/$1/%s\n" changelog.gz copyright; }
-functions=$(sed -n 's/^IMG_EXPORT .*[ *]\(img_[a-z_]*\)(.*/\1/p' "$source/src/api/img.h")
+functions=$(sed -n 's/^IMG_EXPORT .*[ *]\(img_[a-z_]*\)(.*/\1/p' "$source/include/imgfile/img.h")
 {
     printf "$libraries/%s\n" libimgfile.so.0 "libimgfile.so.$version"
     documents libimgfile0

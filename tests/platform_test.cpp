@@ -1,6 +1,7 @@
+#include "imgfile/img.h"
+#include "io/io_method.h"
 #include "io/platform.h"
 
-#include "io/io_method.h"
 #include "support/fault_system.h"
 #include "support/file_test.h"
 

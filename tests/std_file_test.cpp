@@ -1,6 +1,11 @@
+#include "base/image_table.h"
+#include "base/img_desc.h"
+#include "base/settings.h"
+#include "base/type_hooks.h"
+#include "base/types.h"
+#include "imgfile/img.h"
 #include "std/std.h"
 
-#include "io/io_method.h"
 #include "support/file_test.h"
 #include "support/refusal.h"
 

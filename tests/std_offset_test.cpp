@@ -1,3 +1,6 @@
+#include "base/image_table.h"
+#include "base/img_desc.h"
+#include "imgfile/img.h"
 #include "std/std.h"
 
 #include "support/layout_rules.h"

@@ -1,5 +1,6 @@
 // The contrast stretch against a second, plain computation.
 #include "chain/chain.h"
+#include "chain/stretch.h"
 #include "support/effort.h"
 #include "support/random.h"
 #include "support/refusal.h"

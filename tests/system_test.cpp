@@ -1,4 +1,7 @@
 // What an operating system, a disk, other programs and a sudden end may do to a file.
+#include "base/image_table.h"
+#include "base/img_desc.h"
+#include "imgfile/img.h"
 #include "io/platform.h"
 #include "std/std.h"
 #include "support/effort.h"

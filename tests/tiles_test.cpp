@@ -1,4 +1,9 @@
 // Whole tiles: the runs that there are, and what they need.
+#include "base/image_table.h"
+#include "base/img_desc.h"
+#include "base/settings.h"
+#include "base/types.h"
+#include "imgfile/img.h"
 #include "std/std.h"
 
 #include "support/file_test.h"

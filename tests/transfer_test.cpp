@@ -1,8 +1,12 @@
 // Windows and whole tiles in every layout, held against the addressing rules alone; how many calls
 // of the file they take, and what is said when one of them fails.
+#include "access/tile_cache.h"
+#include "base/image_table.h"
+#include "base/img_desc.h"
+#include "base/settings.h"
+#include "imgfile/img.h"
 #include "std/std.h"
 
-#include "access/tile_cache.h"
 #include "support/effort.h"
 #include "support/file_test.h"
 #include "support/layout_rules.h"

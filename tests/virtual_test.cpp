@@ -1,4 +1,8 @@
 // Between file images and images in memory.
+#include "base/image_table.h"
+#include "base/img_desc.h"
+#include "base/types.h"
+#include "imgfile/img.h"
 #include "std/std.h"
 
 #include "support/file_test.h"

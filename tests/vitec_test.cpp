@@ -1,7 +1,10 @@
+#include "base/image_table.h"
+#include "base/img_desc.h"
 #include "formats/vitec.h"
-
 #include "formats/words.h"
+#include "imgfile/img.h"
 #include "std/std.h"
+
 #include "support/file_test.h"
 
 #include <ctime>

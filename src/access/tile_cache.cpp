@@ -1,6 +1,6 @@
 #include "access/tile_cache.h"
 
-#include "api/report.h"
+#include "base/report.h"
 
 #include <algorithm>
 #include <cstring>

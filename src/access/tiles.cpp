@@ -1,8 +1,11 @@
-// Whole tiles for the host and for the tiled regions: through the image's cache, if it has one.
+// Runs of whole tiles: validated here, then moved by the type's operations, through the image's
+// cache if it has one. The cache is made here, at the first load. Read tiles.h and tile_cache.h
+// first.
+#include "access/tiles.h"
+
 #include "access/tile_cache.h"
-#include "api/img.h"
-#include "api/img_desc.h"
-#include "api/types.h"
+#include "base/img_desc.h"
+#include "base/types.h"
 
 namespace {
 
@@ -20,7 +23,7 @@ bool is_a_run_of_tiles(const img_desc *desc, std::int32_t first_tile, std::int32
            std::int64_t{first_tile} + ntiles <= tile_count(desc);
 }
 
-// The cache's way back to the file; note the order of its arguments.
+// The cache's write-back operation. The band comes before the tile here, after it in write_tiles.
 std::int32_t img_std_write_tile(void *desc, std::int32_t band, std::int32_t tile,
                                 const std::uint8_t *buffer)
 {
@@ -28,7 +31,7 @@ std::int32_t img_std_write_tile(void *desc, std::int32_t band, std::int32_t tile
     return img_type_of(image).write_tiles(image, tile, 1, band, buffer);
 }
 
-// Makes the image's cache at its first use. A budget that is too small is not tried again.
+// Makes the image's cache at the first load. A budget that is too small is not tried again.
 void make_cache(img_desc *desc)
 {
     if (desc->cache_pending == 0 || desc->cache_mb <= 0) return;
@@ -69,33 +72,28 @@ std::int32_t dump_through_cache(img_desc *desc, std::int32_t first_tile, std::in
 
 }  // namespace
 
-std::int32_t img_load_tiles(img_handle handle, std::int32_t first_tile, std::int32_t ntiles,
-                            std::int32_t band, void *buffer)
+std::int32_t img_load_tile_run(img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,
+                               std::int32_t band, std::uint8_t *buffer)
 {
-    img_desc *const desc = img_find_image(handle);
-    if (desc == nullptr || desc->mem_image || img_access_mode(desc) == IMG_OPEN_WRITE_ONLY ||
+    if (desc->mem_image || img_access_mode(desc) == IMG_OPEN_WRITE_ONLY ||
         img_type_of(desc).read_tiles == nullptr)
         return -1;
     if (!img_is_tiled(desc) || ntiles < 1) return 0;
     if (buffer == nullptr || !is_a_run_of_tiles(desc, first_tile, ntiles, band)) return -1;
     make_cache(desc);
-    auto *const planes = static_cast<std::uint8_t *>(buffer);
     if (desc->tile_cache != nullptr)
-        return load_through_cache(desc, first_tile, ntiles, band, planes);
-    return img_type_of(desc).read_tiles(desc, first_tile, ntiles, band, planes);
+        return load_through_cache(desc, first_tile, ntiles, band, buffer);
+    return img_type_of(desc).read_tiles(desc, first_tile, ntiles, band, buffer);
 }
 
-std::int32_t img_dump_tiles(img_handle handle, std::int32_t first_tile, std::int32_t ntiles,
-                            std::int32_t band, const void *buffer)
+std::int32_t img_dump_tile_run(img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,
+                               std::int32_t band, const std::uint8_t *buffer)
 {
-    img_desc *const desc = img_find_image(handle);
-    if (desc == nullptr || img_access_mode(desc) == IMG_OPEN_READ_ONLY ||
-        img_type_of(desc).write_tiles == nullptr)
+    if (img_access_mode(desc) == IMG_OPEN_READ_ONLY || img_type_of(desc).write_tiles == nullptr)
         return -1;
     if (!img_is_tiled(desc) || ntiles < 1) return 0;
     if (buffer == nullptr || !is_a_run_of_tiles(desc, first_tile, ntiles, band)) return -1;
-    const auto *const planes = static_cast<const std::uint8_t *>(buffer);
     if (desc->tile_cache != nullptr)
-        return dump_through_cache(desc, first_tile, ntiles, band, planes);
-    return img_type_of(desc).write_tiles(desc, first_tile, ntiles, band, planes);
+        return dump_through_cache(desc, first_tile, ntiles, band, buffer);
+    return img_type_of(desc).write_tiles(desc, first_tile, ntiles, band, buffer);
 }

@@ -1,17 +1,125 @@
-// The beginning and the end of an image: opening, creating and closing.
-#include "api/img_desc.h"
-#include "api/report.h"
-#include "api/types.h"
-#include "chain/chain.h"
+// The life of an image: opening, creating, closing, and the record that lives in between. A record
+// is in the table of images from its allocation on, also while the types are asked for it. Read
+// open.h first, then base/types.h for the order in which a type's operations are called.
+#include "api/open.h"
+
+#include "access/tile_cache.h"
+#include "api/library.h"
+#include "base/image_table.h"
+#include "base/img_desc.h"
+#include "base/report.h"
+#include "base/settings.h"
+#include "base/types.h"
+#include "chain/chain_links.h"
+#include "chain/stretch.h"
+#include "io/io_method.h"
 
 #include <cerrno>
 #include <new>
 #include <numeric>
+#include <utility>
 
 namespace {
 
-constexpr int INVALID_ARGUMENT = 22;  // error number, of the same value on every system
+// Error numbers of the interface, of the same value on every system.
+constexpr int NO_FREE_HANDLE = 24;
+constexpr int INVALID_ARGUMENT = 22;
+
 constexpr std::int32_t CREATE_FLAGS = IMG_OPEN_READ_WRITE | IMG_OPEN_CREATE | IMG_OPEN_TRUNCATE;
+
+// Returns a record that names no file and no type yet, or null.
+img_desc *new_record(img_handle handle, std::int32_t oflags)
+{
+    return new (std::nothrow) img_desc{
+        .type = IMG_NO_TYPE,
+        .filename = nullptr,
+        .io_method = nullptr,
+        .oflags = oflags,
+        .nsamps = 0,
+        .nlines = 0,
+        .tile_nsamps = 0,
+        .tile_nlines = 0,
+        .nbands = 0,
+        .nbytes = 0,
+        .nbits = 0,
+        .swap = 0,
+        .layout = IMG_LAYOUT_DEFAULT,
+        .band_map = {0, 1, 2},
+        .mem_image = nullptr,
+        .lut_size = 0,
+        .lut = {},
+        .unclipped = 0,
+        .header = nullptr,
+        .std_file = nullptr,
+        .handle = handle,
+        .tile_cache = nullptr,
+        .cache_mb = img_cache_mb,
+        .cache_pending = 1,
+        .virtual_tiled = 0,
+        .merge_bands = 0,
+        .merge_fn = nullptr,
+    };
+}
+
+void release_image(img_desc *desc, std::int32_t flush)
+{
+    const img_handle handle = desc->handle;
+    img_tile_cache_destroy(std::exchange(desc->tile_cache, nullptr), flush);
+    if (img_type_of(desc).close != nullptr) img_type_of(desc).close(desc);
+    delete desc;
+    img_image_slot(handle) = nullptr;
+    img_chain_init(handle);
+    img_pool_give_back(img_handle_pool, handle);
+}
+
+img_handle release_without_memory(img_desc *desc)
+{
+    img_fail("Out of memory!!!\n");
+    release_image(desc, 0);
+    return -1;
+}
+
+// Takes a handle and makes its record; `give_name(record)` names it and returns -1 when memory is
+// short. Returns null after a message.
+template <typename GiveName>
+img_desc *allocate_image(std::int32_t flags, GiveName give_name)
+{
+    img_library_init();
+    const img_handle handle = img_pool_take(img_handle_pool);
+    if (handle == -1) {
+        img_fail("No more open images available!!!\n");
+        errno = NO_FREE_HANDLE;
+        return nullptr;
+    }
+    img_desc *const desc = new_record(handle, flags | IMG_OPEN_BINARY);
+    img_image_slot(handle) = desc;
+    if (desc == nullptr) {
+        img_fail("Out of memory!!!\n");
+        img_release_image(handle, 0);
+        return nullptr;
+    }
+    if (give_name(desc) == -1) {
+        release_without_memory(desc);
+        return nullptr;
+    }
+    return desc;
+}
+
+img_desc *allocate_named(const char *name, std::int32_t flags)
+{
+    return allocate_image(flags, [name](img_desc *desc) {
+        return img_split_name(name != nullptr ? name : "", &desc->filename, &desc->io_method);
+    });
+}
+
+img_desc *allocate_plain(const char *filename, const img_io_method *method, std::int32_t flags)
+{
+    return allocate_image(flags, [=](img_desc *desc) {
+        desc->io_method = method != nullptr ? method : img_lookup_io_method("");
+        desc->filename = img_copy_name(filename);
+        return desc->filename ? 0 : -1;
+    });
+}
 
 // Makes the three identity LUTs of an image with one-byte samples, unless it has LUTs already.
 // Returns 0, or -1 when memory is short; the record then has none.
@@ -31,15 +139,16 @@ std::int32_t img_init_luts(img_desc *desc)
     return 0;
 }
 
-// Puts the stretch of two-byte samples to 8 bits into the image's chain: one link that computes
-// it from each window, and one that applies it. Returns 0, or -1 after a message.
+// Puts the stretch of two-byte samples to 8 bits into the image's chain: a link that computes it
+// from each window, and a link that applies it. Returns 0, or -1 after a message.
 std::int32_t img_set_auto_16to8bit_mapdown(img_handle handle)
 {
     img_chain_remove_link(handle, img_mapdown_src_slot);
     img_chain_remove_link(handle, img_mapdown_slot);
-    if (img_chain_add_lut_create_link(handle, img_mapdown_src_slot, nullptr,
+    if (img_chain_add_lut_create_link(handle, img_mapdown_src_slot, /*arg=*/nullptr,
                                       img_chain_create_16to8_lut, img_mapdown_slot,
-                                      img_query_nbits(handle), 8, 1, nullptr, 0) != 0)
+                                      img_query_nbits(handle), /*bits_out=*/8, /*remap=*/1,
+                                      /*lut=*/nullptr, /*owned=*/0) != 0)
         return img_fail("img_set_auto_16to8bit_mapdown: Error installing auto mapdown in image "
                         "chain\n");
     return 0;
@@ -47,80 +156,119 @@ std::int32_t img_set_auto_16to8bit_mapdown(img_handle handle)
 
 // Gives an image whose storage stands its chain. Returns the handle, or -1 after a message and
 // with the image released.
-img_handle finish_opening(img_handle handle)
+img_handle finish_opening(img_desc *desc)
 {
-    img_chain_init(handle);
-    if (img_find_image(handle)->nbytes == 2 && img_set_auto_16to8bit_mapdown(handle) != 0) {
+    img_chain_init(desc->handle);
+    if (desc->nbytes == 2 && img_set_auto_16to8bit_mapdown(desc->handle) != 0) {
         img_fail("DO_16_TO_8: Error in img_set_auto_16to8bit_mapdown()\n");
-        img_release_image(handle, 0);
+        release_image(desc, 0);
         return -1;
     }
-    return handle;
+    return desc->handle;
 }
 
-img_handle release_for_want_of_memory(img_handle handle)
-{
-    img_fail("Out of memory!!!\n");
-    img_release_image(handle, 0);
-    return -1;
-}
-
-// Offers the file to the types in slot order. Returns 0 when one of them took it, -1 when none.
-std::int32_t open_as_some_type(img_desc *desc)
+// Offers the file to the types in slot order. Returns true when one of them accepts it.
+bool open_as_some_type(img_desc *desc)
 {
     for (std::int32_t slot = 0; slot < IMG_MAX_TYPES; ++slot) {
-        const img_type_desc &type = img_type_table[static_cast<std::size_t>(slot)];
+        const img_type_desc &type = img_type_slot(slot);
         if (type.enabled == 0 || type.open == nullptr) continue;
         desc->type = slot;
-        if (type.open(desc) != -1) return 0;
+        if (type.open(desc) != -1) return true;
     }
     desc->type = IMG_NO_TYPE;
-    return -1;
+    return false;
+}
+
+// `desc` null: the allocation failed.
+img_handle open_image(img_desc *desc)
+{
+    if (desc == nullptr) return -1;
+    if (!open_as_some_type(desc)) {
+        release_image(desc, 0);
+        errno = INVALID_ARGUMENT;
+        return -1;
+    }
+    if (img_init_luts(desc) == -1) return release_without_memory(desc);
+    return finish_opening(desc);
+}
+
+// The geometry of a new image, as a caller states it.
+struct new_geometry {
+    std::int32_t nlines, nsamps, nbands, type, tile_nsamps, tile_nlines, nbytes;
+};
+
+// Creates an image; `allocate()` makes its record. `name` is for messages.
+template <typename Allocate>
+img_handle create_image(const char *name, new_geometry geometry, Allocate allocate)
+{
+    img_library_init();
+    if (name == nullptr || *name == '\0') return img_fail("No image file name specified!!\n");
+    if (geometry.type < 0 || geometry.type > IMG_NO_TYPE) geometry.type = IMG_NO_TYPE;
+    const img_type_desc &type = img_type_slot(geometry.type);
+    if (type.write == nullptr) return img_fail("Unwritable image type specified as output!!\n");
+    if (type.enabled == 0) return img_fail("Unsupported image file type!!\n");
+
+    img_desc *const desc = allocate();
+    if (desc == nullptr) return -1;
+    desc->type = geometry.type;
+    img_set_image_params(desc, geometry.nlines, geometry.nsamps, geometry.tile_nsamps,
+                         geometry.tile_nlines, geometry.nbands, geometry.nbytes, /*nbits=*/-1,
+                         IMG_LAYOUT_DEFAULT, /*lut_size=*/0, nullptr, nullptr, nullptr);
+    if (img_init_luts(desc) == -1) return release_without_memory(desc);
+    if (type.create == nullptr || type.create(desc) == -1) {
+        release_image(desc, 0);
+        return img_fail("img_createfile: could not create %s!\n", name);
+    }
+    return finish_opening(desc);
 }
 
 }  // namespace
 
+img_handle img_alloc_image(const char *name, std::int32_t flags)
+{
+    const img_desc *const desc = allocate_named(name, flags);
+    return desc != nullptr ? desc->handle : -1;
+}
+
+void img_release_image(img_handle handle, std::int32_t flush)
+{
+    if (img_desc *const desc = img_find_image(handle); desc != nullptr)
+        release_image(desc, flush);
+    else
+        img_pool_give_back(img_handle_pool, handle);
+}
+
 img_handle img_openfile(const char *name, std::int32_t flags)
 {
-    const img_handle handle = img_alloc_image(name, flags);
-    if (handle == -1) return -1;
-    img_desc *const desc = img_find_image(handle);
-    if (open_as_some_type(desc) == -1) {
-        img_release_image(handle, 0);
-        errno = INVALID_ARGUMENT;
-        return -1;
-    }
-    if (img_init_luts(desc) == -1) return release_for_want_of_memory(handle);
-    return finish_opening(handle);
+    return open_image(allocate_named(name, flags));
+}
+
+img_handle img_open_plain_file(const char *filename, const img_io_method *method,
+                               std::int32_t flags)
+{
+    return open_image(allocate_plain(filename, method, flags));
 }
 
 img_handle img_createfile(const char *name, std::int32_t nlines, std::int32_t nsamps,
                           std::int32_t nbands, std::int32_t type, std::int32_t tile_nsamps,
                           std::int32_t tile_nlines, std::int32_t nbytes)
 {
-    img_library_init();
-    if (name == nullptr || *name == '\0') return img_fail("No image file name specified!!\n");
-    if (type < 0 || type > IMG_NO_TYPE) type = IMG_NO_TYPE;
-    const img_type_desc &slot = img_type_table[static_cast<std::size_t>(type)];
-    if (slot.write == nullptr) return img_fail("Unwritable image type specified as output!!\n");
-    if (slot.enabled == 0) return img_fail("Unsupported image file type!!\n");
+    return create_image(name, {nlines, nsamps, nbands, type, tile_nsamps, tile_nlines, nbytes},
+                        [name] { return allocate_named(name, CREATE_FLAGS); });
+}
 
-    const img_handle handle = img_alloc_image(name, CREATE_FLAGS);
-    if (handle == -1) return -1;
-    img_desc *const desc = img_find_image(handle);
-    desc->type = type;
-    img_set_image_params(desc, nlines, nsamps, tile_nsamps, tile_nlines, nbands, nbytes, -1,
-                         IMG_LAYOUT_DEFAULT, 0, nullptr, nullptr, nullptr);
-    if (img_init_luts(desc) == -1) return release_for_want_of_memory(handle);
-    if (slot.create == nullptr || slot.create(desc) == -1) {
-        img_release_image(handle, 0);
-        return img_fail("img_createfile: could not create %s!\n", name);
-    }
-    return finish_opening(handle);
+img_handle img_create_plain_file(const char *filename, const img_io_method *method,
+                                 std::int32_t nlines, std::int32_t nsamps, std::int32_t nbands,
+                                 std::int32_t type, std::int32_t tile_nsamps,
+                                 std::int32_t tile_nlines, std::int32_t nbytes)
+{
+    return create_image(filename, {nlines, nsamps, nbands, type, tile_nsamps, tile_nlines, nbytes},
+                        [=] { return allocate_plain(filename, method, CREATE_FLAGS); });
 }
 
 std::int32_t img_closefile(img_handle handle)
 {
-    if (img_find_image(handle) != nullptr) img_release_image(handle, 1);
+    if (img_desc *const desc = img_find_image(handle); desc != nullptr) release_image(desc, 1);
     return 0;
 }

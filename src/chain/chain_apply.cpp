@@ -1,6 +1,9 @@
-// The second half of a load: the data's way through the links.
-#include "api/report.h"
-#include "chain/chain.h"
+// Applying a chain. LUT links do not touch the samples: they are folded into one running table,
+// which is applied where the real samples are needed. Read chain.h, then chain_apply.h.
+#include "chain/chain_apply.h"
+
+#include "base/report.h"
+#include "chain/chain_lut.h"
 
 #include <algorithm>
 #include <cerrno>
@@ -8,10 +11,10 @@
 
 namespace {
 
-// The LUT links that have been passed but not yet applied to the data, folded into one table.
+// The LUT links that were passed but not yet applied to the samples, folded into one table.
 class running_lut {
 public:
-    // Makes the tables for data of up to `bits`. Returns false when memory is short.
+    // Makes the tables for samples of up to `bits`. Returns false when memory is short.
     bool allocate(std::int32_t bits)
     {
         if (bits > IMG_CHAIN_MAX_BITS) {
@@ -44,8 +47,8 @@ public:
         m_pending = true;
     }
 
-    // Re-expresses what is pending for data of `nbits`. Returns false for a width that the tables
-    // were not made for.
+    // Re-expresses the pending table for samples of `nbits`. Returns false for a width beyond the
+    // room of the tables.
     bool bring_to(std::int32_t nbits)
     {
         if (nbits < 0 || nbits > m_bits) return false;
@@ -53,7 +56,7 @@ public:
         return true;
     }
 
-    // Applies what is pending to the data and starts anew.
+    // Applies the pending table to the samples and resets it.
     bool apply_to(std::uint8_t *buffer, const img_buffer_def &def)
     {
         if (!bring_to(def.nbits)) return false;
@@ -84,17 +87,16 @@ private:
     }
 
     std::int32_t m_bits = 0;  // the tables have room for 1 << m_bits entries
-    img_chain_lut m_lut{};    // widths of what is in m_table
+    img_chain_lut m_lut{};    // widths of the pending table
     img_scratch m_table, m_spare;
     bool m_pending = false;
 };
 
-// One passage of the data through the links.
+// One passage of the samples through the links.
 class application {
 public:
-    explicit application(img_handle handle)
-        : m_handle(handle), m_chain(img_chain_of(handle)), m_current(m_chain.work_buffer),
-          m_def(m_chain.work_def)
+    explicit application(img_chain &chain)
+        : m_chain(chain), m_current(chain.work_buffer), m_def(chain.work_def)
     {
     }
     bool allocate() { return m_chain.has_lut_link == 0 || m_lut.allocate(m_chain.lut_bits); }
@@ -112,9 +114,12 @@ public:
             output = fresh.get();
         }
         if (run(link, output) == -1) return -1;
-        if (link.kind != IMG_CHAIN_REMAP_FCN) return 0;  // the data stays where it is
+        if (link.kind != IMG_CHAIN_REMAP_FCN) return 0;  // the samples stay where they are
         if (link.release_input == IMG_CHAIN_FREE_INPUT) {
-            if (m_current == m_chain.work_buffer) img_chain_release(m_handle);
+            if (m_current == m_chain.work_buffer) {
+                m_chain.work_memory.reset();
+                m_chain.work_buffer = nullptr;
+            }
             m_temporary.reset();
         }
         if (fresh) m_temporary = std::move(fresh);
@@ -123,7 +128,7 @@ public:
         return 0;
     }
 
-    // Applies what is still pending to the caller's buffer, for whose width there are tables.
+    // Applies what is still pending to the caller's buffer; the tables have room for its width.
     void finish()
     {
         if (m_lut.pending()) m_lut.apply_to(m_chain.final_buffer, *m_chain.final_def);
@@ -165,19 +170,18 @@ private:
         return 0;
     }
 
-    img_handle m_handle;
     img_chain &m_chain;
     running_lut m_lut;
-    std::uint8_t *m_current;  // where the data is, and how it is laid out
+    std::uint8_t *m_current;  // where the samples are, and how they are laid out
     const img_buffer_def *m_def;
-    img_scratch m_temporary;  // m_current, when a link's output was a fresh buffer
+    img_scratch m_temporary;  // owns m_current where a link's output was a fresh buffer
 };
 
-// Ends an application that failed: its buffers are given back, but the chain counts as prepared
-// until the next preparation starts afresh.
-std::int32_t fail_application(img_handle handle)
+// Ends an application that failed: its buffers are freed, but `prepared` stays set until the next
+// preparation.
+std::int32_t fail_application(img_chain &chain)
 {
-    img_chain_release(handle);
+    img_chain_release(chain);
     return -1;
 }
 
@@ -190,24 +194,28 @@ bool is_known(std::int32_t kind)
 
 std::int32_t img_apply_img_chain(img_handle handle)
 {
-    img_chain &chain = img_chain_of(handle);
+    return img_chain_apply(img_chain_of(handle));
+}
+
+std::int32_t img_chain_apply(img_chain &chain)
+{
     if (chain.identity != 0) return 0;
     if (chain.prepared == 0 || chain.work_buffer == nullptr) return -1;
-    application passage(handle);
+    application passage(chain);
     if (!passage.allocate()) {
         img_fail_errno("img_apply_img_chain:malloc LUT");
-        return fail_application(handle);
+        return fail_application(chain);
     }
     for (const img_chain_link &link : chain.links) {
         if (link.kind == IMG_CHAIN_EMPTY) continue;
         if (!is_known(link.kind)) {
             img_fail("img_apply_img_chain: Invalid Image Chain Process type\n");
-            return fail_application(handle);
+            return fail_application(chain);
         }
-        if (passage.pass(link) == -1) return fail_application(handle);
+        if (passage.pass(link) == -1) return fail_application(chain);
     }
     passage.finish();
-    img_chain_release(handle);
+    img_chain_release(chain);
     chain.prepared = 0;
     return 0;
 }

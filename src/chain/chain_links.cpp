@@ -1,14 +1,16 @@
-// The links of a chain: adding, removing and resetting them.
-#include "api/img_desc.h"
-#include "api/report.h"
-#include "chain/chain.h"
+// The links of a chain. Slots are plain records that share storage by kind: `kind` says which part
+// holds, and what a link owns is freed here alone. Read chain.h, then chain_links.h.
+#include "chain/chain_links.h"
+
+#include "base/count.h"
+#include "base/image_table.h"
+#include "base/report.h"
+#include "chain/chain_lut.h"
 
 #include <algorithm>
 #include <new>
 
 namespace {
-
-std::array<img_chain, IMG_MAX_HANDLES> img_chains{};
 
 bool is_slot(std::int32_t link)
 {
@@ -22,7 +24,7 @@ bool is_width(std::int32_t bits)
 
 img_chain_link &link_of(img_handle handle, std::int32_t link)
 {
-    return img_chain_of(handle).links[static_cast<std::size_t>(link)];
+    return img_chain_of(handle).links[img_count(link)];
 }
 
 img_chain_lut lut_record(std::int32_t bits_in, std::int32_t bits_out, std::uint16_t *lut,
@@ -35,7 +37,7 @@ img_chain_lut lut_record(std::int32_t bits_in, std::int32_t bits_out, std::uint1
             .owned = owned};
 }
 
-// Frees a table; a link that would fill it has nothing to fill any more.
+// Frees a table. Links that would fill it forget it.
 void free_table(img_chain &chain, std::uint16_t *table)
 {
     for (img_chain_link &link : chain.links)
@@ -43,7 +45,8 @@ void free_table(img_chain &chain, std::uint16_t *table)
     delete[] table;
 }
 
-void free_what_is_owned(img_chain &chain, img_chain_link &link)
+// Empties a slot and frees what its link owns.
+void empty_slot(img_chain &chain, img_chain_link &link)
 {
     if (link.kind == IMG_CHAIN_LUT && link.lut_def.owned != 0) free_table(chain, link.lut_def.lut);
     if (link.owns_arg != 0) {
@@ -56,7 +59,7 @@ void free_what_is_owned(img_chain &chain, img_chain_link &link)
     link.kind = IMG_CHAIN_EMPTY;
 }
 
-// A preparation for the links of before does not fit those of now.
+// Marks the chain as changed: a preparation for the earlier links no longer holds.
 void link_added(img_handle handle)
 {
     img_chain_of(handle).identity = 0;
@@ -77,24 +80,15 @@ void put_remap_link(img_handle handle, std::int32_t link, const img_chain_remap_
 
 }  // namespace
 
-img_chain &img_chain_of(img_handle handle)
-{
-    return img_chains[static_cast<std::size_t>(handle)];
-}
-
 void img_chain_init(img_handle handle)
 {
     img_chain &chain = img_chain_of(handle);
-    img_chain_release(handle);
-    for (img_chain_link &link : chain.links) free_what_is_owned(chain, link);
+    img_chain_release(chain);
+    for (img_chain_link &link : chain.links) empty_slot(chain, link);
     chain.identity = 1;
     chain.prepared = 0;
     chain.has_lut_link = 0;
     chain.lut_bits = 0;
-    chain.work_buffer = nullptr;
-    chain.work_def = nullptr;
-    chain.final_buffer = nullptr;
-    chain.final_def = nullptr;
     chain.out_bits = img_query_nbits(handle);
 }
 
@@ -172,7 +166,7 @@ std::int32_t img_chain_remove_link(img_handle handle, std::int32_t link)
     while (link != -1) {
         img_chain_link &slot = link_of(handle, link);
         link = slot.kind == IMG_CHAIN_LUT_FCN ? slot.lut_fcn.target : -1;
-        free_what_is_owned(chain, slot);
+        empty_slot(chain, slot);
     }
     img_chain_update_out_bits(handle);
     const bool empty = std::ranges::all_of(
@@ -190,26 +184,4 @@ void img_chain_update_out_bits(img_handle handle)
     };
     const auto last = std::find_if(chain.links.rbegin(), chain.links.rend(), states_width);
     chain.out_bits = last != chain.links.rend() ? last->remap.out_bits : img_query_nbits(handle);
-}
-
-std::int32_t img_chain_out_bits(img_handle handle)
-{
-    return img_chain_of(handle).out_bits;
-}
-
-std::int32_t img_chain_out_nbytes(img_handle handle)
-{
-    return img_chain_nbytes(img_chain_out_bits(handle));
-}
-
-std::int32_t img_chain_nbytes(std::int32_t nbits)
-{
-    return ((nbits - 1) >> 3) + 1;
-}
-
-void img_chain_release(img_handle handle)
-{
-    img_chain &chain = img_chain_of(handle);
-    chain.work_memory.reset();
-    chain.work_buffer = nullptr;
 }

@@ -1,5 +1,7 @@
-// Lookup tables at work: over a buffer, from one buffer to another, and for other widths.
-#include "chain/chain.h"
+// Lookup tables. Tables from two bytes to one are looked up only where no ramp computes the same
+// entries faster. Read chain_lut.h and ramp.h first.
+#include "chain/chain_lut.h"
+
 #include "chain/ramp.h"
 
 #include <cstring>
@@ -38,14 +40,14 @@ void map_window(const std::uint8_t *from, const img_buffer_def &from_def, std::u
     }
 }
 
-// Maps two bytes to one by computing, if the table is a ramp and the window is worth finding out.
-// Returns false when it was not done.
+// Maps two bytes to one by a ramp, if the table is one and the window is large enough to pay for
+// finding out. Returns false, with nothing mapped, otherwise.
 bool map_along_ramp(const std::uint16_t *table, std::int32_t size, const std::uint8_t *from,
                     const img_buffer_def &from_def, std::uint8_t *to, const img_buffer_def &to_def)
 {
-    constexpr std::int64_t worth_it = 4;  // samples for each entry
+    constexpr std::int64_t break_even = 4;  // samples per entry
     img_chain_ramp ramp;
-    if (std::int64_t{from_def.nlines} * from_def.nsamps < worth_it * size ||
+    if (std::int64_t{from_def.nlines} * from_def.nsamps < break_even * size ||
         !img_chain_find_ramp(table, size, &ramp))
         return false;
     for (std::int64_t row = 0; row < from_def.nlines; ++row)
@@ -112,7 +114,7 @@ std::int32_t img_chain_lut_remap(void *record, const std::uint8_t *in_buffer,
         img_chain_convert_lut(own.lut, &own, entries, &widths);
         table = entries;
     }
-    // A buffer of bytes gets bytes, whatever width the data before is said to have.
+    // The output's width decides, also where the input states an unusual one.
     const bool to_bytes = in_def->nbytes != 1 && out_def->nbytes == 1;
     if (to_bytes && pending == 0 &&
         map_along_ramp(table, size, in_buffer, *in_def, out_buffer, *out_def))

@@ -1,21 +1,25 @@
-// The first half of a load: what the image type must deliver, and where each link works.
-#include "api/img_desc.h"
-#include "api/report.h"
-#include "chain/chain.h"
+// Preparing a load. Definitions are worked out from slot 9 back to slot 0, then buffers are
+// assigned from slot 0 on. Read chain.h, then chain_prepare.h.
+#include "chain/chain_prepare.h"
+
+#include "base/image_table.h"
+#include "base/img_desc.h"
+#include "base/report.h"
 
 #include <algorithm>
 
 namespace {
 
 // Fails a preparation; its message, if any, has been printed.
-std::uint8_t *not_prepared(img_chain &chain)
+std::uint8_t *fail_preparation(img_chain &chain)
 {
+    img_chain_release(chain);
     chain.prepared = 0;
     return nullptr;
 }
 
-// Works out, for one link, what it gets for what follows it. `def` is the latter on entry and the
-// former on return, `placement` likewise where a link would put its output.
+// Works out the input of one link from its output. `def` describes the output on entry and the
+// input on return; `placement` likewise says where a link puts its output.
 std::int32_t prepare_link(img_chain &chain, img_chain_link &link, img_buffer_def *def,
                           std::int32_t *placement)
 {
@@ -54,7 +58,8 @@ bool take_work_buffer(img_chain &chain, img_buffer_def *def)
     return chain.work_buffer != nullptr;
 }
 
-// Links before the first that changes the definition work in place on what the image type reads.
+// Links below the first one that changes the definition work in place on the work buffer, so they
+// get its stride. They keep the width that they state, unless such samples would not fit.
 void describe_links_in_place(img_chain &chain, const img_buffer_def &def)
 {
     const auto first_change =
@@ -62,12 +67,14 @@ void describe_links_in_place(img_chain &chain, const img_buffer_def &def)
     if (first_change == chain.links.end()) return;
     std::for_each(chain.links.begin(), first_change, [&def](img_chain_link &link) {
         link.out_def.stride = def.stride;
+        if (link.out_def.nbytes <= def.nbytes) return;
         link.out_def.nbytes = def.nbytes;
         link.out_def.nbits = def.nbits;
     });
 }
 
-// Settles who frees what, now that it is known whether the first buffer is a temporary one.
+// Decides which link frees which buffer. `temporary`: the buffer that the image type reads into is
+// the chain's own.
 void settle_buffers(img_chain &chain, bool temporary)
 {
     for (img_chain_link &link : chain.links) {
@@ -91,19 +98,24 @@ bool agree(const img_buffer_def &a, const img_buffer_def &b)
 std::uint8_t *img_chain_prepare_operations(img_handle handle, std::uint8_t *buffer,
                                            const img_buffer_def *def, img_buffer_def *work_def)
 {
-    img_chain &chain = img_chain_of(handle);
     const img_desc *const desc = img_find_image(handle);
     if (desc == nullptr) return nullptr;
+    return img_chain_prepare(img_chain_of(handle), desc, buffer, def, work_def);
+}
+
+std::uint8_t *img_chain_prepare(img_chain &chain, const img_desc *desc, std::uint8_t *buffer,
+                                const img_buffer_def *def, img_buffer_def *work_def)
+{
     if (chain.identity != 0) {
         *work_def = *def;
         return buffer;
     }
-    img_chain_release(handle);  // what is left of an earlier load that did not come to its end
+    img_chain_release(chain);  // an earlier load may not have come to its end
     chain.prepared = 1;
     if (def->nbits != chain.out_bits) {
         img_fail("img_chain_prepare_operations:  output bits of image chain dont match output "
                  "buffer!\n");
-        return not_prepared(chain);
+        return fail_preparation(chain);
     }
     chain.final_buffer = buffer;
     chain.final_def = def;
@@ -113,7 +125,7 @@ std::uint8_t *img_chain_prepare_operations(img_handle handle, std::uint8_t *buff
     img_buffer_def needed = *def;
     std::int32_t placement = IMG_CHAIN_OUT_FINAL;
     for (auto link = chain.links.rbegin(); link != chain.links.rend(); ++link)
-        if (prepare_link(chain, *link, &needed, &placement) == -1) return not_prepared(chain);
+        if (prepare_link(chain, *link, &needed, &placement) == -1) return fail_preparation(chain);
     needed.nbits = desc->nbits;
     needed.nbytes = desc->nbytes;
     chain.lut_bits = std::max(chain.lut_bits, needed.nbits);
@@ -122,18 +134,10 @@ std::uint8_t *img_chain_prepare_operations(img_handle handle, std::uint8_t *buff
     if (direct)
         chain.work_buffer = buffer;
     else if (!take_work_buffer(chain, &needed))
-        return not_prepared(chain);
+        return fail_preparation(chain);
     describe_links_in_place(chain, needed);
     *work_def = needed;
     chain.work_def = work_def;
     settle_buffers(chain, !direct);
     return chain.work_buffer;
-}
-
-img_scratch img_chain_new_buffer(std::int32_t nlines, std::int32_t stride, std::int32_t nbytes)
-{
-    if (nlines < 0 || stride < 0 || nbytes < 0) return nullptr;
-    const auto samples =
-        std::uint64_t{static_cast<std::uint32_t>(nlines)} * static_cast<std::uint32_t>(stride);
-    return img_take_scratch(samples * static_cast<std::uint32_t>(nbytes));
 }

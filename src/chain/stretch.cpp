@@ -1,7 +1,10 @@
-// The linear contrast stretch: a histogram, its cuts, and the table that spreads what is between.
-#include "api/multiversion.h"
-#include "api/report.h"
-#include "chain/chain.h"
+// The linear contrast stretch: a histogram of the window, its low and high cut, and the table that
+// spreads the values between them. All arithmetic that decides an entry is in double precision and
+// in a fixed order, so that every build gives the same bytes. Read stretch.h first.
+#include "chain/stretch.h"
+
+#include "base/multiversion.h"
+#include "base/report.h"
 
 #include <algorithm>
 #include <cstring>
@@ -15,13 +18,13 @@ bool is_stretch_width(std::int32_t bits)
     return bits >= 1 && bits <= MAX_BITS;
 }
 
-// Counts every fourth sample of each line; one that has no counter is left out.
+// Counts every fourth sample of each line. Samples without a counter are ignored.
 template <typename Sample>
 void count_samples(const std::uint8_t *buffer, const img_buffer_def &def, std::uint32_t *histogram,
                    std::size_t size)
 {
     const auto line_length = static_cast<std::size_t>(def.stride) * sizeof(Sample);
-    // Copies, which no counter can change.
+    // Local copies: the counters cannot alias them.
     const auto nlines = static_cast<std::size_t>(std::max(def.nlines, 0));
     const auto nsamps = static_cast<std::size_t>(std::max(def.nsamps, 0));
     for (std::size_t line = 0; line < nlines; ++line) {
@@ -38,8 +41,8 @@ struct cut {
     std::size_t low, high;  // first and last value of the stretch
 };
 
-// Leaves out the lowest half percent and the highest percent of the samples between two bins,
-// which themselves leave out the ends of the range of values.
+// Cuts off the lowest half percent and the highest percent of the samples. Only bins within the
+// middle 98.5 percent of the value range count towards the total.
 cut find_cut(const std::uint32_t *histogram, std::size_t size)
 {
     const auto rounded = [size](double share) {
@@ -50,7 +53,7 @@ cut find_cut(const std::uint32_t *histogram, std::size_t size)
     std::uint32_t total = 0;
     for (std::size_t bin = first; bin < end; ++bin) total += histogram[bin];
 
-    // The first bin counts twice: as the start of the count and as the first one added to it.
+    // The first bin counts twice: as the start value and as the first one added.
     std::uint32_t count = histogram[first];
     const auto advance_to = [&](std::size_t bin, double share) {
         const auto wanted = static_cast<std::uint32_t>(total * share);
@@ -61,7 +64,7 @@ cut find_cut(const std::uint32_t *histogram, std::size_t size)
     return {low, advance_to(low, 0.99)};
 }
 
-// To more bits than there were: the values are spread over the wider range.
+// For an output wider than the input: spreads the values over the wider range.
 void fill_widening_stretch(std::uint16_t *lut, std::size_t size, double low, double gain,
                            std::int64_t top)
 {
@@ -77,7 +80,7 @@ void fill_widening_stretch(std::uint16_t *lut, std::size_t size, double low, dou
 IMG_MULTIVERSION void img_chain_fill_stretch(std::uint16_t *lut, std::int32_t size, double low,
                                              double gain, std::int32_t shift, std::int32_t top)
 {
-    const double end = size;  // what reaches it is at the top whatever it is
+    const double end = size;  // values beyond it end at the top all the same
     for (std::int32_t i = 0; i < size; ++i) {
         double stretched = (static_cast<double>(i) - low) * gain;
         stretched = stretched > 0.0 ? stretched : 0.0;

@@ -2,7 +2,7 @@
 #ifndef IMG_HELAVA_H
 #define IMG_HELAVA_H
 
-#include "api/types.h"
+#include "base/types.h"
 
 #include <cstddef>
 #include <cstdint>

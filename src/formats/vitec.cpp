@@ -1,6 +1,6 @@
 #include "formats/vitec.h"
 
-#include "api/report.h"
+#include "base/report.h"
 #include "formats/words.h"
 #include "io/platform.h"
 #include "std/std.h"

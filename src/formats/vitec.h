@@ -11,7 +11,7 @@
 #ifndef IMG_VITEC_H
 #define IMG_VITEC_H
 
-#include "api/types.h"
+#include "base/types.h"
 
 #include <array>
 #include <cstddef>

@@ -6,6 +6,13 @@
 #include <array>
 #include <cerrno>
 
+std::uint32_t img_swap32(const std::uint8_t *bytes)
+{
+    std::uint32_t word;
+    std::memcpy(&word, bytes, sizeof word);
+    return word << 24U | (word & 0xFF00U) << 8U | (word >> 8U & 0xFF00U) | word >> 24U;
+}
+
 std::int32_t img_header_seek(const img_desc *desc, std::int64_t offset, std::int32_t whence)
 {
     if (offset < INT32_MIN || offset > INT32_MAX) {

@@ -2,7 +2,7 @@
 #ifndef IMG_WORDS_H
 #define IMG_WORDS_H
 
-#include "api/img_desc.h"
+#include "base/img_desc.h"
 #include "io/io_method.h"
 
 #include <bit>
@@ -35,6 +35,9 @@ inline void img_put_int(std::span<std::uint8_t> block, std::size_t at, std::int3
 {
     img_put_word(block, at, static_cast<std::uint32_t>(value));
 }
+
+// Returns the four bytes at `bytes` as a word of the host's order with its bytes reversed.
+std::uint32_t img_swap32(const std::uint8_t *bytes);
 
 // Reverses the bytes of each word from offset `first` to `end`.
 inline void img_swap_words(std::span<std::uint8_t> block, std::size_t first, std::size_t end)

@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <cerrno>
 #include <new>
-#include <string_view>
 #include <utility>
 
 namespace {
@@ -24,13 +23,6 @@ template <typename Operation>
 Operation given_or_refusal(Operation operation)
 {
     return operation != nullptr ? operation : &refusal<Operation>::operation;
-}
-
-std::unique_ptr<char[]> copy_of(std::string_view text)
-{
-    std::unique_ptr<char[]> copy(new (std::nothrow) char[text.size() + 1]);
-    if (copy) *std::ranges::copy(text, copy.get()).out = '\0';
-    return copy;
 }
 
 }  // namespace
@@ -83,6 +75,13 @@ const img_io_method *img_lookup_io_method(const char *name)
     return slot == -1 ? nullptr : &img_io_method_table[static_cast<std::size_t>(slot)];
 }
 
+std::unique_ptr<char[]> img_copy_name(std::string_view name)
+{
+    std::unique_ptr<char[]> copy(new (std::nothrow) char[name.size() + 1]);
+    if (copy) *std::ranges::copy(name, copy.get()).out = '\0';
+    return copy;
+}
+
 std::int32_t img_split_name(const char *name, std::unique_ptr<char[]> *filename_out,
                             const img_io_method **io_method_out)
 {
@@ -95,7 +94,7 @@ std::int32_t img_split_name(const char *name, std::unique_ptr<char[]> *filename_
             filename.remove_suffix(filename.size() - at);
         }
     }
-    auto copy = copy_of(filename);
+    auto copy = img_copy_name(filename);
     if (!copy) return -1;
     *filename_out = std::move(copy);
     *io_method_out = img_lookup_io_method(method_name);

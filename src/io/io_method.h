@@ -5,6 +5,7 @@
 #include <array>
 #include <cstdint>
 #include <memory>
+#include <string_view>
 
 inline constexpr std::int32_t IMG_MAX_IO_METHODS = 100;
 
@@ -70,6 +71,9 @@ std::int32_t img_find_io_method(const char *name);
 
 // Returns the enabled method of that name, or null.
 const img_io_method *img_lookup_io_method(const char *name);
+
+// Returns an owned copy of a name; null when memory is short.
+std::unique_ptr<char[]> img_copy_name(std::string_view name);
 
 // Splits the name of an image, "FILE" or "FILE@METHOD", into an owned file name and the enabled
 // method of that name (null: there is none). Leading "@" are dropped; a name of nothing else is

@@ -1,6 +1,6 @@
 #include "io/platform.h"
 
-#include "api/img.h"
+#include "imgfile/img.h"
 #include "io/lend_posix.h"
 
 #include <algorithm>

@@ -4,7 +4,7 @@
 #ifndef IMG_STD_H
 #define IMG_STD_H
 
-#include "api/types.h"
+#include "base/types.h"
 #include "io/io_method.h"
 
 #include <array>

@@ -1,5 +1,7 @@
 // The driver's state of one image: making it, the file organisation, and the bytes of the file.
-#include "api/img_desc.h"
+#include "base/img_desc.h"
+#include "base/settings.h"
+#include "base/type_hooks.h"
 #include "io/io_method.h"
 #include "std/std.h"
 
@@ -27,11 +29,6 @@ std::int64_t product(std::int64_t a, std::int64_t b, More... more)
 std::int64_t sum(std::int64_t known, std::int64_t size)  // `known` is no -1
 {
     return size < 0 ? -1 : img_std_fitting(known + size);
-}
-
-const img_type_hooks &hooks_of(const img_desc *desc)
-{
-    return img_type_hooks_table[static_cast<std::size_t>(desc->type)];
 }
 
 bool within_the_drivers_limits(const img_desc *desc)
@@ -85,7 +82,7 @@ std::int64_t tiles_end(const img_desc *desc, const img_std_file *file)
 // Fills in the stored size of a line and of a band plane. Returns false when they do not fit.
 bool set_up_planes(img_desc *desc, img_std_file *file)
 {
-    const img_type_hooks &hooks = hooks_of(desc);
+    const img_type_hooks &hooks = img_hooks_of(desc);
     file->padded_nsamps =
         hooks.padded_nsamps_fn != nullptr ? hooks.padded_nsamps_fn(desc) : desc->nsamps;
     file->padded_nlines =
@@ -101,7 +98,7 @@ bool set_up_layout(img_desc *desc, img_std_file *file)
 {
     const bool tiled = img_is_tiled(desc);
     if (desc->layout == IMG_LAYOUT_DEFAULT)
-        desc->layout = tiled ? hooks_of(desc).tiled_layout : hooks_of(desc).untiled_layout;
+        desc->layout = tiled ? img_hooks_of(desc).tiled_layout : img_hooks_of(desc).untiled_layout;
     desc->virtual_tiled = !tiled && gets_virtual_tiles(desc) ? 1 : 0;
     if (desc->virtual_tiled != 0) {
         desc->tile_nsamps = img_default_tile_nsamps;
@@ -219,7 +216,7 @@ void note_bytes_not_read(img_desc *desc, std::int64_t offset, std::int32_t got, 
 std::int32_t img_std_open(img_desc *desc)
 {
     if (open_file(desc) == -1) return -1;
-    const img_type_hooks &hooks = hooks_of(desc);
+    const img_type_hooks &hooks = img_hooks_of(desc);
     if (hooks.probe(desc) != 0 && hooks.read_header(desc) != -1 && img_std_setup(desc) != -1)
         return 0;
     img_std_fail_close(desc);
@@ -229,7 +226,7 @@ std::int32_t img_std_open(img_desc *desc)
 std::int32_t img_std_create(img_desc *desc)
 {
     if (open_file(desc) == -1) return -1;
-    if (hooks_of(desc).write_header(desc) != -1 && img_std_setup(desc) != -1) return 0;
+    if (img_hooks_of(desc).write_header(desc) != -1 && img_std_setup(desc) != -1) return 0;
     img_std_fail_close(desc);
     return -1;
 }

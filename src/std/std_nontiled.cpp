@@ -1,7 +1,7 @@
 // Regions of untiled images, line by line.
-#include "api/img_desc.h"
-#include "api/report.h"
-#include "api/scratch.h"
+#include "base/img_desc.h"
+#include "base/report.h"
+#include "base/scratch.h"
 #include "std/std.h"
 
 #include <algorithm>

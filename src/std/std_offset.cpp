@@ -1,5 +1,5 @@
 // Where lines, tiles and samples lie, in each of the five layouts.
-#include "api/img_desc.h"
+#include "base/img_desc.h"
 #include "std/std.h"
 
 namespace {

@@ -1,5 +1,5 @@
 // The region operations of standard-driver types: each layout has its transfer.
-#include "api/img_desc.h"
+#include "base/img_desc.h"
 #include "std/std.h"
 
 namespace {

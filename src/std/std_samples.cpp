@@ -1,5 +1,5 @@
 // Moving samples, whatever the transfer that needs it.
-#include "api/multiversion.h"
+#include "base/multiversion.h"
 #include "std/std.h"
 
 #include <algorithm>

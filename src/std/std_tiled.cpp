@@ -1,9 +1,9 @@
 // Regions of tiled images: one run of whole tiles per row of tiles.
-#include "api/fill.h"
-#include "api/img.h"
-#include "api/img_desc.h"
-#include "api/report.h"
-#include "api/scratch.h"
+#include "access/tiles.h"
+#include "base/fill.h"
+#include "base/img_desc.h"
+#include "base/report.h"
+#include "base/scratch.h"
 #include "std/std.h"
 
 #include <algorithm>
@@ -211,10 +211,10 @@ std::int32_t read_stored_run(img_desc *desc, std::int32_t first_tile, std::int32
         // Behind a tile that cannot be read may lie one that waits in the cache, or lines that
         // the file does hold: each tile is asked for by itself.
         for (std::int32_t i = 0; i < ntiles; ++i)
-            img_load_tiles(desc->handle, first_tile + i, 1, band,
-                           run + static_cast<std::size_t>(i) * img_plane_size(desc));
+            img_load_tile_run(desc, first_tile + i, 1, band,
+                              run + static_cast<std::size_t>(i) * img_plane_size(desc));
     } else {
-        img_load_tiles(desc->handle, first_tile, ntiles, band, run);
+        img_load_tile_run(desc, first_tile, ntiles, band, run);
     }
     return pre_read.result();
 }
@@ -251,8 +251,7 @@ std::int32_t img_read_tiled(img_desc *desc, std::int32_t line, std::int32_t samp
     if (desc->virtual_tiled != 0) std::fill_n(run.get(), region.run_length(), std::uint8_t{0});
     const auto width = static_cast<std::size_t>(desc->nbytes);
     for (std::int32_t row = 0; row < region.tile_rows(); ++row) {
-        if (img_load_tiles(desc->handle, region.first_tile(row), region.ntiles(), band,
-                           run.get()) == -1)
+        if (img_load_tile_run(desc, region.first_tile(row), region.ntiles(), band, run.get()) == -1)
             return -1;
         region.for_each_tile(row, [&](const tile_part &part) {
             img_std_copy_rows({run.get() + part.run_byte, region.plane_pitch(), width},
@@ -279,8 +278,7 @@ std::int32_t img_std_write_tiled(img_desc *desc, std::int32_t line, std::int32_t
             continue;
         if (fetch_run(desc, region, row, band, fill, direct, run.get()) == -1) return -1;
         lay_over(desc, region, row, buffer, run.get());
-        if (img_dump_tiles(desc->handle, region.first_tile(row), region.ntiles(), band,
-                           run.get()) == -1)
+        if (img_dump_tile_run(desc, region.first_tile(row), region.ntiles(), band, run.get()) == -1)
             return -1;
     }
     return 0;

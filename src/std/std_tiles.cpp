@@ -1,8 +1,8 @@
 // Whole tiles of one band, in the file's byte order.
 #include "access/tile_cache.h"
-#include "api/img_desc.h"
-#include "api/report.h"
-#include "api/scratch.h"
+#include "base/img_desc.h"
+#include "base/report.h"
+#include "base/scratch.h"
 #include "std/std.h"
 
 #include <algorithm>

@@ -1,4 +1,6 @@
 // How a format that is built on the standard driver takes its slot in the type table.
+#include "base/img_desc.h"
+#include "base/type_hooks.h"
 #include "std/std.h"
 
 std::int32_t img_std_fill_type(std::int32_t slot, const char *name, const char *extension,

@@ -1,6 +1,6 @@
 // Between a file image and an in-memory image, and single samples of the latter.
-#include "api/img_desc.h"
-#include "api/report.h"
+#include "base/img_desc.h"
+#include "base/report.h"
 #include "std/std.h"
 
 #include <cstring>

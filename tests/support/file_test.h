@@ -3,7 +3,11 @@
 #ifndef IMG_TEST_FILE_TEST_H
 #define IMG_TEST_FILE_TEST_H
 
-#include "chain/chain.h"
+#include "base/id_pool.h"
+#include "base/image_table.h"
+#include "base/img_desc.h"
+#include "chain/chain_links.h"
+#include "imgfile/img.h"
 #include "support/fault_method.h"
 #include "support/files.h"
 #include "support/layout_rules.h"

@@ -1,7 +1,13 @@
 #include "support/test_image.h"
 
-#include "chain/chain.h"
+#include "api/library.h"
+#include "api/open.h"
+#include "base/image_table.h"
+#include "base/img_desc.h"
+#include "base/types.h"
+#include "chain/chain_links.h"
 #include "formats/words.h"
+#include "imgfile/img.h"
 #include "std/std.h"
 
 #include <array>

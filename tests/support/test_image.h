@@ -2,8 +2,8 @@
 #ifndef IMG_TEST_IMAGE_H
 #define IMG_TEST_IMAGE_H
 
-#include "api/img_desc.h"
-#include "api/types.h"
+#include "base/img_desc.h"
+#include "imgfile/img.h"
 
 #include <cstdint>
 #include <string>

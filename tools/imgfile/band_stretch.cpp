@@ -3,6 +3,7 @@
 #include "walk.h"
 
 #include "chain/chain.h"
+#include "chain/stretch.h"
 
 #include <algorithm>
 #include <new>

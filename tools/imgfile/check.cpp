@@ -4,6 +4,7 @@
 #include "header.h"
 #include "walk.h"
 
+#include "formats/vitec.h"
 #include "formats/words.h"
 
 #include <algorithm>

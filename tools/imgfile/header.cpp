@@ -3,6 +3,7 @@
 #include "failure.h"
 
 #include "formats/helava.h"
+#include "formats/vitec.h"
 #include "formats/words.h"
 
 #include <cerrno>

@@ -5,7 +5,7 @@
 #include "native.h"
 #include "walk.h"
 
-#include "formats/helava.h"
+#include "base/img_desc.h"
 #include "std/std.h"
 
 #include <cstdio>

@@ -4,7 +4,9 @@
 
 #include "image.h"
 
-#include "api/img_desc.h"
+#include "base/image_table.h"
+#include "base/img_desc.h"
+#include "imgfile/img.h"
 
 #include <functional>
 

@@ -5,7 +5,7 @@
 #include "output.h"
 #include "walk.h"
 
-#include "api/img_desc.h"
+#include "base/img_desc.h"
 
 #include <algorithm>
 #include <map>

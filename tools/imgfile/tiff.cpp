@@ -5,7 +5,7 @@
 #include "output.h"
 #include "samples.h"
 
-#include "api/img_desc.h"
+#include "base/img_desc.h"
 
 #include <algorithm>
 #include <cerrno>

@@ -1,4 +1,4 @@
-#include "api/report.h"
+#include "base/report.h"
 
 #include <array>
 #include <cerrno>

@@ -1,4 +1,4 @@
-#include "api/id_pool.h"
+#include "base/id_pool.h"
 
 #include <new>
 #include <numeric>

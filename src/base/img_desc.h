@@ -1,9 +1,9 @@
-// The record of one open image, and the table of open images.
+// The record of one open image. It travels down every call.
 #ifndef IMG_DESC_H
 #define IMG_DESC_H
 
-#include "api/id_pool.h"
-#include "api/img.h"
+#include "base/count.h"
+#include "imgfile/img.h"
 
 #include <array>
 #include <cstdint>
@@ -13,10 +13,22 @@ struct img_io_method;
 struct img_std_file;
 struct img_tile_cache;
 
-inline constexpr std::int32_t IMG_MAX_HANDLES = 60;
+// How the pixels of an image lie in its file. Band sequential: one plane per band, plane after
+// plane. Pixel interleaved: the samples of all bands of a pixel lie side by side.
+enum : std::int32_t {
+    IMG_LAYOUT_BSQ = 0,         // untiled, band sequential
+    IMG_LAYOUT_BIP = 1,         // untiled, pixel interleaved
+    IMG_LAYOUT_TILED = 2,       // tile after tile, each as one tile plane per band
+    IMG_LAYOUT_BAND_TILED = 3,  // band after band, each as its tile planes
+    IMG_LAYOUT_TILED_BIP = 4,   // tile after tile, each pixel interleaved
+    IMG_LAYOUT_DEFAULT = 6      // to be replaced by the type's default at the set-up
+};
+
+inline constexpr std::int32_t IMG_ACCESS_MODE = 3;     // the bits of open flags that hold the mode
+inline constexpr std::int32_t IMG_TWO_BYTE_BITS = 12;  // significant bits of two-byte samples
 
 // Combines the bands of a window into one buffer. Row i of every buffer starts at sample
-// i * stride; `bands` holds `nbands` of them. The result is not examined.
+// i * `stride`; `bands` holds `nbands` of them. The result is ignored.
 using img_merge_fn = std::int32_t (*)(std::int32_t line, std::int32_t samp, std::int32_t nlines,
                                       std::int32_t nsamps, std::int32_t stride, std::int32_t nbytes,
                                       std::int32_t nbands, const std::uint8_t *const *bands,
@@ -40,17 +52,19 @@ struct img_desc {
     std::array<std::int32_t, 3> band_map;  // band at each position of a tiled, interleaved pixel
     std::unique_ptr<std::uint8_t[]> mem_image;  // the whole image; null: it lives in a file
     std::int32_t lut_size;                      // entries of each LUT; 0: none
+    // Identity tables of one-byte images. The record keeps them for types that state tables of
+    // their own; nothing in the library reads their entries.
     std::array<std::unique_ptr<std::uint8_t[]>, 3> lut;
     std::int32_t unclipped;                  // not 0: the type takes windows beyond the image
     std::unique_ptr<std::uint8_t[]> header;  // the type's copy of its header or trailer, if any
-    img_std_file *std_file;                  // made and freed by the standard driver
+    img_std_file *std_file;                  // owned by the standard driver, which frees it
     img_handle handle;                       // the record's own
-    img_tile_cache *tile_cache;              // made by img_load_tiles, freed at the release
+    img_tile_cache *tile_cache;              // owned; made by img_load_tiles; null: none
     std::int32_t cache_mb;                   // memory budget of the tile cache; 0: no cache
     std::int32_t cache_pending;              // 1 until img_load_tiles has tried to make the cache
     std::int32_t virtual_tiled;              // 1: an untiled file that is presented in tiles
     std::int32_t merge_bands;                // not 0: the image shows its bands merged into one
-    img_merge_fn merge_fn;                   // null: it is not merged after all
+    img_merge_fn merge_fn;                   // null: the bands stay apart after all
 };
 
 inline bool img_is_tiled(const img_desc *desc)
@@ -58,7 +72,7 @@ inline bool img_is_tiled(const img_desc *desc)
     return desc->tile_nsamps != 0 && desc->tile_nlines != 0;
 }
 
-// Tiles that it takes to hold `extent` lines or samples, the last one perhaps in part.
+// Returns the tiles that `extent` lines or samples take, the last one perhaps in part.
 inline std::int32_t img_whole_tiles(std::int32_t extent, std::int32_t tile_extent)
 {
     return extent / tile_extent + (extent % tile_extent != 0 ? 1 : 0);
@@ -67,52 +81,26 @@ inline std::int32_t img_whole_tiles(std::int32_t extent, std::int32_t tile_exten
 // Samples, and bytes, of one tile plane, in every layout.
 inline std::size_t img_plane_samples(const img_desc *desc)
 {
-    return static_cast<std::size_t>(desc->tile_nlines) *
-           static_cast<std::size_t>(desc->tile_nsamps);
+    return img_count(desc->tile_nlines) * img_count(desc->tile_nsamps);
 }
 inline std::size_t img_plane_size(const img_desc *desc)
 {
-    return img_plane_samples(desc) * static_cast<std::size_t>(desc->nbytes);
+    return img_plane_samples(desc) * img_count(desc->nbytes);
 }
 
 // IMG_OPEN_READ_ONLY, IMG_OPEN_WRITE_ONLY or IMG_OPEN_READ_WRITE, as the image was opened.
 inline std::int32_t img_access_mode(const img_desc *desc)
 {
-    return desc->oflags & 3;
+    return desc->oflags & IMG_ACCESS_MODE;
 }
 
-inline img_id_pool *img_handle_pool = nullptr;  // made at start-up, gone after img_mgr_cleanup
-inline std::array<img_desc *, IMG_MAX_HANDLES> img_open_images{};  // by handle; null: not open
-
-// Returns the image of `handle`, or null for a handle outside 0..59 or not open.
-img_desc *img_find_image(img_handle handle);
-
-// Takes a handle and makes its record with `filename` and `io_method` split off `name` (null
-// counts as empty). Returns the handle, or -1 after a message: no free handle (errno 24), or no
-// memory, which leaves the handle free.
-img_handle img_alloc_image(const char *name, std::int32_t flags);
-
-// Frees the image's record, if there is one, and gives the handle back. `flush` not 0: tiles
-// that wait in the cache are written first.
-void img_release_image(img_handle handle, std::int32_t flush);
-
-// Returns 0 when `handle` names an open image, else -1 after a message.
-std::int32_t img_validate_img_handle(img_handle handle);
-
-// Returns the significant bits per sample, or -1 quietly for a handle that names no image.
-std::int32_t img_query_nbits(img_handle handle);
-
-// Fills in the geometry of an image that is being opened. `nbits` -1: 12 for two-byte samples,
-// else 8 x `nbytes`. The three LUTs
-// of `lut_size` bytes pass to the record; null and 0: none.
+// Fills in the geometry of an image that is being opened. `nbits` -1: 12 for two-byte samples, else
+// 8 x `nbytes`. The three LUTs of `lut_size` bytes pass to the record; null and 0: none.
 void img_set_image_params(img_desc *desc, std::int32_t nlines, std::int32_t nsamps,
                           std::int32_t tile_nsamps, std::int32_t tile_nlines, std::int32_t nbands,
                           std::int32_t nbytes, std::int32_t nbits, std::int32_t layout,
                           std::int32_t lut_size, std::unique_ptr<std::uint8_t[]> lut0,
                           std::unique_ptr<std::uint8_t[]> lut1,
                           std::unique_ptr<std::uint8_t[]> lut2);
-
-// Returns the four bytes at `bytes` as a word of the host's order with its bytes reversed.
-std::uint32_t img_swap32(const std::uint8_t *bytes);
 
 #endif

@@ -1,4 +1,4 @@
-#include "api/scratch.h"
+#include "base/scratch.h"
 
 #include <algorithm>
 #include <array>

@@ -1,0 +1,46 @@
+// The four exported transfers. Each looks its handle up, once, and passes the record down: windows
+// and whole tiles are in access/. Their contracts stand in imgfile/img.h.
+#include "access/dump_window.h"
+#include "access/load_window.h"
+#include "access/tiles.h"
+#include "base/image_table.h"
+#include "base/report.h"
+#include "imgfile/img.h"
+
+std::int32_t img_load_buffer(img_handle handle, std::int32_t line, std::int32_t samp,
+                             std::int32_t nlines, std::int32_t nsamps, std::int32_t band,
+                             void *buffer, std::int32_t stride, const std::uint8_t *fill)
+{
+    img_desc *const desc = img_find_valid_image(handle);
+    if (desc == nullptr) return img_fail("img_load_buffer: img_validate_img_handle()\n");
+    return img_load_window(desc, {line, samp, nlines, nsamps}, band,
+                           static_cast<std::uint8_t *>(buffer), stride, fill);
+}
+
+std::int32_t img_dump_buffer(img_handle handle, std::int32_t line, std::int32_t samp,
+                             std::int32_t nlines, std::int32_t nsamps, std::int32_t band,
+                             const void *buffer, std::int32_t stride, const void *fill)
+{
+    img_desc *const desc = img_find_image(handle);
+    if (desc == nullptr) return -1;
+    return img_dump_window(desc, {line, samp, nlines, nsamps}, band,
+                           static_cast<const std::uint8_t *>(buffer), stride,
+                           static_cast<const std::uint8_t *>(fill));
+}
+
+std::int32_t img_load_tiles(img_handle handle, std::int32_t first_tile, std::int32_t ntiles,
+                            std::int32_t band, void *buffer)
+{
+    img_desc *const desc = img_find_image(handle);
+    if (desc == nullptr) return -1;
+    return img_load_tile_run(desc, first_tile, ntiles, band, static_cast<std::uint8_t *>(buffer));
+}
+
+std::int32_t img_dump_tiles(img_handle handle, std::int32_t first_tile, std::int32_t ntiles,
+                            std::int32_t band, const void *buffer)
+{
+    img_desc *const desc = img_find_image(handle);
+    if (desc == nullptr) return -1;
+    return img_dump_tile_run(desc, first_tile, ntiles, band,
+                             static_cast<const std::uint8_t *>(buffer));
+}
