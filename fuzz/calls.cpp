@@ -2,8 +2,8 @@
 // not, each held against what is known of the handles and the files.
 #include "checked_image.h"
 
-#include "base/id_pool.h"
 #include "base/image_table.h"
+#include "imgfile/img.h"
 
 namespace {
 

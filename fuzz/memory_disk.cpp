@@ -2,7 +2,7 @@
 
 #include "imgfile/img.h"
 #include "io/io_method.h"
-#include "std/std.h"
+#include "std/std_bytes.h"
 
 #include <algorithm>
 #include <cerrno>
@@ -107,4 +107,5 @@ void memory_disk_register()
         img_register_io_method(name, nullptr, memory_open, memory_close, memory_read, memory_write,
                                memory_seek, nullptr, nullptr);
     img_offer_lending("lending", memory_lend);
+    img_allow_merging("lending");
 }

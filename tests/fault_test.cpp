@@ -14,7 +14,9 @@
 #include "chain/chain_links.h"
 #include "imgfile/img.h"
 #include "io/io_method.h"
-#include "std/std.h"
+#include "std/std_interleaved_lines.h"
+#include "std/std_lines.h"
+#include "std/std_tiles.h"
 
 #include <algorithm>
 #include <optional>

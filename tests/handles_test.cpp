@@ -4,7 +4,7 @@
 #include "base/img_desc.h"
 #include "base/report.h"
 #include "imgfile/img.h"
-#include "std/std.h"
+#include "std/std_tiles.h"
 #include "support/file_test.h"
 
 namespace {

@@ -1,4 +1,5 @@
 #include "base/img_desc.h"
+#include "io/io_default.h"
 #include "io/io_method.h"
 
 #include "support/fault_memory.h"

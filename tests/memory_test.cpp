@@ -16,7 +16,10 @@
 #include "formats/words.h"
 #include "imgfile/img.h"
 #include "io/io_method.h"
-#include "std/std.h"
+#include "std/std_interleaved_lines.h"
+#include "std/std_lines.h"
+#include "std/std_tiled.h"
+#include "std/std_tiles.h"
 #include "support/file_test.h"
 
 #include <functional>

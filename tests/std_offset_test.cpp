@@ -2,6 +2,7 @@
 #include "base/img_desc.h"
 #include "imgfile/img.h"
 #include "std/std.h"
+#include "std/std_offset.h"
 
 #include "support/layout_rules.h"
 #include "support/random.h"

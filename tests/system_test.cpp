@@ -2,7 +2,7 @@
 #include "base/image_table.h"
 #include "base/img_desc.h"
 #include "imgfile/img.h"
-#include "io/platform.h"
+#include "io/local_time.h"
 #include "std/std.h"
 #include "support/effort.h"
 #include "support/fault_system.h"
@@ -211,9 +211,9 @@ TEST_F(System, FilesBearTheLocalTimeOrNone)
         EXPECT_EQ(bytes(&file[16], &file[22]), bytes(6));
     }
     ::setenv("TZ", "EST5", 1);  // where the day has another hour
-    const auto date = img_platform_local_time();
+    const auto date = img_local_time();
     ::setenv("TZ", "EST-7", 1);
-    EXPECT_NE(img_platform_local_time(), date);
+    EXPECT_NE(img_local_time(), date);
 }
 
 TEST_F(System, ResultsAreTheSameWhateverInterruptsCallsAndSwallowsMessages)

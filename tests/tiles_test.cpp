@@ -5,6 +5,8 @@
 #include "base/types.h"
 #include "imgfile/img.h"
 #include "std/std.h"
+#include "std/std_interleaved_tiles.h"
+#include "std/std_tiles.h"
 
 #include "support/file_test.h"
 #include "support/guarded_buffer.h"

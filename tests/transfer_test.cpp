@@ -6,6 +6,10 @@
 #include "base/settings.h"
 #include "imgfile/img.h"
 #include "std/std.h"
+#include "std/std_interleaved_lines.h"
+#include "std/std_lines.h"
+#include "std/std_region.h"
+#include "std/std_tiles.h"
 
 #include "support/effort.h"
 #include "support/file_test.h"

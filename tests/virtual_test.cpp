@@ -4,6 +4,7 @@
 #include "base/types.h"
 #include "imgfile/img.h"
 #include "std/std.h"
+#include "std/std_memory.h"
 
 #include "support/file_test.h"
 #include "support/layout_rules.h"

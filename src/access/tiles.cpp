@@ -43,13 +43,13 @@ void make_cache(img_desc *desc)
 }
 
 std::int32_t load_through_cache(img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,
-                                std::int32_t band, std::uint8_t *buffer)
+                                std::int32_t band, std::uint8_t *buffer, img_tile_reader_fn reader,
+                                void *arg)
 {
     img_tile_cache *const cache = desc->tile_cache;
-    const img_read_tiles_fn read_tiles = img_type_of(desc).read_tiles;
     for (std::int32_t tile = first_tile; tile < first_tile + ntiles; ++tile) {
         if (img_tile_cache_get(cache, tile, band, buffer) != 0) {
-            const std::int32_t result = read_tiles(desc, tile, 1, band, buffer);
+            const std::int32_t result = reader(arg, desc, tile, 1, band, buffer);
             if (result != 0) return result;
             img_tile_cache_put(cache, tile, band, buffer, 0);
         }
@@ -75,15 +75,26 @@ std::int32_t dump_through_cache(img_desc *desc, std::int32_t first_tile, std::in
 std::int32_t img_load_tile_run(img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,
                                std::int32_t band, std::uint8_t *buffer)
 {
-    if (desc->mem_image || img_access_mode(desc) == IMG_OPEN_WRITE_ONLY ||
-        img_type_of(desc).read_tiles == nullptr)
-        return -1;
+    if (img_type_of(desc).read_tiles == nullptr) return -1;
+    const img_tile_reader_fn reader = [](void * /*arg*/, img_desc *image, std::int32_t first,
+                                         std::int32_t count, std::int32_t image_band,
+                                         std::uint8_t *planes) {
+        return img_type_of(image).read_tiles(image, first, count, image_band, planes);
+    };
+    return img_load_tile_run_by(desc, first_tile, ntiles, band, buffer, reader, nullptr);
+}
+
+std::int32_t img_load_tile_run_by(img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,
+                                  std::int32_t band, std::uint8_t *buffer,
+                                  img_tile_reader_fn reader, void *arg)
+{
+    if (desc->mem_image || img_access_mode(desc) == IMG_OPEN_WRITE_ONLY) return -1;
     if (!img_is_tiled(desc) || ntiles < 1) return 0;
     if (buffer == nullptr || !is_a_run_of_tiles(desc, first_tile, ntiles, band)) return -1;
     make_cache(desc);
     if (desc->tile_cache != nullptr)
-        return load_through_cache(desc, first_tile, ntiles, band, buffer);
-    return img_type_of(desc).read_tiles(desc, first_tile, ntiles, band, buffer);
+        return load_through_cache(desc, first_tile, ntiles, band, buffer, reader, arg);
+    return reader(arg, desc, first_tile, ntiles, band, buffer);
 }
 
 std::int32_t img_dump_tile_run(img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,

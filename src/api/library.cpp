@@ -7,7 +7,7 @@
 #include "base/types.h"
 #include "formats/helava.h"
 #include "formats/vitec.h"
-#include "io/io_method.h"
+#include "io/io_default.h"
 
 #include <utility>
 

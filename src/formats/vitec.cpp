@@ -2,7 +2,7 @@
 
 #include "base/report.h"
 #include "formats/words.h"
-#include "io/platform.h"
+#include "io/local_time.h"
 #include "std/std.h"
 
 #include <algorithm>
@@ -46,7 +46,7 @@ img_vitec_file_block new_file_block()
     img_put_word(block.bytes, IMG_VITEC_AT_IMAGE_BLOCK_LINK,
                  static_cast<std::uint32_t>(block.bytes.size() + IMG_VITEC_RESERVED - 4));
     if constexpr (IMG_WRITES_SWAPPED) img_swap_words(block.bytes, 0, IMG_VITEC_FILE_WORDS_END);
-    std::ranges::copy(img_platform_local_time(), &block.bytes[IMG_VITEC_AT_CREATE_DATE]);
+    std::ranges::copy(img_local_time(), &block.bytes[IMG_VITEC_AT_CREATE_DATE]);
     std::ranges::copy(SIGNATURE, &block.bytes[IMG_VITEC_AT_SIGNATURE]);
     return block;
 }

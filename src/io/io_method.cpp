@@ -1,13 +1,20 @@
+// The table of access methods and the split of names. Entries are appended and never removed. Read
+// io_method.h first.
 #include "io/io_method.h"
+
+#include "base/count.h"
 
 #include <algorithm>
 #include <cerrno>
 #include <new>
 #include <utility>
 
+std::array<img_io_method, IMG_MAX_IO_METHODS> img_io_method_table{};
+std::int32_t img_io_method_count = 0;
+
 namespace {
 
-// What a method that leaves an operation out does when it is asked for it.
+// Stands in for an operation that a method does not offer.
 template <typename Operation>
 struct refusal;
 template <typename Result, typename... Arguments>
@@ -35,7 +42,7 @@ std::int32_t img_register_io_method(const char *name, std::int32_t (*init_op)(co
     if (name == nullptr || img_find_io_method(name) != -1 ||
         img_io_method_count == IMG_MAX_IO_METHODS)
         return -1;
-    const auto slot = static_cast<std::size_t>(img_io_method_count++);
+    const auto slot = img_count(img_io_method_count++);
     img_io_method_table[slot] = {
         .name = name,
         .enabled = init_op == nullptr || init_op(name) == 0 ? 1 : 0,
@@ -47,6 +54,7 @@ std::int32_t img_register_io_method(const char *name, std::int32_t (*init_op)(co
         .unlink = given_or_refusal(unlink),
         .get_value = given_or_refusal(get_value),
         .lend = nullptr,
+        .may_merge_transfers = 0,
     };
     return 0;
 }
@@ -55,7 +63,15 @@ std::int32_t img_offer_lending(const char *name, img_io_lend_fn lend)
 {
     const std::int32_t slot = img_find_io_method(name);
     if (slot == -1) return -1;
-    img_io_method_table[static_cast<std::size_t>(slot)].lend = lend;
+    img_io_method_table[img_count(slot)].lend = lend;
+    return 0;
+}
+
+std::int32_t img_allow_merging(const char *name)
+{
+    const std::int32_t slot = img_find_io_method(name);
+    if (slot == -1) return -1;
+    img_io_method_table[img_count(slot)].may_merge_transfers = 1;
     return 0;
 }
 
@@ -72,7 +88,7 @@ std::int32_t img_find_io_method(const char *name)
 const img_io_method *img_lookup_io_method(const char *name)
 {
     const std::int32_t slot = img_find_io_method(name);
-    return slot == -1 ? nullptr : &img_io_method_table[static_cast<std::size_t>(slot)];
+    return slot == -1 ? nullptr : &img_io_method_table[img_count(slot)];
 }
 
 std::unique_ptr<char[]> img_copy_name(std::string_view name)
@@ -89,9 +105,9 @@ std::int32_t img_split_name(const char *name, std::unique_ptr<char[]> *filename_
     const char *method_name = "";
     if (const auto start = filename.find_first_not_of('@'); start != std::string_view::npos) {
         filename.remove_prefix(start);
-        if (const auto at = filename.find('@'); at != std::string_view::npos) {
-            method_name = filename.data() + at + 1;
-            filename.remove_suffix(filename.size() - at);
+        if (const auto end = filename.find('@'); end != std::string_view::npos) {
+            method_name = filename.data() + end + 1;
+            filename.remove_suffix(filename.size() - end);
         }
     }
     auto copy = img_copy_name(filename);

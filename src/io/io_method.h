@@ -1,4 +1,16 @@
-// Access methods: the named back-ends through which all file input and output goes.
+// Access methods: the named back-ends through which all file input and output goes. This header is
+// the contract of such a method; io_default.cpp registers the library's own.
+//
+// An image uses one descriptor from its open to its close, and only with the method that opened it:
+//
+//   open                       first
+//   seek, read, write, lend    any number of times, in any order
+//   close                      last, also after failures
+//
+// There is one position per descriptor. read and write start at it and move it on by the bytes that
+// they return; lend neither uses nor moves it. After a failed call the position is unknown: the
+// library seeks from the start or the end before the next transfer. An operation must not call the
+// library for the image that it works for.
 #ifndef IMG_IO_METHOD_H
 #define IMG_IO_METHOD_H
 
@@ -9,7 +21,7 @@
 
 inline constexpr std::int32_t IMG_MAX_IO_METHODS = 100;
 
-enum : std::int32_t {  // from where a seek counts
+enum : std::int32_t {  // the position that the offset of a seek counts from
     IMG_SEEK_START = 0,
     IMG_SEEK_CURRENT = 1,
     IMG_SEEK_END = 2
@@ -23,48 +35,74 @@ using img_io_write_fn = std::int32_t (*)(std::int32_t fd, const void *buffer, st
 using img_io_seek_fn = std::int32_t (*)(std::int32_t fd, std::int32_t offset, std::int32_t whence);
 using img_io_unlink_fn = std::int32_t (*)(const char *filename);
 using img_io_value_fn = double (*)();
-// Reads lent bytes; they are valid until it returns.
+// Reads lent bytes, which are valid until it returns. Called with the `arg` of the loan.
 using img_io_use_fn = void (*)(void *arg, const std::uint8_t *bytes);
-// Calls `use` once with the bytes [offset, offset + count) of an open file as they lie in memory.
-// Returns 0 when the file had all of them until `use` came back. Else -1, quietly: they cannot be
-// lent, and `use` was not called or what it did is worth nothing.
 using img_io_lend_fn = std::int32_t (*)(std::int32_t fd, std::int32_t offset, std::int32_t count,
                                         img_io_use_fn use, void *arg);
 
-// One access method. Its operations have the meaning of the low-level file calls of those names;
-// all of them return -1 for failure and leave the reason in errno. None may call the library for
-// the image that it works for.
+// One access method. Operations that fail return -1 and leave the reason in errno; a failed close
+// or unlink is passed on, every other failure fails the call of the host.
+//
+// A registration replaces a null operation by one that fails with ENOSYS, so that callers need not
+// test for it; `lend` alone may be null here.
 struct img_io_method {
     const char *name;      // referenced: the registrant keeps it valid for the life of the process
     std::int32_t enabled;  // 1: it can be found; 0: its initialisation failed
-    img_io_open_fn open;   // flags as for img_openfile, mode as in POSIX; a descriptor >= 0
+
+    // Opens the file, or creates it. `filename` is never null; it may be empty. `oflags`: the flags
+    // of img_openfile as the host gave them, or read-write | create | truncate for a create, each
+    // with IMG_OPEN_BINARY; a host may state any bits. `mode`: 0666. Returns a descriptor >= 0. A
+    // file that an open created stays also where the library then refuses it.
+    img_io_open_fn open;
+    // Called once per descriptor. The descriptor counts as closed whatever the result.
     img_io_close_fn close;
-    img_io_read_fn read;      // bytes read; fewer than asked: the file ends, or an error stopped it
-    img_io_write_fn write;    // bytes written; fewer than asked is a failure to the caller
-    img_io_seek_fn seek;      // whence as above; the new position from the start. A
-                              // write after a seek past the end fills the gap with zero bytes
-    img_io_unlink_fn unlink;  // removes a file by name
-    img_io_value_fn get_value;  // never called by the library
-    // Null: not offered. A method that offers it leaves it to the library into how many calls a
-    // transfer is cut; all others see one seek and one transfer for each line or run of tiles.
+    // Reads up to `count` bytes, 1 to 2^31 - 1, into `buffer`. Returns the bytes read: fewer than
+    // `count` where the file ends or an error stops the read, 0 at the end and beyond it. The
+    // library takes fewer bytes for a truncated file and does not ask for the rest.
+    img_io_read_fn read;
+    // Writes `count` bytes, 1 to 2^31 - 1. Returns the bytes written; fewer than `count` is a
+    // failure to the library, which does not ask for the rest. A write beyond the end of the file
+    // fills the gap with zero bytes: the library grows a file by writing its last byte.
+    img_io_write_fn write;
+    // Moves the position to `offset` from one of the three IMG_SEEK_ places. Offsets may come from
+    // a header and be any number. A position beyond the end is valid and does not change the file;
+    // one before the start or beyond 31 bits fails. Returns the new position from the start:
+    // seek(fd, 0, IMG_SEEK_END) is how the library asks for the length.
+    img_io_seek_fn seek;
+    // Removes a file by name, after its descriptors are closed. No function of a host reaches it.
+    img_io_unlink_fn unlink;
+    img_io_value_fn get_value;  // never called
+
+    // Calls `use` at most once with the bytes [offset, offset + count) of the file where they lie
+    // in memory: in a mapping, or in a buffer of the method's own. Both numbers come unchecked;
+    // offsets below 0 and counts below 1 are refused. Returns 0 when `use` was called and the file
+    // had all of these bytes from before the call until `use` returned. Else -1, quietly: a refusal
+    // is no failure. The library then makes the ordinary calls, and their results count. Null:
+    // nothing is lent.
     img_io_lend_fn lend;
+    // 1: the library may merge the transfers of several lines or tiles into one call and split one
+    // into several, and leaves out writes to a file opened read-only. 0: it makes one seek and one
+    // transfer for each line, or for each run of tiles.
+    std::int32_t may_merge_transfers;
 };
 
 // Methods in the order of their registration; entry i is in use for i < img_io_method_count.
-inline std::array<img_io_method, IMG_MAX_IO_METHODS> img_io_method_table{};
-inline std::int32_t img_io_method_count = 0;
+extern std::array<img_io_method, IMG_MAX_IO_METHODS> img_io_method_table;
+extern std::int32_t img_io_method_count;
 
-// Appends a method. An operation that is null is replaced by one that fails. `init_op`, if given,
+// Appends a method that lends nothing and whose transfers are not merged. `init_op`, if given,
 // decides whether the method is enabled: it returns 0 if so. Returns 0, or -1 quietly when an
-// enabled method has that name, it is null, or the table is full.
+// enabled method has that name, the name is null, or the table is full.
 std::int32_t img_register_io_method(const char *name, std::int32_t (*init_op)(const char *name),
                                     img_io_open_fn open, img_io_close_fn close, img_io_read_fn read,
                                     img_io_write_fn write, img_io_seek_fn seek,
                                     img_io_unlink_fn unlink, img_io_value_fn get_value);
 
-// Lets the enabled method of that name offer to lend its bytes. Returns 0, or -1 quietly when there
-// is none.
+// Set what a registration has no argument for, of the enabled method of that name: its `lend`
+// (null: none), and that its transfers may be merged. Return 0, or -1 quietly when no such method
+// exists.
 std::int32_t img_offer_lending(const char *name, img_io_lend_fn lend);
+std::int32_t img_allow_merging(const char *name);
 
 // Returns the index of the enabled method of that name, compared byte for byte, or -1.
 std::int32_t img_find_io_method(const char *name);
@@ -76,12 +114,9 @@ const img_io_method *img_lookup_io_method(const char *name);
 std::unique_ptr<char[]> img_copy_name(std::string_view name);
 
 // Splits the name of an image, "FILE" or "FILE@METHOD", into an owned file name and the enabled
-// method of that name (null: there is none). Leading "@" are dropped; a name of nothing else is
-// a file name. Returns 0, or -1 quietly when memory is short; then nothing is stored.
+// method of that name (null: no such method). Leading "@" are dropped; a name of nothing else is a
+// file name. Returns 0, or -1 quietly when memory is short; then nothing is stored.
 std::int32_t img_split_name(const char *name, std::unique_ptr<char[]> *filename_out,
                             const img_io_method **io_method_out);
-
-// Registers the method that works on the operating system's files under `name`.
-std::int32_t img_register_default_io_method(const char *name);
 
 #endif

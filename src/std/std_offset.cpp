@@ -1,18 +1,23 @@
-// Where lines, tiles and samples lie, in each of the five layouts.
+// Where lines, pixels, tiles and samples lie. Offsets of positions inside the image fit 31 bits, as
+// the set-up has validated; only img_std_sample_offset takes positions that may lie outside. Read
+// std_offset.h first.
+#include "std/std_offset.h"
+
 #include "base/img_desc.h"
 #include "std/std.h"
+#include "std/std_bytes.h"
 
 namespace {
 
 std::int32_t untiled_sample_offset(const img_desc *desc, std::int32_t line, std::int32_t samp,
                                    std::int32_t band)
 {
-    // Beyond that many pixels the offset does not fit, and its products need not either.
+    // With more pixels before it the offset does not fit, and its products may overflow 64 bits.
     if (std::int64_t{line} * desc->std_file->padded_nsamps + samp > INT32_MAX) return -1;
     if (desc->layout == IMG_LAYOUT_BSQ)
-        return img_std_fitting(img_std_line_offset(desc, line, samp, band));
-    return img_std_fitting(img_std_pixel_offset(desc, line, samp) +
-                           std::int64_t{band} * desc->nbytes);
+        return img_std_fit31(img_std_line_offset(desc, line, samp, band));
+    return img_std_fit31(img_std_pixel_offset(desc, line, samp) +
+                         std::int64_t{band} * desc->nbytes);
 }
 
 std::int32_t tiled_sample_offset(const img_desc *desc, std::int32_t line, std::int32_t samp,
@@ -27,8 +32,7 @@ std::int32_t tiled_sample_offset(const img_desc *desc, std::int32_t line, std::i
     const std::int64_t tile =
         img_std_tile_offset(desc, tile_row * file->tiles_across + tile_col, band);
     const bool interleaved = desc->layout == IMG_LAYOUT_TILED_BIP;
-    return img_std_fitting(tile +
-                           (interleaved ? pixel * desc->nbands + band : pixel) * desc->nbytes);
+    return img_std_fit31(tile + (interleaved ? pixel * desc->nbands + band : pixel) * desc->nbytes);
 }
 
 }  // namespace

@@ -1,22 +1,33 @@
-// The region operations of standard-driver types: each layout has its transfer.
+// Choosing the transfer of a region by the image's layout. Read std_region.h first.
+#include "std/std_region.h"
+
 #include "base/img_desc.h"
-#include "std/std.h"
+#include "base/types.h"
+#include "std/std_interleaved_lines.h"
+#include "std/std_lines.h"
+#include "std/std_tiled.h"
 
 namespace {
 
-enum class organisation { lines, interleaved_lines, tiles };
+struct region_transfer {
+    img_read_fn read;
+    img_write_fn write;
+};
 
-organisation organisation_of(const img_desc *desc)
+region_transfer transfer_of(const img_desc *desc)
 {
     switch (desc->layout) {
-    case IMG_LAYOUT_BIP:
-        return desc->nbands > 1 ? organisation::interleaved_lines : organisation::lines;
     case IMG_LAYOUT_TILED:
     case IMG_LAYOUT_BAND_TILED:
     case IMG_LAYOUT_TILED_BIP:
-        return organisation::tiles;
+        return {.read = img_read_tiled, .write = img_std_write_tiled};
+    case IMG_LAYOUT_BIP:
+        if (desc->nbands > 1)
+            return {.read = img_std_read_nontiled_interleaved,
+                    .write = img_std_write_nontiled_interleaved};
+        [[fallthrough]];  // with one band the two layouts are the same
     default:
-        return organisation::lines;
+        return {.read = img_read_nontiled, .write = img_std_write_nontiled};
     }
 }
 
@@ -25,7 +36,7 @@ bool spans(std::int32_t first, std::int32_t count, std::int32_t extent)
     return first >= 0 && std::int64_t{first} + count <= extent;
 }
 
-// Only an image that takes windows beyond its edges can ask for a region that is not inside it.
+// False only for images whose `unclipped` is set: other windows are clipped before.
 bool is_inside(const img_desc *desc, std::int32_t line, std::int32_t samp, std::int32_t nlines,
                std::int32_t nsamps, std::int32_t band)
 {
@@ -41,15 +52,7 @@ std::int32_t img_std_read(img_desc *desc, std::int32_t line, std::int32_t samp, 
 {
     if (nlines < 1 || nsamps < 1) return 0;
     if (!is_inside(desc, line, samp, nlines, nsamps, band)) return -1;
-    switch (organisation_of(desc)) {
-    case organisation::interleaved_lines:
-        return img_std_read_nontiled_interleaved(desc, line, samp, nlines, nsamps, band, buffer,
-                                                 stride);
-    case organisation::tiles:
-        return img_read_tiled(desc, line, samp, nlines, nsamps, band, buffer, stride);
-    default:
-        return img_read_nontiled(desc, line, samp, nlines, nsamps, band, buffer, stride);
-    }
+    return transfer_of(desc).read(desc, line, samp, nlines, nsamps, band, buffer, stride);
 }
 
 std::int32_t img_std_write(img_desc *desc, std::int32_t line, std::int32_t samp,
@@ -59,13 +62,5 @@ std::int32_t img_std_write(img_desc *desc, std::int32_t line, std::int32_t samp,
 {
     if (nlines < 1 || nsamps < 1) return 0;
     if (!is_inside(desc, line, samp, nlines, nsamps, band)) return -1;
-    switch (organisation_of(desc)) {
-    case organisation::interleaved_lines:
-        return img_std_write_nontiled_interleaved(desc, line, samp, nlines, nsamps, band, buffer,
-                                                  stride, fill);
-    case organisation::tiles:
-        return img_std_write_tiled(desc, line, samp, nlines, nsamps, band, buffer, stride, fill);
-    default:
-        return img_std_write_nontiled(desc, line, samp, nlines, nsamps, band, buffer, stride, fill);
-    }
+    return transfer_of(desc).write(desc, line, samp, nlines, nsamps, band, buffer, stride, fill);
 }

@@ -1,83 +1,97 @@
-// Moving samples, whatever the transfer that needs it.
+// Copying samples. The loops are plain C++ that compilers turn into vector code;
+// base/multiversion.h says how the exchange is built twice. Read std_samples.h first.
+#include "std/std_samples.h"
+
+#include "base/count.h"
+#include "base/img_desc.h"
 #include "base/multiversion.h"
-#include "std/std.h"
 
 #include <algorithm>
 #include <cstring>
 
 namespace {
 
-inline void copy_exchanged(const std::uint8_t *from, std::size_t from_step, std::uint8_t *to,
-                           std::size_t to_step, std::size_t count)
+inline void copy_exchanged(const std::uint8_t *source, std::size_t source_step,
+                           std::uint8_t *target, std::size_t target_step, std::size_t count)
 {
     for (std::size_t i = 0; i < count; ++i) {
         std::uint16_t sample;
-        std::memcpy(&sample, from + i * from_step, sizeof sample);
+        std::memcpy(&sample, source + i * source_step, sizeof sample);
         sample = static_cast<std::uint16_t>(sample << 8U | sample >> 8U);
-        std::memcpy(to + i * to_step, &sample, sizeof sample);
+        std::memcpy(target + i * target_step, &sample, sizeof sample);
     }
 }
 
 template <std::size_t Nbytes>
-void copy_spaced(const std::uint8_t *from, std::size_t from_step, std::uint8_t *to,
-                 std::size_t to_step, std::size_t count)
+void copy_spaced(const std::uint8_t *source, std::size_t source_step, std::uint8_t *target,
+                 std::size_t target_step, std::size_t count)
 {
     for (std::size_t i = 0; i < count; ++i)
-        std::memcpy(to + i * to_step, from + i * from_step, Nbytes);
+        std::memcpy(target + i * target_step, source + i * source_step, Nbytes);
 }
 
-// Asks for bytes that are to be read soon: rows on pages of their own come from memory one by one
-// otherwise.
+// Prefetches bytes that are read soon. Rows on pages of their own are out of reach of the
+// processor's own prefetching.
 void prefetch(const std::uint8_t *bytes, std::size_t count)
 {
     constexpr std::size_t cache_line = 64;
     constexpr std::size_t most = 2048;
-    for (std::size_t at = 0; at < std::min(count, most); at += cache_line)
-        __builtin_prefetch(bytes + at);
+    for (std::size_t offset = 0; offset < std::min(count, most); offset += cache_line)
+        __builtin_prefetch(bytes + offset);
 }
 
 }  // namespace
 
-IMG_MULTIVERSION void img_std_exchange_bytes(const std::uint8_t *from, std::uint8_t *to,
+std::size_t img_std_sample_bytes(const img_desc *desc, std::int64_t count)
+{
+    return img_count(count) * img_count(desc->nbytes);
+}
+
+bool img_std_exchanges_bytes(const img_desc *desc)
+{
+    return desc->nbytes == 2 && desc->swap != 0;
+}
+
+IMG_MULTIVERSION void img_std_exchange_bytes(const std::uint8_t *source, std::uint8_t *target,
                                              std::size_t count)
 {
-    copy_exchanged(from, 2, to, 2, count);
+    copy_exchanged(source, 2, target, 2, count);
 }
 
-void img_std_copy_samples(const std::uint8_t *from, std::size_t from_step, std::uint8_t *to,
-                          std::size_t to_step, std::size_t count, std::int32_t nbytes,
+void img_std_copy_samples(const std::uint8_t *source, std::size_t source_step, std::uint8_t *target,
+                          std::size_t target_step, std::size_t count, std::int32_t nbytes,
                           bool exchange)
 {
-    const auto width = static_cast<std::size_t>(nbytes);
-    const bool packed = from_step == width && to_step == width;
+    const std::size_t width = img_count(nbytes);
+    const bool packed = source_step == width && target_step == width;
     if (exchange && packed)
-        img_std_exchange_bytes(from, to, count);
+        img_std_exchange_bytes(source, target, count);
     else if (exchange)
-        copy_exchanged(from, from_step, to, to_step, count);
+        copy_exchanged(source, source_step, target, target_step, count);
     else if (packed)
-        std::memcpy(to, from, count * width);
+        std::memcpy(target, source, count * width);
     else if (width == 1)
-        copy_spaced<1>(from, from_step, to, to_step, count);
+        copy_spaced<1>(source, source_step, target, target_step, count);
     else
-        copy_spaced<2>(from, from_step, to, to_step, count);
+        copy_spaced<2>(source, source_step, target, target_step, count);
 }
 
-void img_std_copy_rows(const img_std_rows &from, std::uint8_t *to, std::size_t to_pitch,
+void img_std_copy_rows(const img_std_rows &rows, std::uint8_t *target, std::size_t target_pitch,
                        std::size_t nrows, std::size_t nsamps, std::int32_t nbytes, bool exchange)
 {
-    const auto width = static_cast<std::size_t>(nbytes);
-    if (from.pitch == from.step * nsamps && to_pitch == width * nsamps) {
+    const std::size_t width = img_count(nbytes);
+    if (rows.pitch == rows.step * nsamps && target_pitch == width * nsamps) {
         nsamps *= nrows;
         nrows = std::min<std::size_t>(nrows, 1);
     }
-    const std::size_t row_length = from.step * nsamps;
+    const std::size_t row_length = rows.step * nsamps;
     constexpr std::size_t bytes_ahead = 4096;
     constexpr std::size_t most_rows_ahead = 16;
     const std::size_t ahead =
         std::clamp<std::size_t>(bytes_ahead / (row_length + 1), 1, most_rows_ahead);
     for (std::size_t row = 0; row < nrows; ++row) {
-        if (row + ahead < nrows) prefetch(from.first + (row + ahead) * from.pitch, row_length);
-        img_std_copy_samples(from.first + row * from.pitch, from.step, to + row * to_pitch, width,
-                             nsamps, nbytes, exchange);
+        if (row + ahead < nrows) prefetch(rows.first + (row + ahead) * rows.pitch, row_length);
+        img_std_copy_samples(rows.first + row * rows.pitch, rows.step, target + row * target_pitch,
+                             width, nsamps, nbytes, exchange);
     }
 }

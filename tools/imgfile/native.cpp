@@ -14,6 +14,7 @@
 #include "io/io_method.h"
 #include "io/platform.h"
 #include "std/std.h"
+#include "std/std_bytes.h"
 
 #include <cerrno>
 #include <charconv>
@@ -73,6 +74,8 @@ std::int32_t register_name(const std::string &name)
                                    img_platform_unlink, nullptr);
         img_offer_lending("plain", lend_copy);
         img_offer_lending("mapped", img_platform_lend);
+        img_allow_merging("plain");
+        img_allow_merging("mapped");
     }
     names[next] = name;
     return next++;

@@ -1,6 +1,6 @@
 #include "samples.h"
 
-#include "std/std.h"
+#include "std/std_samples.h"
 
 void spread_pixels(const std::uint8_t *pixels, std::int32_t nbands, const band_list &bands,
                    const line_part &part, block &to)

@@ -1,7 +1,13 @@
-// Between a file image and an in-memory image, and single samples of the latter.
+// Between an image in memory and a file image. No function that a host calls comes here: the two
+// operations are part of what a type offers. Read std_memory.h first.
+#include "std/std_memory.h"
+
+#include "base/count.h"
 #include "base/img_desc.h"
 #include "base/report.h"
 #include "std/std.h"
+#include "std/std_bytes.h"
+#include "std/std_offset.h"
 
 #include <cstring>
 
@@ -16,13 +22,14 @@ std::int64_t band_bytes(const img_desc *desc)
     return std::int64_t{file->padded_nsamps} * desc->nlines * desc->nbytes;
 }
 
-bool is_whole_image_per_pixel_or_tile(const img_desc *desc)
+// True when the samples of all bands lie together, so that one transfer moves them.
+bool moves_all_bands_at_once(const img_desc *desc)
 {
     return desc->layout == IMG_LAYOUT_BIP || desc->layout == IMG_LAYOUT_TILED ||
            desc->layout == IMG_LAYOUT_TILED_BIP;
 }
 
-// Returns 0 when the images fit each other at this place, else -1 after a message.
+// Returns 0 when the images fit each other at (`line0`, `samp0`), else -1 after a message.
 std::int32_t check_fit(const img_desc *desc, const img_desc *mem_desc, std::int32_t line0,
                        std::int32_t samp0)
 {
@@ -50,11 +57,12 @@ std::int32_t transfer(std::int32_t writing, img_desc *desc, std::int32_t offset,
 std::int32_t img_std_io_virtual(std::int32_t writing, img_desc *desc, img_desc *mem_desc,
                                 std::int32_t line0, std::int32_t samp0)
 {
-    if (!mem_desc->mem_image || desc->std_file->data_fd == -1) return -1;
     if (check_fit(desc, mem_desc, line0, samp0) == -1) return -1;
-    const bool at_once = is_whole_image_per_pixel_or_tile(desc);
+    if (!mem_desc->mem_image || desc->std_file->data_fd == -1) return -1;
+    const bool at_once = moves_all_bands_at_once(desc);
     const std::int32_t transfers = at_once ? 1 : desc->nbands;
     const std::int64_t size = band_bytes(mem_desc) * (at_once ? mem_desc->nbands : 1);
+    if (size == 0) return 0;  // not even the length of the file changes
     for (std::int32_t band = 0; band < transfers; ++band) {
         const std::int32_t offset = img_std_sample_offset(desc, line0, samp0, band);
         if (offset == -1 || offset + size > INT32_MAX) return -1;
@@ -77,11 +85,11 @@ std::int32_t img_std_pix_io_virtual(std::int32_t writing, img_desc *desc, std::i
     const std::int32_t offset = img_std_sample_offset(desc, line, samp, band);
     if (offset == -1 || offset > desc->std_file->veof_max)
         return img_fail("img_std_pix_io_virtual:Pixel out of range.\n");
-    // The last sample may begin within the image and end beyond it.
+    // A two-byte sample may begin inside the image and end beyond it.
     const std::int64_t room = std::int64_t{desc->std_file->veof_max} - offset + 1;
     if (room < desc->nbytes) return -1;
     std::uint8_t *const sample = desc->mem_image.get() + offset;
-    const auto width = static_cast<std::size_t>(desc->nbytes);
+    const auto width = img_count(desc->nbytes);
     if (writing != 0)
         std::memcpy(sample, value, width);
     else

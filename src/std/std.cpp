@@ -1,7 +1,13 @@
-// How a format that is built on the standard driver takes its slot in the type table.
-#include "base/img_desc.h"
-#include "base/type_hooks.h"
+// How a format that is built on the standard driver takes its slots. Read std.h first, then
+// base/types.h and base/type_hooks.h for what the slots mean.
 #include "std/std.h"
+
+#include "base/count.h"
+#include "base/type_hooks.h"
+#include "std/std_memory.h"
+#include "std/std_region.h"
+#include "std/std_setup.h"
+#include "std/std_tiles.h"
 
 std::int32_t img_std_fill_type(std::int32_t slot, const char *name, const char *extension,
                                std::int32_t tiled_layout, std::int32_t untiled_layout,
@@ -10,7 +16,7 @@ std::int32_t img_std_fill_type(std::int32_t slot, const char *name, const char *
                                img_image_fn padded_nsamps_fn, img_type_op_fn type_op,
                                img_type_desc *slot_record)
 {
-    img_type_hooks_table[static_cast<std::size_t>(slot)] = {
+    img_type_hooks_table[img_count(slot)] = {
         .untiled_layout = untiled_layout,
         .tiled_layout = tiled_layout,
         .probe = probe,

@@ -1,0 +1,44 @@
+// Splitting and merging pixel interleaved tiles. Reading and storing them is in std_tiles.cpp. Read
+// std_interleaved_tiles.h first.
+#include "std/std_interleaved_tiles.h"
+
+#include "base/count.h"
+#include "std/std_samples.h"
+
+void img_std_split_bytes(const std::uint8_t *tile, std::size_t length, std::int32_t nbytes,
+                         std::int32_t nbands, const std::array<std::int32_t, 3> &band_map,
+                         const std::array<std::uint8_t *, 3> &planes)
+{
+    const std::size_t width = img_count(nbytes);
+    const std::size_t pixel = img_count(nbands) * width;
+    for (std::size_t position = 0; position < img_count(nbands); ++position) {
+        std::uint8_t *const plane = planes[img_count(band_map[position])];
+        const std::size_t sample_end = (position + 1) * width;
+        if (plane == nullptr || length < sample_end) continue;
+        img_std_copy_samples(tile + position * width, pixel, plane, width,
+                             (length - sample_end) / pixel + 1, nbytes, false);
+    }
+}
+
+void img_std_split_tile(const std::uint8_t *tile, std::int32_t tile_nsamps,
+                        std::int32_t tile_nlines, std::int32_t nbytes, std::int32_t nbands,
+                        const std::array<std::int32_t, 3> &band_map,
+                        const std::array<std::uint8_t *, 3> &planes)
+{
+    const std::size_t pixels = img_count(tile_nsamps) * img_count(tile_nlines);
+    img_std_split_bytes(tile, pixels * img_count(nbands) * img_count(nbytes), nbytes, nbands,
+                        band_map, planes);
+}
+
+void img_std_merge_tile(std::int32_t nbands, const std::array<std::int32_t, 3> &band_map,
+                        const std::array<const std::uint8_t *, 3> &planes, std::int32_t tile_nsamps,
+                        std::int32_t tile_nlines, std::int32_t nbytes, std::uint8_t *tile)
+{
+    const std::size_t width = img_count(nbytes);
+    const std::size_t pixel = img_count(nbands) * width;
+    const std::size_t pixels = img_count(tile_nsamps) * img_count(tile_nlines);
+    for (std::size_t position = 0; position < img_count(nbands); ++position)
+        if (const auto *plane = planes[img_count(band_map[position])]; plane != nullptr)
+            img_std_copy_samples(plane, width, tile + position * width, pixel, pixels, nbytes,
+                                 false);
+}

@@ -1,0 +1,25 @@
+// Pixel interleaved tiles, the tiles of layout 4: splitting them into tile planes and merging
+// planes into them.
+#ifndef IMG_STD_INTERLEAVED_TILES_H
+#define IMG_STD_INTERLEAVED_TILES_H
+
+#include <array>
+#include <cstddef>
+#include <cstdint>
+
+// Copy the samples of each band between one tile and the bands' planes; sample k of a pixel belongs
+// to band `band_map`[k]. Bands whose plane is null are passed over.
+void img_std_split_tile(const std::uint8_t *tile, std::int32_t tile_nsamps,
+                        std::int32_t tile_nlines, std::int32_t nbytes, std::int32_t nbands,
+                        const std::array<std::int32_t, 3> &band_map,
+                        const std::array<std::uint8_t *, 3> &planes);
+void img_std_merge_tile(std::int32_t nbands, const std::array<std::int32_t, 3> &band_map,
+                        const std::array<const std::uint8_t *, 3> &planes, std::int32_t tile_nsamps,
+                        std::int32_t tile_nlines, std::int32_t nbytes, std::uint8_t *tile);
+
+// Splits the first `length` bytes of a tile: all samples in them that are whole.
+void img_std_split_bytes(const std::uint8_t *tile, std::size_t length, std::int32_t nbytes,
+                         std::int32_t nbands, const std::array<std::int32_t, 3> &band_map,
+                         const std::array<std::uint8_t *, 3> &planes);
+
+#endif
