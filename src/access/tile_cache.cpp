@@ -1,5 +1,8 @@
+// The tile cache: a grid of references to entries, which are also on a list in the order of use.
+// Read tile_cache.h first.
 #include "access/tile_cache.h"
 
+#include "base/count.h"
 #include "base/report.h"
 
 #include <algorithm>
@@ -11,23 +14,22 @@ namespace {
 
 using entry = img_tile_cache_entry;
 
-// Returns the grid cell, or null when there is none.
+// Returns the grid cell, or null outside the grid.
 entry **cell_at(const img_tile_cache *cache, std::int32_t col, std::int32_t row)
 {
     if (cache == nullptr || col < 0 || col >= cache->ncols || row < 0 || row >= cache->nrows)
         return nullptr;
-    return &cache->grid[static_cast<std::size_t>(row) * static_cast<std::size_t>(cache->ncols) +
-                        static_cast<std::size_t>(col)];
+    return &cache->grid[img_count(row) * img_count(cache->ncols) + img_count(col)];
 }
 
-// Returns the tile in the grid cell, or null when there is none.
+// Returns the tile in the grid cell, or null for an empty cell and outside the grid.
 entry *tile_at(const img_tile_cache *cache, std::int32_t col, std::int32_t row)
 {
     entry *const *const cell = cell_at(cache, col, row);
     return cell != nullptr ? *cell : nullptr;
 }
 
-// Takes a tile that is not the first off the list.
+// Removes a tile from the list; it is not the first one.
 void unlink(img_tile_cache *cache, entry *tile)
 {
     tile->newer->older = tile->older;
@@ -52,8 +54,8 @@ void move_to_front(img_tile_cache *cache, entry *tile)
 // Returns a new entry at the front of the list, or null after a message.
 entry *allocate_entry(img_tile_cache *cache, std::int32_t col, std::int32_t row)
 {
-    std::unique_ptr<std::uint8_t[]> data(
-        new (std::nothrow) std::uint8_t[static_cast<std::size_t>(cache->tile_bytes)]);
+    std::unique_ptr<std::uint8_t[]> data(new (std::nothrow)
+                                             std::uint8_t[img_count(cache->tile_bytes)]);
     entry *const tile = data ? new (std::nothrow) entry{.dirty = 0,
                                                         .col = col,
                                                         .row = row,
@@ -70,8 +72,8 @@ entry *allocate_entry(img_tile_cache *cache, std::int32_t col, std::int32_t row)
     return tile;
 }
 
-// Takes the least recently used entry from its cell for another one. Returns null after a message
-// when the list is empty.
+// Moves the least recently used entry to another cell. Returns null after a message when the list
+// is empty.
 entry *reassign_entry(img_tile_cache *cache, std::int32_t col, std::int32_t row)
 {
     entry *const tile = cache->lru;
@@ -95,12 +97,12 @@ img_tile_cache *img_tile_cache_create(std::int32_t tile_bytes, std::int32_t ncol
     const std::int64_t budget = std::int64_t{budget_mb} << 20;
     const std::int64_t room = budget / tile_bytes;
     const std::int64_t cells = std::int64_t{ncols} * nrows;
-    // The grid, too, is memory: one that takes more than the tiles is for tiles of a few samples.
+    // The grid takes memory, too. With tiles of a few samples it would take more than the tiles.
     constexpr std::int64_t modest_grid = std::int64_t{16} << 20;
     const std::int64_t most_cells =
         std::max(budget, modest_grid) / static_cast<std::int64_t>(sizeof(entry *));
     if (room < 1 || cells > most_cells) return nullptr;
-    std::unique_ptr<entry *[]> grid(new (std::nothrow) entry *[static_cast<std::size_t>(cells)] {});
+    std::unique_ptr<entry *[]> grid(new (std::nothrow) entry *[img_count(cells)] {});
     if (!grid) return nullptr;
     const auto capacity = static_cast<std::int32_t>(std::min(cells, room));
     return new (std::nothrow) img_tile_cache{.nrows = nrows,
@@ -139,7 +141,7 @@ std::int32_t img_tile_cache_get(img_tile_cache *cache, std::int32_t col, std::in
 {
     entry *const tile = tile_at(cache, col, row);
     if (tile == nullptr) return -1;
-    std::memcpy(out, tile->data.get(), static_cast<std::size_t>(cache->tile_bytes));
+    std::memcpy(out, tile->data.get(), img_count(cache->tile_bytes));
     move_to_front(cache, tile);
     return 0;
 }
@@ -156,7 +158,7 @@ std::int32_t img_tile_cache_put(img_tile_cache *cache, std::int32_t col, std::in
     if (tile == nullptr) return -1;
     *cell = tile;
     tile->dirty = dirty != 0 ? 1 : 0;
-    std::memcpy(tile->data.get(), data, static_cast<std::size_t>(cache->tile_bytes));
+    std::memcpy(tile->data.get(), data, img_count(cache->tile_bytes));
     move_to_front(cache, tile);
     return 0;
 }

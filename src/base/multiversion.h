@@ -1,12 +1,12 @@
-// Functions that are built several times, for processors of different abilities. The one that
-// fits is chosen when the library is loaded.
+// Functions that are built several times, for processors of different abilities. The loader picks
+// the version that fits.
 #ifndef IMG_MULTIVERSION_H
 #define IMG_MULTIVERSION_H
 
-#include <cstdint>  // says which C library this is
+#include <cstdint>  // defines __GLIBC__
 
-// Other compilers, C libraries and processors get the one version that suits all. (clang 14 knows
-// the attribute, but loses the function where it is called from another file.)
+// Other compilers, C libraries and processors get one version. (clang 14 has the attribute, but the
+// function is then missing where another file calls it.)
 #if defined(__x86_64__) && defined(__GLIBC__) && !defined(__clang__)
 #define IMG_MULTIVERSION __attribute__((target_clones("avx2", "default")))
 #else

@@ -1,3 +1,4 @@
+// Printing messages, or handing them to the sink that the tool installs. Read report.h first.
 #include "base/report.h"
 
 #include <array>
@@ -5,6 +6,8 @@
 #include <cstdarg>
 #include <cstdio>
 #include <cstring>
+
+img_message_fn img_message_sink = nullptr;
 
 std::int32_t img_fail(const char *format, ...)
 {

@@ -1,3 +1,6 @@
+// Working memory. Capacities are powers of two, so that sizes that differ a little share a block.
+// Address sanitizers see the bytes beyond the size that was asked for, and blocks that are kept, as
+// not usable. Read scratch.h first.
 #include "base/scratch.h"
 
 #include <algorithm>
@@ -8,13 +11,13 @@
 #include <utility>
 
 #if defined(__SANITIZE_ADDRESS__)
-#define IMG_CHECKED_ADDRESSES
+#define IMG_ADDRESS_SANITIZER
 #elif defined(__has_feature)
 #if __has_feature(address_sanitizer)
-#define IMG_CHECKED_ADDRESSES
+#define IMG_ADDRESS_SANITIZER
 #endif
 #endif
-#ifdef IMG_CHECKED_ADDRESSES
+#ifdef IMG_ADDRESS_SANITIZER
 #include <sanitizer/asan_interface.h>
 #endif
 
@@ -24,36 +27,36 @@ struct kept_block {
     std::uint8_t *block;  // null: none
     std::size_t capacity;
 };
-std::array<kept_block, 8> kept{};  // the longest kept first
+std::array<kept_block, 8> kept{};  // oldest first; free entries at the end
 std::size_t kept_bytes = 0;
 
 constexpr std::align_val_t ALIGNMENT{IMG_SCRATCH_ALIGNMENT};
 
-// Tells a checker of addresses what of a block may be touched.
-void mark_usable([[maybe_unused]] const kept_block &of, [[maybe_unused]] std::size_t size)
+// Makes the first `size` bytes of a block usable, the others not.
+void mark_usable([[maybe_unused]] const kept_block &memory, [[maybe_unused]] std::size_t size)
 {
-#ifdef IMG_CHECKED_ADDRESSES
-    ASAN_UNPOISON_MEMORY_REGION(of.block, size);
-    ASAN_POISON_MEMORY_REGION(of.block + size, of.capacity - size);
+#ifdef IMG_ADDRESS_SANITIZER
+    ASAN_UNPOISON_MEMORY_REGION(memory.block, size);
+    ASAN_POISON_MEMORY_REGION(memory.block + size, memory.capacity - size);
 #endif
 }
 
-void free_block(const kept_block &of)
+void free_block(const kept_block &memory)
 {
-    mark_usable(of, of.capacity);
-    ::operator delete[](of.block, ALIGNMENT);
+    mark_usable(memory, memory.capacity);
+    ::operator delete[](memory.block, ALIGNMENT);
 }
 
-// Takes a block off those that are kept; the later ones move up.
-kept_block take_kept(kept_block *place)
+// Takes an entry off the kept blocks; the later ones move up.
+kept_block take_kept(kept_block *entry)
 {
-    const kept_block taken = std::exchange(*place, {});
+    const kept_block taken = std::exchange(*entry, {});
     kept_bytes -= taken.capacity;
-    std::rotate(place, place + 1, kept.end());
+    std::rotate(entry, entry + 1, kept.end());
     return taken;
 }
 
-// Returns a block of that capacity, if there is none among those that are kept a new one.
+// Returns a kept block of that capacity, or a new one.
 std::uint8_t *take_block(std::size_t capacity)
 {
     kept_block *const found = std::ranges::find(kept, capacity, &kept_block::capacity);
@@ -66,7 +69,6 @@ std::uint8_t *take_block(std::size_t capacity)
 img_scratch img_take_scratch(std::size_t size)
 {
     if (size > std::numeric_limits<std::ptrdiff_t>::max()) return nullptr;
-    // Sizes that differ a little fit the same block.
     const std::size_t capacity =
         std::max(size > IMG_SCRATCH_LIMIT ? size : std::bit_ceil(size), IMG_SCRATCH_ALIGNMENT);
     img_scratch block(take_block(capacity), {capacity});

@@ -2,6 +2,7 @@
 // entries faster. Read chain_lut.h and ramp.h first.
 #include "chain/chain_lut.h"
 
+#include "base/count.h"
 #include "chain/ramp.h"
 
 #include <cstring>
@@ -9,30 +10,30 @@
 namespace {
 
 template <typename Sample>
-Sample load_sample(const std::uint8_t *at)
+Sample load_sample(const std::uint8_t *bytes)
 {
     Sample sample;
-    std::memcpy(&sample, at, sizeof sample);
+    std::memcpy(&sample, bytes, sizeof sample);
     return sample;
 }
 
 template <typename Sample>
-void store_sample(std::uint8_t *at, std::uint16_t value)
+void store_sample(std::uint8_t *bytes, std::uint16_t value)
 {
     const auto sample = static_cast<Sample>(value);
-    std::memcpy(at, &sample, sizeof sample);
+    std::memcpy(bytes, &sample, sizeof sample);
 }
 
 // Passes every sample of a window through `map`, from one buffer to another or in place.
 template <typename In, typename Out, typename Map>
-void map_window(const std::uint8_t *from, const img_buffer_def &from_def, std::uint8_t *to,
-                const img_buffer_def &to_def, Map map)
+void map_window(const std::uint8_t *source, const img_buffer_def &source_def, std::uint8_t *target,
+                const img_buffer_def &target_def, Map map)
 {
-    for (std::int32_t line = 0; line < from_def.nlines; ++line) {
-        const auto row = static_cast<std::size_t>(line);
-        const auto *in = from + row * static_cast<std::size_t>(from_def.stride) * sizeof(In);
-        auto *out = to + row * static_cast<std::size_t>(to_def.stride) * sizeof(Out);
-        for (std::int32_t samp = 0; samp < from_def.nsamps; ++samp) {
+    for (std::int32_t line = 0; line < source_def.nlines; ++line) {
+        const auto row = img_count(line);
+        const auto *in = source + row * img_count(source_def.stride) * sizeof(In);
+        auto *out = target + row * img_count(target_def.stride) * sizeof(Out);
+        for (std::int32_t samp = 0; samp < source_def.nsamps; ++samp) {
             store_sample<Out>(out, map(load_sample<In>(in)));
             in += sizeof(In);
             out += sizeof(Out);
@@ -42,17 +43,18 @@ void map_window(const std::uint8_t *from, const img_buffer_def &from_def, std::u
 
 // Maps two bytes to one by a ramp, if the table is one and the window is large enough to pay for
 // finding out. Returns false, with nothing mapped, otherwise.
-bool map_along_ramp(const std::uint16_t *table, std::int32_t size, const std::uint8_t *from,
-                    const img_buffer_def &from_def, std::uint8_t *to, const img_buffer_def &to_def)
+bool map_along_ramp(const std::uint16_t *table, std::int32_t size, const std::uint8_t *source,
+                    const img_buffer_def &source_def, std::uint8_t *target,
+                    const img_buffer_def &target_def)
 {
     constexpr std::int64_t break_even = 4;  // samples per entry
     img_chain_ramp ramp;
-    if (std::int64_t{from_def.nlines} * from_def.nsamps < break_even * size ||
+    if (std::int64_t{source_def.nlines} * source_def.nsamps < break_even * size ||
         !img_chain_find_ramp(table, size, &ramp))
         return false;
-    for (std::int64_t row = 0; row < from_def.nlines; ++row)
-        img_chain_map_ramp(from + row * from_def.stride * 2, to + row * to_def.stride,
-                           static_cast<std::size_t>(from_def.nsamps), ramp);
+    for (std::int64_t row = 0; row < source_def.nlines; ++row)
+        img_chain_map_ramp(source + row * source_def.stride * 2, target + row * target_def.stride,
+                           img_count(source_def.nsamps), ramp);
     return true;
 }
 
@@ -76,8 +78,8 @@ void img_chain_convert_lut(const std::uint16_t *src_table, const img_chain_lut *
     const std::int32_t out_shift = dst->bits_out - src->bits_out;
     // A narrower index or value takes the high bits of the wider one.
     for (std::int32_t i = 0; i < dst->size; ++i) {
-        const std::int32_t from = in_shift >= 0 ? i >> in_shift : i << -in_shift;
-        const std::int64_t value = src_table[from];
+        const std::int32_t index = in_shift >= 0 ? i >> in_shift : i << -in_shift;
+        const std::int64_t value = src_table[index];
         dst_table[i] =
             static_cast<std::uint16_t>(out_shift >= 0 ? value << out_shift : value >> -out_shift);
     }
@@ -105,7 +107,7 @@ std::int32_t img_chain_lut_remap(void *record, const std::uint8_t *in_buffer,
     const std::uint16_t *table = own.lut;
     img_scratch converted;
     if (in_def->nbits != own.bits_in) {
-        converted = img_take_scratch(static_cast<std::size_t>(size) * sizeof(std::uint16_t));
+        converted = img_take_scratch(img_count(size) * sizeof(std::uint16_t));
         if (!converted) return -1;
         img_chain_lut widths = own;
         widths.bits_in = static_cast<std::uint8_t>(in_def->nbits);

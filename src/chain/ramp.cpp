@@ -91,13 +91,13 @@ bool img_chain_find_ramp(const std::uint16_t *table, std::int32_t size, img_chai
     return false;
 }
 
-IMG_MULTIVERSION void img_chain_map_ramp(const std::uint8_t *from, std::uint8_t *to,
+IMG_MULTIVERSION void img_chain_map_ramp(const std::uint8_t *source, std::uint8_t *target,
                                          std::size_t count, const img_chain_ramp &ramp)
 {
     const img_chain_ramp own = ramp;  // local copy: cannot alias the output
     for (std::size_t i = 0; i < count; ++i) {
         std::uint16_t sample;
-        std::memcpy(&sample, from + i * sizeof sample, sizeof sample);
-        to[i] = value_at(own, sample);
+        std::memcpy(&sample, source + i * sizeof sample, sizeof sample);
+        target[i] = value_at(own, sample);
     }
 }

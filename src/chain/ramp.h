@@ -21,7 +21,7 @@ struct img_chain_ramp {
 bool img_chain_find_ramp(const std::uint16_t *table, std::int32_t size, img_chain_ramp *ramp);
 
 // Maps `count` two-byte samples, of any alignment, to bytes.
-void img_chain_map_ramp(const std::uint8_t *from, std::uint8_t *to, std::size_t count,
+void img_chain_map_ramp(const std::uint8_t *source, std::uint8_t *target, std::size_t count,
                         const img_chain_ramp &ramp);
 
 #endif

@@ -3,6 +3,7 @@
 // in a fixed order, so that every build gives the same bytes. Read stretch.h first.
 #include "chain/stretch.h"
 
+#include "base/count.h"
 #include "base/multiversion.h"
 #include "base/report.h"
 
@@ -23,10 +24,10 @@ template <typename Sample>
 void count_samples(const std::uint8_t *buffer, const img_buffer_def &def, std::uint32_t *histogram,
                    std::size_t size)
 {
-    const auto line_length = static_cast<std::size_t>(def.stride) * sizeof(Sample);
+    const auto line_length = img_count(def.stride) * sizeof(Sample);
     // Local copies: the counters cannot alias them.
-    const auto nlines = static_cast<std::size_t>(std::max(def.nlines, 0));
-    const auto nsamps = static_cast<std::size_t>(std::max(def.nsamps, 0));
+    const auto nlines = img_count(std::max(def.nlines, 0));
+    const auto nsamps = img_count(std::max(def.nsamps, 0));
     for (std::size_t line = 0; line < nlines; ++line) {
         const std::uint8_t *const row = buffer + line * line_length;
         for (std::size_t samp = 0; samp < nsamps; samp += 4) {

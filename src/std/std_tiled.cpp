@@ -343,14 +343,14 @@ std::int32_t img_read_tiled(img_desc *desc, std::int32_t line, std::int32_t samp
                             std::uint8_t *buffer, std::int32_t stride)
 {
     const tiled_region region(desc, line, samp, nlines, nsamps, stride);
-    const bool refused = reads_stored_tiles(desc);
-    if (refused && read_lent_region(desc, region, band, buffer)) return 0;
+    const bool direct = reads_stored_tiles(desc);
+    if (direct && read_lent_region(desc, region, band, buffer)) return 0;
 
     const img_scratch run = img_take_scratch(region.run_length());
     if (!run) return img_fail_errno("img_read_tiled:malloc");
     // Virtual tiles at the edges have no samples for all of their plane, but are cached whole.
     if (desc->virtual_tiled != 0) std::fill_n(run.get(), region.run_length(), std::uint8_t{0});
-    const auto load = refused ? load_refused_run : img_load_tile_run;
+    const auto load = direct ? load_refused_run : img_load_tile_run;
     for (std::int32_t row = 0; row < region.tile_rows(); ++row) {
         if (load(desc, region.first_tile(row), region.ntiles(), band, run.get()) == -1) return -1;
         region.for_each_tile(row, [&](const tile_part &part) {
