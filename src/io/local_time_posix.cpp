@@ -3,8 +3,6 @@
 
 #include <ctime>
 
-#include <time.h>
-
 std::array<std::uint8_t, 6> img_local_time()
 {
     const std::time_t now = std::time(nullptr);

@@ -27,9 +27,10 @@ std::int32_t read_lines_in_memory(const img_desc *desc, std::int32_t line, std::
                                   std::int32_t nlines, std::int32_t nsamps, std::int32_t band,
                                   std::uint8_t *buffer, std::int32_t stride, bool exchange)
 {
+    const std::int32_t row_length = desc->nbytes * nsamps;
     for (std::int32_t i = 0; i < nlines; ++i) {
         const std::int64_t offset = img_std_line_offset(desc, std::int64_t{line} + i, samp, band);
-        if (offset + desc->nbytes * nsamps - 1 > desc->std_file->veof)
+        if (offset + row_length - 1 > desc->std_file->veof)
             return img_fail("img_read_nontiled: read beyond virtual eof!!\n");
         copy_row(desc, desc->mem_image.get() + offset,
                  buffer + img_count(i) * img_std_sample_bytes(desc, stride), nsamps, exchange);
