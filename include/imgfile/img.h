@@ -134,9 +134,9 @@ IMG_EXPORT int32_t img_query_num_bands(img_handle handle);
 
 /* Reads a window of one band into `buffer`.
  *
- * The window is `nlines` x `nsamps` samples, its first at (`line`, `samp`). Both may be negative,
- * and the window may extend beyond the image. Samples outside the image are set to the byte at
- * `fill`; null counts as 0. Row i of `buffer` starts at sample i * `stride`. Only the first
+ * The window is `nlines` x `nsamps` samples. Its first sample is at (`line`, `samp`). Both may be
+ * negative, and the window may extend beyond the image. Samples outside the image are set to the
+ * byte at `fill`; null counts as 0. Row i of `buffer` starts at sample i * `stride`. Only the first
  * `nsamps` samples of a row are written, so `buffer` needs room for (`nlines` - 1) * `stride` +
  * `nsamps` samples. A window of less than one line or one sample transfers nothing.
  *
@@ -167,8 +167,8 @@ IMG_EXPORT int32_t img_load_buffer(img_handle handle, int32_t line, int32_t samp
  * is as wide as one of the image, 1 or 2 bytes; two-byte samples are in native byte order. Row i of
  * `buffer` starts at sample i * `stride`. `buffer` is not modified.
  *
- * `fill` points to one sample of that width; null counts as 0. A tile is written whole, and its
- * samples that are neither in the window nor yet in the file get the fill, without a byte swap.
+ * `fill` points to one sample of that width; null counts as 0. Where the file does not yet hold a
+ * tile, the samples of the tile outside the window are set to the fill, without a byte swap.
  * Untiled images ignore the fill.
  *
  * Requires `nsamps` <= `stride`, 0 <= `band` < bands, and an image not opened read-only. Of the
@@ -186,10 +186,10 @@ IMG_EXPORT int32_t img_dump_buffer(img_handle handle, int32_t line, int32_t samp
 
 /* Reads `ntiles` whole tile planes of one band, starting at tile `first_tile`, into `buffer`.
  *
- * The planes follow one another in `buffer`. Each has tile height x tile width x bytes per sample
- * bytes. Samples are not stretched, and two-byte samples are in the byte order of the file, which
- * is big-endian if this library created it. An untiled image transfers nothing; neither does an
- * `ntiles` below 1.
+ * The planes follow one another in `buffer`. The size of each in bytes is tile height x tile width
+ * x bytes per sample. Samples are not stretched, and two-byte samples are in the byte order of the
+ * file, which is big-endian if this library created it. An untiled image transfers nothing; neither
+ * does an `ntiles` below 1.
  *
  * Returns 0.
  * Fails silently if the handle is invalid, the image was opened write-only, the run extends beyond
