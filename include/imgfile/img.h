@@ -80,8 +80,8 @@ IMG_EXPORT img_handle img_openfile(const char *name, int32_t flags);
  * bytes per sample.
  *   VITec: 0 to 3 bands, 1 or 2 bytes per sample. A tile size is 0 or a power of two from 8 to
  *   32768. Only its low 16 bits are tested for a power of two, so that 0x10008 is accepted as well.
- *   If only one of the two sizes is 0, the image is untiled, but its lines or its number of lines
- *   are padded to a multiple of the other size.
+ *   If only one of the two sizes is 0, the image is untiled, but the line length or the number of
+ *   lines is padded to a multiple of the other size.
  *   Helava: any number of bands, 1 byte per sample. The file does not store tile sizes; they hold
  *   until the image is closed. They do not change where samples are stored: a "tile" is the next
  *   tile width x tile height samples in file order. The last tile of a band may extend into the
@@ -138,14 +138,14 @@ IMG_EXPORT int32_t img_query_num_bands(img_handle handle);
  * negative, and the window may extend beyond the image. Samples outside the image are set to the
  * byte at `fill`; null counts as 0. Row i of `buffer` starts at sample i * `stride`. Only the first
  * `nsamps` samples of a row are written, so `buffer` needs room for (`nlines` - 1) * `stride` +
- * `nsamps` samples. A window of less than one line or one sample transfers nothing.
+ * `nsamps` samples. If `nlines` or `nsamps` is below 1, nothing is transferred.
  *
  * A sample of `buffer` is one byte. Two-byte samples are stretched to 8 bits, each window by its
  * own histogram. The histogram counts every fourth sample of each line, except samples that equal
  * the fill or exceed 12 bits. It is cut at 0.5 and at 99 percent, and the values between the cuts
  * are spread over 0..255. The fill is stretched as well. Samples that exceed 12 bits map as 4095
- * does. Two windows of one image may therefore map the same sample to different bytes.
- * img_load_tiles reads two-byte samples unchanged.
+ * does. Because the histogram depends on the window, two windows of one image may map the same
+ * sample to different bytes. img_load_tiles reads two-byte samples unchanged.
  *
  * Requires `nsamps` <= `stride`, 0 <= `band` < bands, and an image not opened write-only.
  * Returns 0.
@@ -188,8 +188,8 @@ IMG_EXPORT int32_t img_dump_buffer(img_handle handle, int32_t line, int32_t samp
  *
  * The planes follow one another in `buffer`. The size of each in bytes is tile height x tile width
  * x bytes per sample. Samples are not stretched, and two-byte samples are in the byte order of the
- * file, which is big-endian if this library created it. An untiled image transfers nothing; neither
- * does an `ntiles` below 1.
+ * file, which is big-endian if this library created it. If the image is
+ * untiled or `ntiles` is below 1, nothing is transferred.
  *
  * Returns 0.
  * Fails silently if the handle is invalid, the image was opened write-only, the run extends beyond
