@@ -188,8 +188,8 @@ IMG_EXPORT int32_t img_dump_buffer(img_handle handle, int32_t line, int32_t samp
  *
  * The planes follow one another in `buffer`. The size of each in bytes is tile height x tile width
  * x bytes per sample. Samples are not stretched, and two-byte samples are in the byte order of the
- * file, which is big-endian if this library created it. If the image is
- * untiled or `ntiles` is below 1, nothing is transferred.
+ * file, which is big-endian if this library created it. If the image is untiled or `ntiles` is
+ * below 1, nothing is transferred.
  *
  * Returns 0.
  * Fails silently if the handle is invalid, the image was opened write-only, the run extends beyond
