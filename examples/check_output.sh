@@ -1,5 +1,6 @@
 #!/bin/sh
-# check_output.sh EXPECTED PROGRAM: runs PROGRAM in an empty folder and compares what it says.
+# check_output.sh EXPECTED PROGRAM: runs PROGRAM in an empty folder and compares its output with the
+# file EXPECTED.
 set -eu
 expected=$1 program=$2
 

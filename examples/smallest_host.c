@@ -1,8 +1,10 @@
-/* The smallest complete host of imgfile: makes a small tiled image, opens it again, asks what it
- * is, and reads a window that crosses its edge and a whole tile.
+/* A small complete host of imgfile. It creates a tiled image, opens it again and prints its
+ * properties. Then it reads a window that extends beyond the image, and a whole tile.
  *
  *     cc smallest_host.c $(pkg-config --cflags --libs imgfile) -o smallest_host
- *     ./smallest_host [NEW_FILE] */
+ *     ./smallest_host [NEW_FILE]
+ *
+ * The contract of each function is in img.h. */
 #include "img.h"
 
 #include <stdio.h>
@@ -27,15 +29,15 @@ static void print_samples(const char *title, const uint8_t *samples, int nlines,
 
 static int make_image(const char *name)
 {
-    uint8_t samples[NLINES * NSAMPS]; /* line 3, sample 4 is 3 * 20 + 4 */
+    uint8_t samples[NLINES * NSAMPS]; /* the value at line 3, sample 4 is 3 * 20 + 4 */
     for (int i = 0; i < NLINES * NSAMPS; ++i) samples[i] = (uint8_t)i;
 
     const img_handle image =
         img_createfile(name, NLINES, NSAMPS, NBANDS, IMG_TYPE_VITEC, TILE, TILE, 1);
     if (image == -1) return failed("create the image");
-    const uint8_t fill = 0; /* for the parts of edge tiles that lie outside the image */
+    const uint8_t fill = 0; /* for the parts of edge tiles outside the image */
     const int result = img_dump_buffer(image, 0, 0, NLINES, NSAMPS, 0, samples, NSAMPS, &fill);
-    img_closefile(image); /* answers 0 always */
+    img_closefile(image); /* always returns 0 */
     return result == 0 ? 0 : failed("write the window");
 }
 
@@ -52,7 +54,7 @@ static int print_image(img_handle image)
            (int)nsamps, nbands, is_vitec ? "VITec" : "not VITec", (int)tile_nlines,
            (int)tile_nsamps);
 
-    uint8_t window[5 * 7]; /* two lines and three samples of it lie outside the image */
+    uint8_t window[5 * 7]; /* its last two lines and three samples are outside the image */
     const uint8_t fill = 255;
     if (img_load_buffer(image, NLINES - 3, NSAMPS - 4, 5, 7, 0, window, 7, &fill) == -1)
         return failed("read the window");
@@ -81,6 +83,6 @@ int main(int argc, char **argv)
         img_closefile(image);
         if (remove(name) != 0) result = failed("remove the image");
     }
-    img_mgr_cleanup(); /* from now on nothing can be opened */
+    img_mgr_cleanup(); /* no image can be opened after this */
     return result == 0 ? EXIT_SUCCESS : EXIT_FAILURE;
 }
