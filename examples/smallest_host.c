@@ -46,9 +46,9 @@ static int print_image(img_handle image)
     int32_t nlines, nsamps, tile_nsamps, tile_nlines;
     if (img_query_dimension(image, &nlines, &nsamps) == -1 ||
         img_query_tile_size(image, &tile_nsamps, &tile_nlines) == -1)
-        return failed("ask for the sizes");
+        return failed("get the sizes");
     const int nbands = img_query_num_bands(image);
-    if (nbands == -1) return failed("ask for the bands");
+    if (nbands == -1) return failed("get the number of bands");
     const int is_vitec = img_query_image_type(image) == IMG_TYPE_VITEC;
     printf("%d lines x %d samples, %d band, %s, tiles of %d lines x %d samples\n", (int)nlines,
            (int)nsamps, nbands, is_vitec ? "VITec" : "not VITec", (int)tile_nlines,

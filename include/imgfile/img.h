@@ -83,9 +83,9 @@ IMG_EXPORT img_handle img_openfile(const char *name, int32_t flags);
  *   If only one of the two sizes is 0, the image is untiled, but the line length or the number of
  *   lines is padded to a multiple of the other size.
  *   Helava: any number of bands, 1 byte per sample. The file does not store tile sizes; they hold
- *   until the image is closed. They do not change where samples are stored: a "tile" is the next
- *   tile width x tile height samples in file order. The last tile of a band may extend into the
- *   next band or the trailer.
+ *   until the image is closed. They do not change where samples are stored: a "tile" consists of
+ *   tile width x tile height consecutive samples of the file. The last tile of a band may extend
+ *   into the next band or the trailer.
  * The header is written at once, in big-endian byte order. A sample that was never written cannot
  * be read as long as the file ends before it. It reads as 0 once a later write or img_closefile has
  * extended the file past it.
