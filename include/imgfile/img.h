@@ -94,7 +94,7 @@ IMG_EXPORT img_handle img_openfile(const char *name, int32_t flags);
  * Fails with a message if the name is empty or null, the type does not exist or cannot be written,
  * the format cannot store the geometry, the file cannot be created, the header cannot be written,
  * 60 images are open or img_mgr_cleanup was called (both errno 24), or memory is short. The file is
- * emptied before the geometry is validated. What was written before the failure stays. */
+ * emptied before the geometry is validated. Data written before the failure stays in the file. */
 IMG_EXPORT img_handle img_createfile(const char *name, int32_t nlines, int32_t nsamps,
                                      int32_t nbands, int32_t type, int32_t tile_nsamps,
                                      int32_t tile_nlines, int32_t nbytes);
@@ -179,7 +179,8 @@ IMG_EXPORT int32_t img_load_buffer(img_handle handle, int32_t line, int32_t samp
  * sample to be written does not lie within the first 2^31 - 1 bytes of `buffer`.
  * Fails with a message if `nsamps` or `band` is out of range, memory is short, the file cannot be
  * written, or a tile that the window covers in part cannot be read back.
- * What was written before the failure stays. Stored samples outside the window are never lost. */
+ * Samples written before the failure stay in the file. Stored samples outside the window are never
+ * lost. */
 IMG_EXPORT int32_t img_dump_buffer(img_handle handle, int32_t line, int32_t samp, int32_t nlines,
                                    int32_t nsamps, int32_t band, const void *buffer, int32_t stride,
                                    const void *fill);
@@ -195,7 +196,7 @@ IMG_EXPORT int32_t img_dump_buffer(img_handle handle, int32_t line, int32_t samp
  * Fails silently if the handle is invalid, the image was opened write-only, the run extends beyond
  * the image's tiles, `band` is out of range, or `buffer` is null.
  * Fails with a message if the file cannot be read or ends before the run does. `buffer` then holds
- * what was read; the rest of it is unchanged. */
+ * the bytes that were read; the rest of it is unchanged. */
 IMG_EXPORT int32_t img_load_tiles(img_handle handle, int32_t first_tile, int32_t ntiles,
                                   int32_t band, void *buffer);
 
