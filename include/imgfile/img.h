@@ -18,9 +18,9 @@
  * other number and the handle of a closed image are invalid; each function states how it treats
  * them.
  *
- * Limits. A file ends below 2^31 bytes, and so does its last tile, stored whole. A sample has one
- * or two bytes; two-byte samples have 12 significant bits. An image that exceeds these limits
- * cannot be opened or created. An image with zero lines, samples or bands is valid and empty.
+ * Limits. A file, with all of its tiles stored whole, ends below 2^31 bytes. A sample has one or
+ * two bytes; two-byte samples have 12 significant bits. An image that exceeds these limits cannot
+ * be opened or created. An image with zero lines, samples or bands is valid and empty.
  *
  * Threads. The library is not thread-safe: only one thread at a time may call it. */
 #ifndef IMG_H
@@ -142,10 +142,11 @@ IMG_EXPORT int32_t img_query_num_bands(img_handle handle);
  *
  * A sample of `buffer` is one byte. Two-byte samples are stretched to 8 bits, each window by its
  * own histogram. The histogram counts every fourth sample of each line, except samples that equal
- * the fill or exceed 12 bits. It is cut at 0.5 and at 99 percent, and the values between the cuts
- * are spread over 0..255. The fill is stretched as well. Samples that exceed 12 bits map as 4095
- * does. Because the histogram depends on the window, two windows of one image may map the same
- * sample to different bytes. img_load_tiles reads two-byte samples unchanged.
+ * the fill or exceed 12 bits. The lowest 0.5 and the highest 1 percent of it are cut off, and the
+ * values between the cuts are spread over 0..255. The fill is stretched as well. Samples that
+ * exceed 12 bits map as 4095 does. Because the histogram depends on the window, two windows of one
+ * image may map the same sample to different bytes. img_load_tiles reads two-byte samples
+ * unchanged.
  *
  * Requires `nsamps` <= `stride`, 0 <= `band` < bands, and an image not opened write-only.
  * Returns 0.
@@ -153,10 +154,10 @@ IMG_EXPORT int32_t img_query_num_bands(img_handle handle);
  * the file cannot be read, or the file ends before the window does.
  * Fails silently if `buffer` is null, if it would hold 2^31 bytes or more, or if memory is short
  * for the working copy of a two-byte window.
- * After a failure `buffer` is unchanged if the samples have two bytes. If they have one byte, it
- * holds the lines before the failed one and the bytes that were read of that line; of a tiled image
- * it holds the rows of tiles before the failed one. If the window extends beyond the image, the
- * rest of it then holds the fill. */
+ * After a failed read of a two-byte image, `buffer` is unchanged. Of a one-byte image it holds the
+ * lines before the failed one and the bytes that were read of that line or, if the image is tiled,
+ * the rows of tiles before the failed one. If the window extends beyond the image, the rest of
+ * `buffer` then holds the fill. */
 IMG_EXPORT int32_t img_load_buffer(img_handle handle, int32_t line, int32_t samp, int32_t nlines,
                                    int32_t nsamps, int32_t band, void *buffer, int32_t stride,
                                    const uint8_t *fill);
