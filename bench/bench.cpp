@@ -1,15 +1,21 @@
-// imgfile_bench: what the library takes for everyday tasks, beside what can be had by hand.
+// imgfile_bench: how long the library takes for twelve everyday tasks, beside candidates written by
+// hand for the same task and beside other libraries. The tasks are defined below, in make_tasks.
 //
-// imgfile_bench [--small] [--dir=FOLDER] [--json=FILE] [--scaling | TASK...]
-//   TASK      T1 to T12; all of them when none is named
-//   --small   tiny images and two rounds: does everything work, and do all agree?
-//   --dir     where the images are made, 1 GB of them and half as much for peers; they are removed
-//             at the end. Without it the folder for temporary files.
-//   --json    where the medians are written to, beside the table
-//   --scaling how the costs of the library alone grow with images, windows, tiles and bands
-// Options of Google Benchmark are taken, too. Exit status 1 when candidates differ in what they
-// read or write, or when something fails.
+// imgfile_bench [--small] [--dir=FOLDER] [--json=FILE] [--list | --scaling | TASK...]
+//   TASK      T1 to T12; without a name, all
+//   --list    prints the tasks
+//   --small   tiny images and two rounds, to check that everything works and all candidates agree
+//   --dir     folder for the images: 1 GB, and half as much for other libraries. They are removed
+//   at
+//             the end. Default: the folder for temporary files
+//   --json    also writes the medians to a file
+//   --scaling how the library's times grow with images, windows, tiles and bands
+// Options of Google Benchmark are accepted, too. Exit status: 1 if candidates read or write
+// different bytes, or if anything fails; 2 for an unknown argument. Read task.h first, then
+// measure.h.
 #include "measure.h"
+
+#include "base/count.h"
 
 #include <algorithm>
 #include <benchmark/benchmark.h>
@@ -21,23 +27,57 @@
 
 namespace {
 
-// A folder that is removed with all that is in it.
-class scratch_folder {
+// Windows are placed at random, strips cover a whole image. Images have 8192 x 8192 samples of one
+// byte, or of two where it says so, and tiles 256 x 256. Two-byte samples arrive as bytes,
+// stretched.
+std::vector<task> make_tasks(const image_set &images)
+{
+    const auto anywhere = [&](std::size_t count, std::int32_t nlines, std::int32_t nsamps) {
+        return windows_anywhere(images, count, nlines, nsamps);
+    };
+    const std::int32_t side = images.side, tile = images.tile;
+    const auto area = [](std::int32_t nlines, std::int32_t nsamps) {
+        return img_count(nlines) * img_count(nsamps);
+    };
+    const std::size_t facts = 5 * sizeof(std::int32_t);  // lines, samples, tile sizes, bands
+    return {
+        {"T1", "untiled, 512 x 512", 1.4, anywhere(300, 512, 512), area(512, 512), {}},
+        {"T2", "untiled, 64 x 64", 1.7, anywhere(6000, 64, 64), area(64, 64), {}},
+        {"T3", "untiled, 64 lines", 1.15, anywhere(200, 64, side), area(64, side), {}},
+        {"T4", "tiled, 512 x 512", 1.2, anywhere(300, 512, 512), area(512, 512), {}},
+        {"T5", "tiled, 64 x 64", 1.6, anywhere(6000, 64, 64), area(64, 64), {}},
+        {"T6", "tiled two-byte, 512 x 512", 1.2, anywhere(80, 512, 512), area(512, 512), {}},
+        {"T7", "untiled two-byte, 512 x 512", 1.3, anywhere(80, 512, 512), area(512, 512), {}},
+        {"T8", "write untiled, 512 lines", 1.2, strips(images, 512), area(512, side), {}},
+        {"T9", "write tiled, 256 lines", 1.25, strips(images, tile), area(tile, side), {}},
+        {"T10", "write tiled, 200 x 200", 1.3, anywhere(300, 200, 200), area(200, 200), {}},
+        {"T11",
+         "whole tiles, runs of 32",
+         1.1,
+         tile_runs(images, 60, 32),
+         32 * area(tile, tile),
+         {}},
+        {"T12", "open, query, close", 1.6, std::vector<request>(1000), facts, {}},
+    };
+}
+
+// A folder that is removed with its content.
+class bench_folder {
 public:
-    explicit scratch_folder(const std::filesystem::path &parent)
+    explicit bench_folder(const std::filesystem::path &parent)
     {
         std::string name = parent / "imgfile_bench_XXXXXX";
         if (::mkdtemp(name.data()) == nullptr)
             throw std::runtime_error("no folder in " + parent.string());
         m_path = name;
     }
-    ~scratch_folder()
+    ~bench_folder()
     {
         std::error_code ignored;
         std::filesystem::remove_all(m_path, ignored);
     }
-    scratch_folder(const scratch_folder &) = delete;
-    scratch_folder &operator=(const scratch_folder &) = delete;
+    bench_folder(const bench_folder &) = delete;
+    bench_folder &operator=(const bench_folder &) = delete;
     const std::filesystem::path &path() const { return m_path; }
 
 private:
@@ -45,16 +85,18 @@ private:
 };
 
 struct options {
-    bool small = false, scaling = false;
+    bool list = false, small = false, scaling = false;
     std::filesystem::path folder = std::filesystem::temp_directory_path();
     std::string json = {};
     std::vector<std::string> tasks = {};
 };
 
-// Returns false for an argument that nobody knows.
+// Returns false for an unknown argument.
 bool take_argument(const std::string &argument, options &asked)
 {
-    if (argument == "--small")
+    if (argument == "--list")
+        asked.list = true;
+    else if (argument == "--small")
         asked.small = true;
     else if (argument == "--scaling")
         asked.scaling = true;
@@ -69,31 +111,36 @@ bool take_argument(const std::string &argument, options &asked)
     return true;
 }
 
-std::vector<task> tasks_with_candidates(const scene &at)
+std::vector<task> tasks_with_candidates(const image_set &images)
 {
-    make_files(at);
-    std::vector<task> tasks = make_tasks(at);
-    add_imgfile(at, tasks);
-    add_limits(at, tasks);
+    make_files(images);
+    std::vector<task> tasks = make_tasks(images);
+    add_imgfile(images, tasks);
+    add_limits(images, tasks);
 #ifdef HAVE_LIBTIFF
-    add_libtiff(at, tasks);
+    add_libtiff(images, tasks);
 #endif
 #ifdef HAVE_GDAL
-    add_gdal(at, tasks);
+    add_gdal(images, tasks);
 #endif
     return tasks;
 }
 
 int run(const options &asked)
 {
-    const scratch_folder folder(asked.folder);
-    const scene at{folder.path(), asked.small ? 256 : 8192, asked.small ? 32 : 256};
+    if (asked.list) {
+        for (const task &each : make_tasks({.folder = {}, .side = 8192, .tile = 256}))
+            std::printf("%-4s%s\n", each.name.c_str(), each.title.c_str());
+        return 0;
+    }
+    const bench_folder folder(asked.folder);
+    const image_set images{folder.path(), asked.small ? 256 : 8192, asked.small ? 32 : 256};
     medians times;
     if (asked.scaling) {
-        register_scaling(at, asked.small);
+        register_scaling(images, asked.small);
         times = measure_registered();
     } else {
-        std::vector<task> tasks = tasks_with_candidates(at);
+        std::vector<task> tasks = tasks_with_candidates(images);
         let_files_rest();
         std::erase_if(tasks, [&asked](const task &each) {
             return !asked.tasks.empty() && std::ranges::count(asked.tasks, each.name) == 0;
@@ -110,7 +157,7 @@ int run(const options &asked)
 
 int main(int argc, char **argv)
 {
-    // Rounds of all candidates in turn, so that a machine that changes its speed does so for all.
+    // All candidates take turns, so that changes of the machine's speed meet each of them.
     std::string interleaved = "--benchmark_enable_random_interleaving=true";
     std::vector<char *> arguments(argv, argv + argc);
     arguments.insert(arguments.begin() + 1, interleaved.data());
@@ -124,7 +171,7 @@ int main(int argc, char **argv)
             if (take_argument(argument, asked)) continue;
             std::fprintf(stderr,
                          "imgfile_bench: unknown argument %s\nusage: imgfile_bench [--small] "
-                         "[--dir=FOLDER] [--json=FILE] [--scaling | TASK...]\n",
+                         "[--dir=FOLDER] [--json=FILE] [--list | --scaling | TASK...]\n",
                          argument.c_str());
             return 2;
         }

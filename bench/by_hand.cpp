@@ -1,6 +1,9 @@
-// What the hardware asks: each task written by hand, with plain calls and on mappings of the files.
+// The limits: each task written by hand, once with plain system calls and once on mappings of the
+// files. Read task.h first.
 #include "stretch_by_hand.h"
 #include "task.h"
+
+#include "base/count.h"
 
 #include <algorithm>
 #include <array>
@@ -16,13 +19,13 @@ namespace {
 
 constexpr std::size_t PAGE = 4096;
 
-// A file that stays open, and mapped, as long as someone uses it.
+// An open file, mapped on request; closed with the object.
 struct file {
     int fd;
     std::uint8_t *bytes = nullptr;
     std::size_t size = 0;
 
-    // `flags` as for open(); with `new_size` the file is made that large before it is mapped.
+    // `flags` as for open(). A `new_size` other than 0 sets the file's length before it is mapped.
     file(const std::string &path, int flags, bool mapped, std::size_t new_size = 0)
         : fd(::open(path.c_str(), flags | O_CLOEXEC, 0666)), size(new_size)
     {
@@ -33,9 +36,9 @@ struct file {
             throw std::runtime_error("cannot size " + path);
         if (size == 0) size = static_cast<std::size_t>(status.st_size);
         const int rights = flags == O_RDONLY ? PROT_READ : PROT_READ | PROT_WRITE;
-        void *const place = ::mmap(nullptr, size, rights, MAP_SHARED, fd, 0);
-        if (place == MAP_FAILED) throw std::runtime_error("cannot map " + path);
-        bytes = static_cast<std::uint8_t *>(place);
+        void *const mapping = ::mmap(nullptr, size, rights, MAP_SHARED, fd, 0);
+        if (mapping == MAP_FAILED) throw std::runtime_error("cannot map " + path);
+        bytes = static_cast<std::uint8_t *>(mapping);
     }
     ~file()
     {
@@ -45,259 +48,293 @@ struct file {
     file(const file &) = delete;
     file &operator=(const file &) = delete;
 
-    void read(void *to, std::size_t count, std::size_t at) const
+    void read(void *buffer, std::size_t count, std::size_t offset) const
     {
-        if (::pread(fd, to, count, static_cast<off_t>(at)) != static_cast<ssize_t>(count))
-            throw std::runtime_error("a read fell short");
+        if (::pread(fd, buffer, count, static_cast<off_t>(offset)) != static_cast<ssize_t>(count))
+            throw std::runtime_error("a read was short");
     }
-    void write(const void *from, std::size_t count, std::size_t at) const
+    void write(const void *buffer, std::size_t count, std::size_t offset) const
     {
-        if (::pwrite(fd, from, count, static_cast<off_t>(at)) != static_cast<ssize_t>(count))
-            throw std::runtime_error("a write fell short");
+        if (::pwrite(fd, buffer, count, static_cast<off_t>(offset)) != static_cast<ssize_t>(count))
+            throw std::runtime_error("a write was short");
     }
 };
 
-// Working memory on whole pages, kept between windows.
-template <typename Sample>
-Sample *kept(std::size_t count)
+// Working memory at the start of a page, kept between windows.
+std::uint8_t *kept(std::size_t size)
 {
     struct deleter {
         void operator()(void *memory) const { ::operator delete (memory, std::align_val_t{PAGE}); }
     };
     static std::unique_ptr<void, deleter> memory;
     static std::size_t room = 0;
-    if (room < count * sizeof(Sample)) {
-        room = count * sizeof(Sample);
+    if (room < size) {
+        room = size;
         memory.reset(::operator new (room, std::align_val_t{PAGE}));
     }
-    return static_cast<Sample *>(memory.get());
+    return static_cast<std::uint8_t *>(memory.get());
 }
 
-std::size_t count_of(std::int32_t extent)
-{
-    return static_cast<std::size_t>(extent);
-}
-
-// --- Where the parts of a window lie ---
+// --- Offsets of the parts of a window ---
 
 struct geometry {
     std::size_t side, tile, width;  // of the image and of a tile, in samples; bytes per sample
 
-    std::size_t line_at(std::int32_t line, std::int32_t samp) const
+    std::size_t line_offset(std::int32_t line, std::int32_t samp) const
     {
-        return scene::data_offset + (count_of(line) * side + count_of(samp)) * width;
+        return IMG_VITEC_DATA_OFFSET + (img_count(line) * side + img_count(samp)) * width;
     }
     std::size_t tile_bytes() const { return tile * tile * width; }
-    std::size_t tile_at(std::size_t row, std::size_t col) const
+    std::size_t tile_offset(std::size_t row, std::size_t col) const
     {
-        return scene::data_offset + (row * (side / tile) + col) * tile_bytes();
+        return IMG_VITEC_DATA_OFFSET + (row * (side / tile) + col) * tile_bytes();
     }
 };
 
 // Calls `visit(row, col, in_tile, in_window, nlines, nsamps)` for each tile that a window touches:
-// the first sample in either, and how many the part has.
+// the index of the part's first sample in the tile and in the window, and the size of the part.
 template <typename Visit>
-void for_each_tile(const geometry &of, const window &at, Visit visit)
+void for_each_tile(const geometry &image, const request &window, Visit visit)
 {
-    const std::size_t top = count_of(at.line), left = count_of(at.samp);
-    const std::size_t bottom = top + count_of(at.nlines), right = left + count_of(at.nsamps);
-    for (std::size_t row = top / of.tile; row * of.tile < bottom; ++row)
-        for (std::size_t col = left / of.tile; col * of.tile < right; ++col) {
-            const std::size_t line = std::max(top, row * of.tile),
-                              samp = std::max(left, col * of.tile);
-            visit(row, col, (line - row * of.tile) * of.tile + samp - col * of.tile,
-                  (line - top) * count_of(at.nsamps) + samp - left,
-                  std::min(bottom, (row + 1) * of.tile) - line,
-                  std::min(right, (col + 1) * of.tile) - samp);
+    const std::size_t top = img_count(window.line), left = img_count(window.samp);
+    const std::size_t bottom = top + img_count(window.nlines),
+                      right = left + img_count(window.nsamps);
+    for (std::size_t row = top / image.tile; row * image.tile < bottom; ++row)
+        for (std::size_t col = left / image.tile; col * image.tile < right; ++col) {
+            const std::size_t line = std::max(top, row * image.tile),
+                              samp = std::max(left, col * image.tile);
+            visit(row, col, (line - row * image.tile) * image.tile + samp - col * image.tile,
+                  (line - top) * img_count(window.nsamps) + samp - left,
+                  std::min(bottom, (row + 1) * image.tile) - line,
+                  std::min(right, (col + 1) * image.tile) - samp);
         }
 }
 
-// Copies rows; the next ones are asked for meanwhile, since each lies on a page of its own.
-template <typename Copy>
-void for_each_row(const std::uint8_t *from, std::size_t pitch, std::size_t nrows,
-                  std::size_t length, Copy copy)
+// Calls `visit(i, row)` for each of `nrows` rows, `pitch` bytes apart. Prefetches the rows after
+// it, because each lies on a page of its own.
+template <typename Visit>
+void for_each_row(const std::uint8_t *first, std::size_t pitch, std::size_t nrows,
+                  std::size_t length, Visit visit)
 {
-    const std::size_t ahead = length < 1024 ? 8 : 4;  // more would drive each other out
+    const std::size_t ahead = length < 1024 ? 8 : 4;  // more would evict each other
     for (std::size_t i = 0; i < nrows; ++i) {
         if (i + ahead < nrows)
-            for (std::size_t at = 0; at < std::min<std::size_t>(length, 2048); at += 64)
-                __builtin_prefetch(from + (i + ahead) * pitch + at);
-        copy(i, from + i * pitch);
+            for (std::size_t k = 0; k < std::min<std::size_t>(length, 2048); k += 64)
+                __builtin_prefetch(first + (i + ahead) * pitch + k);
+        visit(i, first + i * pitch);
     }
 }
 
 // --- Reading ---
 
-void read_lines(const file &in, const geometry &of, const window &at, std::uint8_t *to)
+void read_lines(const file &in, const geometry &image, const request &window, std::uint8_t *buffer)
 {
-    const std::size_t length = count_of(at.nsamps) * of.width;
-    if (at.nsamps == static_cast<std::int32_t>(of.side))
-        return in.read(to, length * count_of(at.nlines), of.line_at(at.line, 0));
-    for (std::int32_t i = 0; i < at.nlines; ++i)
-        in.read(to + count_of(i) * length, length, of.line_at(at.line + i, at.samp));
+    const std::size_t length = img_count(window.nsamps) * image.width;
+    if (window.nsamps == static_cast<std::int32_t>(image.side))
+        return in.read(buffer, length * img_count(window.nlines),
+                       image.line_offset(window.line, 0));
+    for (std::int32_t i = 0; i < window.nlines; ++i)
+        in.read(buffer + img_count(i) * length, length,
+                image.line_offset(window.line + i, window.samp));
 }
 
-void copy_lines(const file &in, const geometry &of, const window &at, std::uint8_t *to)
+void copy_lines(const file &in, const geometry &image, const request &window, std::uint8_t *buffer)
 {
-    const std::size_t length = count_of(at.nsamps);
-    const std::uint8_t *const from = in.bytes + of.line_at(at.line, at.samp);
-    if (length == of.side) {  // in one piece the processor needs no help
-        std::memcpy(to, from, length * count_of(at.nlines));
+    const std::size_t length = img_count(window.nsamps);
+    const std::uint8_t *const first = in.bytes + image.line_offset(window.line, window.samp);
+    if (length == image.side) {  // one piece needs no prefetch
+        std::memcpy(buffer, first, length * img_count(window.nlines));
         return;
     }
-    for_each_row(from, of.side, count_of(at.nlines), length, [=](std::size_t i, const auto *row) {
-        std::memcpy(to + i * length, row, length);
-    });
+    for_each_row(
+        first, image.side, img_count(window.nlines), length,
+        [=](std::size_t i, const auto *row) { std::memcpy(buffer + i * length, row, length); });
 }
 
-void read_tiles(const file &in, const geometry &of, const window &at, std::uint8_t *to)
+void read_tiles(const file &in, const geometry &image, const request &window, std::uint8_t *buffer)
 {
-    auto *const lines = kept<std::uint8_t>(of.tile_bytes());
-    const std::size_t pitch = of.tile * of.width;
+    auto *const lines = kept(image.tile_bytes());
+    const std::size_t pitch = image.tile * image.width;
     for_each_tile(
-        of, at, [&](auto row, auto col, auto in_tile, auto in_window, auto nlines, auto nsamps) {
-            const std::size_t first = in_tile / of.tile * pitch;  // of the lines that are needed
-            in.read(lines, nlines * pitch, of.tile_at(row, col) + first);
+        image, window,
+        [&](auto row, auto col, auto in_tile, auto in_window, auto nlines, auto nsamps) {
+            const std::size_t skipped = in_tile / image.tile * pitch;  // lines above the window
+            in.read(lines, nlines * pitch, image.tile_offset(row, col) + skipped);
             for (std::size_t i = 0; i < nlines; ++i)
-                std::memcpy(to + (in_window + i * count_of(at.nsamps)) * of.width,
-                            lines + i * pitch + (in_tile % of.tile) * of.width, nsamps * of.width);
+                std::memcpy(buffer + (in_window + i * img_count(window.nsamps)) * image.width,
+                            lines + i * pitch + (in_tile % image.tile) * image.width,
+                            nsamps * image.width);
         });
 }
 
-void copy_tiles(const file &in, const geometry &of, const window &at, std::uint8_t *to)
+void copy_tiles(const file &in, const geometry &image, const request &window, std::uint8_t *buffer)
 {
-    for_each_tile(
-        of, at, [&](auto row, auto col, auto in_tile, auto in_window, auto nlines, auto nsamps) {
-            for_each_row(in.bytes + of.tile_at(row, col) + in_tile, of.tile, nlines, nsamps,
-                         [&, length = nsamps](std::size_t i, const auto *from) {
-                             std::memcpy(to + in_window + i * count_of(at.nsamps), from, length);
-                         });
-        });
+    for_each_tile(image, window,
+                  [&](auto row, auto col, auto in_tile, auto in_window, auto nlines, auto nsamps) {
+                      for_each_row(
+                          in.bytes + image.tile_offset(row, col) + in_tile, image.tile, nlines,
+                          nsamps, [&, length = nsamps](std::size_t i, const auto *line) {
+                              std::memcpy(buffer + in_window + i * img_count(window.nsamps), line,
+                                          length);
+                          });
+                  });
 }
 
-void stretch_tiles(const file &in, const geometry &of, const window &at, std::uint8_t *to)
+// A stretch goes over the samples twice: the first time it counts them, the second time, now from
+// the processor's caches, it looks them up.
+void stretch_tiles(const file &in, const geometry &image, const request &window,
+                   std::uint8_t *buffer)
 {
-    const std::size_t width = count_of(at.nsamps), size = count_of(at.nlines) * width;
-    auto *const samples = kept<std::uint16_t>(size);
+    const std::size_t width = img_count(window.nsamps), pitch = image.tile * 2;
     sample_counts &counts = new_counts();
-    for_each_tile(
-        of, at, [&](auto row, auto col, auto in_tile, auto in_window, auto nlines, auto nsamps) {
-            for_each_row(in.bytes + of.tile_at(row, col) + in_tile * 2, of.tile * 2, nlines,
-                         nsamps * 2, [&, count = nsamps](std::size_t i, const auto *from) {
-                             auto *const line = samples + in_window + i * width;
-                             exchange_by_hand(from, line, count);
-                             count_by_hand(line, in_window % width, count, counts);
-                         });
-        });
-    stretch_by_hand(samples, size, counts, to);
+    for_each_tile(image, window,
+                  [&](auto row, auto col, auto in_tile, auto in_window, auto nlines, auto nsamps) {
+                      for_each_row(in.bytes + image.tile_offset(row, col) + in_tile * 2, pitch,
+                                   nlines, nsamps * 2,
+                                   [&, count = nsamps](std::size_t /*i*/, const auto *line) {
+                                       count_by_hand(line, in_window % width, count,
+                                                     std::endian::big, counts);
+                                   });
+                  });
+    const value_table &table = stretch_table(counts);
+    for_each_tile(image, window,
+                  [&](auto row, auto col, auto in_tile, auto in_window, auto nlines, auto nsamps) {
+                      const std::uint8_t *const first =
+                          in.bytes + image.tile_offset(row, col) + in_tile * 2;
+                      for (std::size_t i = 0; i < nlines; ++i)
+                          look_up(first + i * pitch, nsamps, std::endian::big, table,
+                                  buffer + in_window + i * width);
+                  });
 }
 
-void stretch_lines(const file &in, const geometry &of, const window &at, std::uint8_t *to)
+void stretch_lines(const file &in, const geometry &image, const request &window,
+                   std::uint8_t *buffer)
 {
-    const std::size_t width = count_of(at.nsamps), size = count_of(at.nlines) * width;
-    auto *const samples = kept<std::uint16_t>(size);
+    const std::size_t width = img_count(window.nsamps), pitch = image.side * 2;
+    const std::uint8_t *const first = in.bytes + image.line_offset(window.line, window.samp);
     sample_counts &counts = new_counts();
-    for_each_row(in.bytes + of.line_at(at.line, at.samp), of.side * 2, count_of(at.nlines),
-                 width * 2, [&](std::size_t i, const auto *from) {
-                     exchange_by_hand(from, samples + i * width, width);
-                     count_by_hand(samples + i * width, 0, width, counts);
+    for_each_row(first, pitch, img_count(window.nlines), width * 2,
+                 [&](std::size_t /*i*/, const auto *line) {
+                     count_by_hand(line, 0, width, std::endian::big, counts);
                  });
-    stretch_by_hand(samples, size, counts, to);
+    const value_table &table = stretch_table(counts);
+    for (std::size_t i = 0; i < img_count(window.nlines); ++i)
+        look_up(first + i * pitch, width, std::endian::big, table, buffer + i * width);
 }
 
-// Reads the samples as they are and exchanges their bytes in place.
-template <typename Read>
-void read_and_stretch(const file &in, const geometry &of, const window &at, std::uint8_t *to,
-                      Read read)
+using transfer = void (*)(const file &in, const geometry &image, const request &asked,
+                          std::uint8_t *buffer);
+
+// Reads the samples as stored, and then stretches them.
+template <transfer read>
+void read_and_stretch(const file &in, const geometry &image, const request &window,
+                      std::uint8_t *buffer)
 {
-    const std::size_t width = count_of(at.nsamps);
-    static std::vector<std::uint16_t> samples;
-    samples.resize(count_of(at.nlines) * width);
-    auto *const bytes = reinterpret_cast<std::uint8_t *>(samples.data());
-    read(in, of, at, bytes);
+    const std::size_t width = img_count(window.nsamps), pitch = width * 2;
+    static std::vector<std::uint8_t> samples;
+    samples.resize(img_count(window.nlines) * pitch);
+    read(in, image, window, samples.data());
     sample_counts &counts = new_counts();
-    for (std::size_t i = 0; i < samples.size(); i += width) {
-        exchange_by_hand(bytes + i * 2, &samples[i], width);
-        count_by_hand(&samples[i], 0, width, counts);
-    }
-    stretch_by_hand(samples.data(), samples.size(), counts, to);
+    for (std::size_t i = 0; i < samples.size(); i += pitch)
+        count_by_hand(&samples[i], 0, width, std::endian::big, counts);
+    look_up(samples.data(), samples.size() / 2, std::endian::big, stretch_table(counts), buffer);
+}
+
+void read_tile_run(const file &in, const geometry &image, const request &run, std::uint8_t *buffer)
+{
+    in.read(buffer, img_count(run.nlines) * image.tile_bytes(),
+            image.tile_offset(0, img_count(run.line)));
+}
+
+void copy_tile_run(const file &in, const geometry &image, const request &run, std::uint8_t *buffer)
+{
+    std::memcpy(buffer, in.bytes + image.tile_offset(0, img_count(run.line)),
+                img_count(run.nlines) * image.tile_bytes());
 }
 
 // --- Writing ---
 
-// Writes a strip of whole tiles, gathered in a run: one long write makes larger pages of the file
-// than several short ones.
-void write_tile_strip(const file &out, const geometry &of, const window &at,
-                      const std::uint8_t *from)
+// Writes a strip of whole tiles with one call, which gives the file larger pages than several short
+// calls would.
+void write_tile_strip(const file &out, const geometry &image, const request &window,
+                      const std::uint8_t *buffer)
 {
-    auto *const run = kept<std::uint8_t>(of.side * of.tile);
-    for_each_tile(of, at, [&](auto, auto col, auto, auto in_window, auto nlines, auto nsamps) {
-        for (std::size_t i = 0; i < nlines; ++i)
-            std::memcpy(run + col * of.tile_bytes() + i * of.tile, from + in_window + i * of.side,
-                        nsamps);
-    });
-    out.write(run, of.side * of.tile, of.tile_at(count_of(at.line) / of.tile, 0));
+    auto *const run = kept(image.side * image.tile);
+    for_each_tile(image, window,
+                  [&](auto, auto col, auto, auto in_window, auto nlines, auto nsamps) {
+                      for (std::size_t i = 0; i < nlines; ++i)
+                          std::memcpy(run + col * image.tile_bytes() + i * image.tile,
+                                      buffer + in_window + i * image.side, nsamps);
+                  });
+    out.write(run, image.side * image.tile,
+              image.tile_offset(img_count(window.line) / image.tile, 0));
 }
 
-// Overlays those lines of tiles that a window touches.
-void overlay_tiles(const file &in_out, const geometry &of, const window &at,
-                   const std::uint8_t *from)
+// Writes the lines of tiles that a window touches; reads them first where it covers them in part.
+void overlay_tiles(const file &in_out, const geometry &image, const request &window,
+                   const std::uint8_t *buffer)
 {
-    auto *const lines = kept<std::uint8_t>(of.tile_bytes());
-    for_each_tile(of, at,
+    auto *const lines = kept(image.tile_bytes());
+    for_each_tile(image, window,
                   [&](auto row, auto col, auto in_tile, auto in_window, auto nlines, auto nsamps) {
-                      const std::size_t first = of.tile_at(row, col) + in_tile / of.tile * of.tile;
-                      if (nsamps < of.tile) in_out.read(lines, nlines * of.tile, first);
+                      const std::size_t first =
+                          image.tile_offset(row, col) + in_tile / image.tile * image.tile;
+                      if (nsamps < image.tile) in_out.read(lines, nlines * image.tile, first);
                       for (std::size_t i = 0; i < nlines; ++i)
-                          std::memcpy(lines + i * of.tile + in_tile % of.tile,
-                                      from + in_window + i * count_of(at.nsamps), nsamps);
-                      in_out.write(lines, nlines * of.tile, first);
+                          std::memcpy(lines + i * image.tile + in_tile % image.tile,
+                                      buffer + in_window + i * img_count(window.nsamps), nsamps);
+                      in_out.write(lines, nlines * image.tile, first);
                   });
 }
 
-void store_tiles(const file &out, const geometry &of, const window &at, const std::uint8_t *from)
+void store_tiles(const file &out, const geometry &image, const request &window,
+                 const std::uint8_t *buffer)
 {
-    for_each_tile(of, at,
+    for_each_tile(image, window,
                   [&](auto row, auto col, auto in_tile, auto in_window, auto nlines, auto nsamps) {
                       for (std::size_t i = 0; i < nlines; ++i)
-                          std::memcpy(out.bytes + of.tile_at(row, col) + in_tile + i * of.tile,
-                                      from + in_window + i * count_of(at.nsamps), nsamps);
+                          std::memcpy(out.bytes + image.tile_offset(row, col) + in_tile +
+                                          i * image.tile,
+                                      buffer + in_window + i * img_count(window.nsamps), nsamps);
                   });
 }
 
-void write_lines(const file &out, const geometry &of, const window &at, const std::uint8_t *from)
+void write_lines(const file &out, const geometry &image, const request &window,
+                 const std::uint8_t *buffer)
 {
-    out.write(from, of.side * count_of(at.nlines), of.line_at(at.line, 0));
+    out.write(buffer, image.side * img_count(window.nlines), image.line_offset(window.line, 0));
 }
 
-void store_lines(const file &out, const geometry &of, const window &at, const std::uint8_t *from)
+void store_lines(const file &out, const geometry &image, const request &window,
+                 const std::uint8_t *buffer)
 {
-    std::memcpy(out.bytes + of.line_at(at.line, 0), from, of.side * count_of(at.nlines));
+    std::memcpy(out.bytes + image.line_offset(window.line, 0), buffer,
+                image.side * img_count(window.nlines));
 }
 
 // --- The candidates ---
 
-using transfer = void (*)(const file &in, const geometry &of, const window &at,
-                          std::uint8_t *buffer);
-using storing = void (*)(const file &out, const geometry &of, const window &at,
+using storing = void (*)(const file &out, const geometry &image, const request &window,
                          const std::uint8_t *buffer);
 
-candidate reading(const char *name, const std::string &path, const geometry &of, transfer move)
+candidate reading(const char *name, const std::string &path, const geometry &image, transfer move)
 {
     const auto in = std::make_shared<file>(path, O_RDONLY, true);
-    return {.name = name, .is_limit = true, .move = [=](const window &at, std::uint8_t *buffer) {
-                move(*in, of, at, buffer);
-            }};
+    return {
+        .name = name, .is_limit = true, .move = [=](const request &window, std::uint8_t *buffer) {
+            move(*in, image, window, buffer);
+        }};
 }
 
-candidate creating(const char *name, const std::string &path, const geometry &of, bool mapped,
+candidate creating(const char *name, const std::string &path, const geometry &image, bool mapped,
                    storing move)
 {
     const auto out = std::make_shared<std::unique_ptr<file>>();
-    const std::size_t size = scene::data_offset + of.side * of.side;
+    const std::size_t size = IMG_VITEC_DATA_OFFSET + image.side * image.side;
     return {.name = name,
             .is_limit = true,
-            .move = [=](const window &at, std::uint8_t *buffer) { move(**out, of, at, buffer); },
+            .move = [=](const request &window,
+                        std::uint8_t *buffer) { move(**out, image, window, buffer); },
             .begin =
                 [=] {
                     std::filesystem::remove(path);
@@ -307,89 +344,90 @@ candidate creating(const char *name, const std::string &path, const geometry &of
             .written = path};
 }
 
-// The file is opened for each round, and with it the mapping made: pages that were stored through
-// it before, and not since written to the disk, would take what is not to be had for long.
-candidate changing(const char *name, const std::string &path, const std::string &from,
-                   const geometry &of, bool mapped, storing move)
+// Opens and maps the file for each round: pages that an earlier round changed through a mapping,
+// and that are still dirty, would be faster than a host can expect.
+candidate changing(const char *name, const std::string &path, const std::string &original,
+                   const geometry &image, bool mapped, storing move)
 {
-    std::filesystem::copy_file(from, path);
+    std::filesystem::copy_file(original, path);
     const auto out = std::make_shared<std::unique_ptr<file>>();
     return {.name = name,
             .is_limit = true,
-            .move = [=](const window &at, std::uint8_t *buffer) { move(**out, of, at, buffer); },
+            .move = [=](const request &window,
+                        std::uint8_t *buffer) { move(**out, image, window, buffer); },
             .begin = [=] { *out = std::make_unique<file>(path, O_RDWR, mapped); },
             .end = [=] { out->reset(); },
             .written = path};
 }
 
-// Takes the geometry out of a header.
-void store_geometry(const std::uint8_t *header, std::uint8_t *buffer)
+// Stores the image's size, tile size and number of bands in the buffer, as the library's queries
+// give them.
+void store_facts(const std::uint8_t *header, std::uint8_t *buffer)
 {
-    const auto word_at = [=](std::size_t at) {
-        std::uint32_t word;
-        std::memcpy(&word, header + at, sizeof word);
-        return static_cast<std::int32_t>(__builtin_bswap32(word));
+    const auto word = [=](std::size_t offset) {  // in the image block, which is big-endian
+        std::uint32_t value;
+        std::memcpy(&value, header + sizeof(img_vitec_file_block) + IMG_VITEC_RESERVED + offset,
+                    sizeof value);
+        return static_cast<std::int32_t>(__builtin_bswap32(value));
     };
-    const std::array geometry{word_at(152), word_at(148), word_at(156), word_at(160), word_at(168)};
-    std::memcpy(buffer, geometry.data(), sizeof geometry);
+    const std::array facts{word(IMG_VITEC_AT_NLINES), word(IMG_VITEC_AT_NSAMPS),
+                           word(IMG_VITEC_AT_TILE_NSAMPS), word(IMG_VITEC_AT_TILE_NLINES),
+                           word(IMG_VITEC_AT_NBANDS)};
+    std::memcpy(buffer, facts.data(), sizeof facts);
 }
 
 void read_header(const std::string &path, std::uint8_t *buffer)
 {
-    std::array<std::uint8_t, scene::data_offset> header;
+    std::array<std::uint8_t, IMG_VITEC_DATA_OFFSET> header;
     const file in(path, O_RDONLY, false);
     in.read(header.data(), header.size(), 0);
-    store_geometry(header.data(), buffer);
+    store_facts(header.data(), buffer);
 }
 
 }  // namespace
 
-void add_limits(const scene &at, std::vector<task> &tasks)
+void add_limits(const image_set &images, std::vector<task> &tasks)
 {
-    const geometry bytes{count_of(at.side), count_of(at.tile), 1}, words{bytes.side, bytes.tile, 2};
-    const auto add = [&tasks](std::size_t number, candidate &&each) {
-        tasks[number - 1].candidates.push_back(std::move(each));
-    };
-    for (const std::size_t number : {1U, 2U, 3U}) {
-        add(number, reading("plain", at.path("lines8.img"), bytes, read_lines));
-        add(number, reading("mapped", at.path("lines8.img"), bytes, copy_lines));
+    const geometry bytes{img_count(images.side), img_count(images.tile), 1};
+    const geometry words{bytes.side, bytes.tile, 2};
+    const std::string lines8 = images.path("lines8.img"), tiles8 = images.path("tiles8.img"),
+                      lines16 = images.path("lines16.img"), tiles16 = images.path("tiles16.img");
+    for (const char *const name : {"T1", "T2", "T3"}) {
+        add_candidate(tasks, name, reading("plain", lines8, bytes, read_lines));
+        add_candidate(tasks, name, reading("mapped", lines8, bytes, copy_lines));
     }
-    for (const std::size_t number : {4U, 5U}) {
-        add(number, reading("plain", at.path("tiles8.img"), bytes, read_tiles));
-        add(number, reading("mapped", at.path("tiles8.img"), bytes, copy_tiles));
+    for (const char *const name : {"T4", "T5"}) {
+        add_candidate(tasks, name, reading("plain", tiles8, bytes, read_tiles));
+        add_candidate(tasks, name, reading("mapped", tiles8, bytes, copy_tiles));
     }
-    add(6, reading("plain", at.path("tiles16.img"), words,
-                   [](const file &in, const geometry &of, const window &each, std::uint8_t *to) {
-                       read_and_stretch(in, of, each, to, read_tiles);
-                   }));
-    add(6, reading("mapped", at.path("tiles16.img"), words, stretch_tiles));
-    add(7, reading("plain", at.path("lines16.img"), words,
-                   [](const file &in, const geometry &of, const window &each, std::uint8_t *to) {
-                       read_and_stretch(in, of, each, to, read_lines);
-                   }));
-    add(7, reading("mapped", at.path("lines16.img"), words, stretch_lines));
-    add(8, creating("plain", at.path("plain.img"), bytes, false, write_lines));
-    add(8, creating("mapped", at.path("mapped.img"), bytes, true, store_lines));
-    add(9, creating("plain", at.path("plain.img"), bytes, false, write_tile_strip));
-    add(9, creating("mapped", at.path("mapped.img"), bytes, true, store_tiles));
-    const std::string tiles = at.path("tiles8.img");
-    add(10, changing("plain", at.path("plain_changed.img"), tiles, bytes, false, overlay_tiles));
-    add(10, changing("mapped", at.path("mapped_changed.img"), tiles, bytes, true, store_tiles));
-    add(11, reading("plain", tiles, bytes,
-                    [](const file &in, const geometry &of, const window &run, std::uint8_t *to) {
-                        in.read(to, count_of(run.nlines) * of.tile_bytes(),
-                                of.tile_at(0, count_of(run.line)));
-                    }));
-    add(11, reading("mapped", tiles, bytes,
-                    [](const file &in, const geometry &of, const window &run, std::uint8_t *to) {
-                        std::memcpy(to, in.bytes + of.tile_at(0, count_of(run.line)),
-                                    count_of(run.nlines) * of.tile_bytes());
-                    }));
-    const std::string small = at.path("small.img");
-    add(12, {.name = "plain", .is_limit = true, .move = [=](const window &, std::uint8_t *buffer) {
-                 read_header(small, buffer);
-             }});
-    add(12, {.name = "mapped", .is_limit = true, .move = [=](const window &, std::uint8_t *buffer) {
-                 store_geometry(file(small, O_RDONLY, true).bytes, buffer);
-             }});
+    add_candidate(tasks, "T6", reading("plain", tiles16, words, read_and_stretch<read_tiles>));
+    add_candidate(tasks, "T6", reading("mapped", tiles16, words, stretch_tiles));
+    add_candidate(tasks, "T7", reading("plain", lines16, words, read_and_stretch<read_lines>));
+    add_candidate(tasks, "T7", reading("mapped", lines16, words, stretch_lines));
+    const std::string plain = images.path("plain.img"), mapped = images.path("mapped.img");
+    add_candidate(tasks, "T8", creating("plain", plain, bytes, false, write_lines));
+    add_candidate(tasks, "T8", creating("mapped", mapped, bytes, true, store_lines));
+    add_candidate(tasks, "T9", creating("plain", plain, bytes, false, write_tile_strip));
+    add_candidate(tasks, "T9", creating("mapped", mapped, bytes, true, store_tiles));
+    add_candidate(
+        tasks, "T10",
+        changing("plain", images.path("plain_changed.img"), tiles8, bytes, false, overlay_tiles));
+    add_candidate(
+        tasks, "T10",
+        changing("mapped", images.path("mapped_changed.img"), tiles8, bytes, true, store_tiles));
+    add_candidate(tasks, "T11", reading("plain", tiles8, bytes, read_tile_run));
+    add_candidate(tasks, "T11", reading("mapped", tiles8, bytes, copy_tile_run));
+    const std::string small = images.path("small.img");
+    add_candidate(tasks, "T12",
+                  {.name = "plain",
+                   .is_limit = true,
+                   .move = [=](const request & /*none*/, std::uint8_t *buffer) {
+                       read_header(small, buffer);
+                   }});
+    add_candidate(tasks, "T12",
+                  {.name = "mapped",
+                   .is_limit = true,
+                   .move = [=](const request & /*none*/, std::uint8_t *buffer) {
+                       store_facts(file(small, O_RDONLY, true).bytes, buffer);
+                   }});
 }

@@ -1,4 +1,7 @@
+// Runs and compares candidates. Read measure.h first.
 #include "measure.h"
+
+#include "base/count.h"
 
 #include <algorithm>
 #include <array>
@@ -11,57 +14,58 @@
 
 namespace {
 
-// Carries out a task once. `window_done(i)` follows each window.
+// Carries out a task once. Calls `request_done(i)` after each request.
 template <typename Done>
-void carry_out(const task &of, const candidate &by, std::uint8_t *buffer, Done window_done)
+void carry_out(const task &work, const candidate &worker, std::uint8_t *buffer, Done request_done)
 {
-    for (std::size_t i = 0; i < of.windows.size(); ++i) {
-        by.move(of.windows[i], buffer);
-        window_done(i);
+    for (std::size_t i = 0; i < work.requests.size(); ++i) {
+        worker.move(work.requests[i], buffer);
+        request_done(i);
     }
 }
 
-// What a window reads, or the samples that it writes.
-std::size_t bytes_of(const task &of, const window &at)
+// Bytes that a request reads, or samples that it writes.
+std::size_t bytes_of(const task &work, const request &asked)
 {
-    return at.nlines == 0 || at.nsamps == 0
-               ? of.buffer_size
-               : static_cast<std::size_t>(at.nlines) * static_cast<std::size_t>(at.nsamps);
+    return asked.nlines == 0 || asked.nsamps == 0
+               ? work.buffer_size
+               : img_count(asked.nlines) * img_count(asked.nsamps);
 }
 
-std::vector<std::uint8_t> samples_of(const candidate &by)
+std::vector<std::uint8_t> written_samples(const candidate &worker)
 {
-    std::ifstream in(by.written, std::ios::binary);
-    in.seekg(static_cast<std::streamoff>(by.skipped));
+    std::ifstream in(worker.written, std::ios::binary);
+    in.seekg(static_cast<std::streamoff>(worker.skipped));
     std::vector<std::uint8_t> samples(std::istreambuf_iterator<char>(in), {});
-    samples.resize(std::min(samples.size(), by.samples));
+    samples.resize(std::min(samples.size(), worker.samples));
     return samples;
 }
 
-std::vector<std::uint8_t> content_to_write(const task &of)
+std::vector<std::uint8_t> content_to_write(const task &work)
 {
-    std::vector<std::uint8_t> content(of.buffer_size);
+    std::vector<std::uint8_t> content(work.buffer_size);
     for (std::size_t i = 0; i < content.size(); ++i)
         content[i] = static_cast<std::uint8_t>(i * 7 + i / 251);
     return content;
 }
 
-// All that a task delivers: what its windows read, or the samples of the file that it writes.
-std::vector<std::uint8_t> result_of(const task &of, const candidate &by)
+// The result of a task: the bytes that all requests read, or the samples of the file written.
+std::vector<std::uint8_t> result_of(const task &work, const candidate &worker)
 {
-    std::vector<std::uint8_t> buffer = content_to_write(of), all;
-    if (by.begin) by.begin();
-    carry_out(of, by, buffer.data(), [&](std::size_t i) {
-        if (by.written.empty())
+    std::vector<std::uint8_t> buffer = content_to_write(work), all;
+    if (worker.begin) worker.begin();
+    carry_out(work, worker, buffer.data(), [&](std::size_t i) {
+        if (worker.written.empty())
             all.insert(all.end(), buffer.begin(),
-                       buffer.begin() + static_cast<std::ptrdiff_t>(bytes_of(of, of.windows[i])));
+                       buffer.begin() +
+                           static_cast<std::ptrdiff_t>(bytes_of(work, work.requests[i])));
     });
-    if (by.end) by.end();
-    return by.written.empty() ? all : samples_of(by);
+    if (worker.end) worker.end();
+    return worker.written.empty() ? all : written_samples(worker);
 }
 
-// Room for the largest window, on a whole page and the same for all: where the copies of one begin
-// relative to what they copy would be its luck otherwise.
+// A buffer for the largest request, at the start of a page. All candidates share it, because the
+// speed of a copy depends on its alignment.
 std::uint8_t *shared_buffer(const std::vector<task> &tasks)
 {
     constexpr std::size_t page = 4096;
@@ -72,20 +76,20 @@ std::uint8_t *shared_buffer(const std::vector<task> &tasks)
     return room.data() + -reinterpret_cast<std::uintptr_t>(room.data()) % page;
 }
 
-void run(benchmark::State &state, const task &of, const candidate &by, std::uint8_t *buffer)
+void run(benchmark::State &state, const task &work, const candidate &worker, std::uint8_t *buffer)
 {
     using clock = std::chrono::steady_clock;
     for ([[maybe_unused]] auto _ : state) {
-        if (by.begin) by.begin();
+        if (worker.begin) worker.begin();
         const auto start = clock::now();
-        carry_out(of, by, buffer, [](std::size_t) {});
+        carry_out(work, worker, buffer, [](std::size_t) {});
         const std::chrono::duration<double> taken = clock::now() - start;
-        state.SetIterationTime(taken.count() / static_cast<double>(of.windows.size()));
-        if (by.end) by.end();
+        state.SetIterationTime(taken.count() / static_cast<double>(work.requests.size()));
+        if (worker.end) worker.end();
     }
 }
 
-// Collects the medians instead of printing every repetition.
+// Keeps the medians, and prints nothing.
 class collector : public benchmark::BenchmarkReporter {
 public:
     explicit collector(medians &times) : m_times(times) {}
@@ -103,18 +107,18 @@ private:
 
 constexpr std::array columns{"imgfile", "plain", "mapped", "libtiff", "gdal"};
 
-void print_row(const task &of, const medians &times)
+void print_row(const task &work, const medians &times)
 {
     const auto time_of = [&](const std::string &name) {
-        const auto found = times.find(of.name + "/" + name);
+        const auto found = times.find(work.name + "/" + name);
         return found != times.end() ? found->second : 0.0;
     };
     double limit = 0.0;
-    for (const candidate &each : of.candidates) {
+    for (const candidate &each : work.candidates) {
         const double time = time_of(each.name);
         if (each.is_limit && time != 0.0) limit = limit == 0.0 ? time : std::min(limit, time);
     }
-    std::printf("%-4s%-29s", of.name.c_str(), of.title.c_str());
+    std::printf("%-4s%-29s", work.name.c_str(), work.title.c_str());
     for (const char *const name : columns) {
         if (time_of(name) != 0.0)
             std::printf("%9.2f", time_of(name));
@@ -122,7 +126,7 @@ void print_row(const task &of, const medians &times)
             std::printf("%9s", "-");
     }
     if (limit != 0.0)
-        std::printf("%8.2f%8.2f\n", time_of("imgfile") / limit, of.to_reach);
+        std::printf("%8.2f%8.2f\n", time_of("imgfile") / limit, work.goal);
     else
         std::printf("\n");
 }
@@ -132,16 +136,16 @@ void print_row(const task &of, const medians &times)
 bool agree(const std::vector<task> &tasks)
 {
     bool all_agree = true;
-    for (const task &of : tasks) {
-        const auto by_hand = std::ranges::find(of.candidates, true, &candidate::is_limit);
-        const std::vector<std::uint8_t> expected = result_of(of, *by_hand);
-        for (const candidate &each : of.candidates) {
-            const std::vector<std::uint8_t> result = result_of(of, each);
+    for (const task &work : tasks) {
+        const auto by_hand = std::ranges::find(work.candidates, true, &candidate::is_limit);
+        const std::vector<std::uint8_t> expected = result_of(work, *by_hand);
+        for (const candidate &each : work.candidates) {
+            const std::vector<std::uint8_t> result = result_of(work, each);
             if (result == expected) continue;
             const auto where = std::ranges::mismatch(result, expected).in1 - result.begin();
-            std::printf("%s: %s differs from %s, from byte %td of %zu (%zu) on\n", of.name.c_str(),
-                        each.name.c_str(), by_hand->name.c_str(), where, result.size(),
-                        expected.size());
+            std::printf("%s: %s differs from %s, from byte %td of %zu (%zu) on\n",
+                        work.name.c_str(), each.name.c_str(), by_hand->name.c_str(), where,
+                        result.size(), expected.size());
             all_agree = false;
         }
     }
@@ -154,20 +158,20 @@ medians measure(const std::vector<task> &tasks, int rounds)
     std::uint8_t *const buffer = shared_buffer(tasks);
     std::printf("%-33s", "microseconds per window");
     for (const char *const name : columns) std::printf("%9s", name);
-    std::printf("%8s%8s\n", "ratio", "reach");
-    for (const task &of : tasks) {
+    std::printf("%8s%8s\n", "ratio", "goal");
+    for (const task &work : tasks) {
         benchmark::ClearRegisteredBenchmarks();
-        for (const candidate &each : of.candidates)
+        for (const candidate &each : work.candidates)
             benchmark::RegisterBenchmark(
-                (of.name + "/" + each.name).c_str(),
-                [&of, &each, buffer](benchmark::State &state) { run(state, of, each, buffer); })
+                (work.name + "/" + each.name).c_str(),
+                [&work, &each, buffer](benchmark::State &state) { run(state, work, each, buffer); })
                 ->Iterations(1)
                 ->Repetitions(rounds)
                 ->Unit(benchmark::kMicrosecond)
                 ->UseManualTime();
         collector collecting(times);
-        benchmark::RunSpecifiedBenchmarks(&collecting);  // only these take turns
-        print_row(of, times);
+        benchmark::RunSpecifiedBenchmarks(&collecting);  // candidates of one task take turns
+        print_row(work, times);
         std::fflush(stdout);
     }
     return times;

@@ -1,8 +1,9 @@
-// What a window costs while the image around it, the window itself, its tiles, the bands and the
-// images that are open become more.
+// The time of a window while the image, the window, the tiles, the bands or the number of open
+// images grow. Read task.h first.
 #include "task.h"
 
-#include "img.h"
+#include "base/count.h"
+#include "imgfile/img.h"
 
 #include <algorithm>
 #include <benchmark/benchmark.h>
@@ -13,65 +14,79 @@ namespace {
 
 struct subject {
     std::string what;
-    std::int32_t nlines, nsamps, nbands, tile;  // of the image, which is sparse
-    std::int32_t window, images;
+    std::int32_t nlines, nsamps, nbands, tile;  // of each image, which is sparse
+    std::int32_t side, nimages;                 // of the window, in samples; open images
 };
 
-// In columns, so that names sort as their numbers do.
+// A window of one of the images, whose size is that of the subject.
+struct position {
+    std::size_t image;
+    std::int32_t line, samp, band;
+};
+
+// Aligned, so that names sort by their numbers.
 std::string label(const char *what, std::int32_t number)
 {
     const std::string digits = std::to_string(number);
     return std::string(what) + std::string(5 - digits.size(), ' ') + digits;
 }
 
-std::string make_image(const scene &at, const subject &of, std::int32_t number)
+std::string make_image(const image_set &images, const subject &measured, std::int32_t number)
 {
-    const std::string path = at.path("scaling" + std::to_string(number) + ".img");
-    const img_handle image = img_createfile(path.c_str(), of.nlines, of.nsamps, of.nbands,
-                                            IMG_TYPE_VITEC, of.tile, of.tile, 1);
+    std::string path = images.path("scaling" + std::to_string(number) + ".img");
+    const img_handle image =
+        img_createfile(path.c_str(), measured.nlines, measured.nsamps, measured.nbands,
+                       IMG_TYPE_VITEC, measured.tile, measured.tile, 1);
     if (image == -1) throw std::runtime_error("cannot create " + path);
     img_closefile(image);
     return path;
 }
 
-// The time of one window, at places all over the images.
-void read_windows(benchmark::State &state, const scene &at, const subject &of)
+// Only 64 positions, so that the round before the timed part touches all pages.
+std::vector<position> positions_anywhere(const subject &measured)
 {
-    std::vector<std::string> paths;
-    for (std::int32_t i = 0; i < of.images; ++i) paths.push_back(make_image(at, of, i));
-    let_files_rest();
-    std::vector<img_handle> images;
-    for (const std::string &path : paths)
-        images.push_back(img_openfile(path.c_str(), IMG_OPEN_READ_ONLY));
-    const auto size = static_cast<std::size_t>(of.window) * static_cast<std::size_t>(of.window);
-    std::vector<std::uint8_t> room(size + 4096);
-    auto *const buffer = room.data() + -reinterpret_cast<std::uintptr_t>(room.data()) % 4096;
     std::mt19937 random(7);
-    // So few places that pages which hold nothing are asked for once, before the timed part.
-    std::vector<window> places(64);
-    for (window &place : places)
-        place = {
-            static_cast<std::int32_t>(random() % static_cast<std::uint32_t>(of.nlines - of.window)),
-            static_cast<std::int32_t>(random() % static_cast<std::uint32_t>(of.nsamps - of.window)),
-            static_cast<std::int32_t>(random() % static_cast<std::uint32_t>(of.images)),
-            static_cast<std::int32_t>(random() % static_cast<std::uint32_t>(of.nbands))};
-    const auto read = [&](const window &place) {
-        if (img_load_buffer(images[static_cast<std::size_t>(place.nlines)], place.line, place.samp,
-                            of.window, of.window, place.nsamps, buffer, of.window, nullptr) != 0)
+    const auto below = [&random](std::int32_t end) {
+        return static_cast<std::int32_t>(random() % static_cast<std::uint32_t>(end));
+    };
+    std::vector<position> all(64);
+    for (position &each : all)
+        each = {.image = img_count(below(measured.nimages)),
+                .line = below(measured.nlines - measured.side),
+                .samp = below(measured.nsamps - measured.side),
+                .band = below(measured.nbands)};
+    return all;
+}
+
+void read_windows(benchmark::State &state, const image_set &images, const subject &measured)
+{
+    std::vector<std::string> paths(img_count(measured.nimages));
+    for (std::int32_t i = 0; i < measured.nimages; ++i)
+        paths[img_count(i)] = make_image(images, measured, i);
+    let_files_rest();
+    std::vector<img_handle> handles(paths.size());
+    std::ranges::transform(paths, handles.begin(), [](const std::string &path) {
+        return img_openfile(path.c_str(), IMG_OPEN_READ_ONLY);
+    });
+    constexpr std::size_t page = 4096;
+    std::vector<std::uint8_t> room(img_count(measured.side) * img_count(measured.side) + page);
+    auto *const buffer = room.data() + -reinterpret_cast<std::uintptr_t>(room.data()) % page;
+    const std::vector<position> positions = positions_anywhere(measured);
+    const auto read = [&](const position &start) {
+        if (img_load_buffer(handles[start.image], start.line, start.samp, measured.side,
+                            measured.side, start.band, buffer, measured.side, nullptr) != 0)
             throw std::runtime_error("a window cannot be read");
     };
-    std::ranges::for_each(places, read);
+    std::ranges::for_each(positions, read);
     std::size_t next = 0;
-    for ([[maybe_unused]] auto _ : state) read(places[next++ % places.size()]);
-    for (std::size_t i = 0; i < images.size(); ++i) {
-        img_closefile(images[i]);
-        std::filesystem::remove(paths[i]);
-    }
+    for ([[maybe_unused]] auto _ : state) read(positions[next++ % positions.size()]);
+    for (const img_handle handle : handles) img_closefile(handle);
+    for (const std::string &path : paths) std::filesystem::remove(path);
 }
 
 }  // namespace
 
-void register_scaling(const scene &at, bool small)
+void register_scaling(const image_set &images, bool small)
 {
     std::vector<subject> subjects;
     for (const std::int32_t megabytes : {1, 10, 100, 1000, 1900})
@@ -86,14 +101,14 @@ void register_scaling(const scene &at, bool small)
     for (const std::int32_t nbands : {1, 2, 3})
         for (const std::int32_t tile : {0, 256})
             subjects.push_back({label("bands", nbands), 4096, 4096, nbands, tile, 256, 1});
-    for (const std::int32_t images : {1, 10, 60})
-        subjects.push_back({label("images", images), 4096, 4096, 1, 0, 256, images});
+    for (const std::int32_t nimages : {1, 10, 60})
+        subjects.push_back({label("images", nimages), 4096, 4096, 1, 0, 256, nimages});
     if (small) subjects.resize(1);
     for (const subject &each : subjects)
         benchmark::RegisterBenchmark(
             (each.what + (each.tile != 0 ? ", tiled" : "")).c_str(),
-            [at, each](benchmark::State &state) { read_windows(state, at, each); })
-            ->Iterations(each.window > 1000 ? 100 : 2000)
+            [images, each](benchmark::State &state) { read_windows(state, images, each); })
+            ->Iterations(each.side > 1000 ? 100 : 2000)
             ->Repetitions(5)
             ->Unit(benchmark::kMicrosecond)
             ->UseRealTime();

@@ -1,3 +1,4 @@
+// Histogram, table and look-up. Read stretch_by_hand.h first.
 #include "stretch_by_hand.h"
 
 #include <algorithm>
@@ -13,38 +14,6 @@
 namespace {
 
 constexpr std::size_t VALUES = 4096;
-
-// A stretch as a division: value 256 is reached `span` above `low`.
-struct line {
-    std::uint16_t low, last, span;
-    std::uint16_t scale, inverse;  // of what is above `low`, to 16 bits; 2^31 / (scale * span)
-};
-
-line line_over(std::size_t low, std::size_t span)
-{
-    std::uint32_t scale = 1;
-    while (span * scale * 2 <= 65536) scale *= 2;
-    return {.low = static_cast<std::uint16_t>(low),
-            .last = static_cast<std::uint16_t>(low + span - (span * scale == 65536 ? 1 : 0)),
-            .span = static_cast<std::uint16_t>(span),
-            .scale = static_cast<std::uint16_t>(scale),
-            .inverse = static_cast<std::uint16_t>(
-                std::min<std::size_t>((1UL << 31U) / (span * scale) + 1, 65535))};
-}
-
-// All in 16 bits, of which a register holds the most: the product with the inverse is never too
-// small and at most 1 too large, which the sign of the remainder tells.
-inline std::uint8_t value_on(const line &of, std::uint16_t sample)
-{
-    const std::uint16_t inside = std::max(std::min(sample, of.last), of.low);
-    const auto above = static_cast<std::uint16_t>(inside - of.low);
-    const auto scaled = static_cast<std::uint16_t>(above * of.scale);
-    const auto product = static_cast<std::uint16_t>(std::uint32_t{scaled} * of.inverse >> 16U);
-    const auto about = static_cast<std::uint16_t>(product >> 7U);
-    const auto remainder = static_cast<std::uint16_t>((above << 8U) - about * of.span);
-    const auto value = static_cast<std::uint16_t>(about - (remainder >> 15U));
-    return static_cast<std::uint8_t>(std::min<std::uint16_t>(value, 255));
-}
 
 struct cut {
     std::size_t low, high;
@@ -63,6 +32,23 @@ cut find_cut(const sample_counts &counts)
     return {low, high};
 }
 
+std::uint16_t sample_at(const std::uint8_t *row, std::size_t index, std::endian order)
+{
+    std::uint16_t sample;
+    std::memcpy(&sample, row + 2 * index, sizeof sample);
+    return order == std::endian::native ? sample : __builtin_bswap16(sample);
+}
+
+// Loads four samples, the first one in the highest 16 bits.
+std::uint64_t four_samples(const std::uint8_t *samples, std::endian order)
+{
+    std::uint64_t four;
+    std::memcpy(&four, samples, sizeof four);
+    if (std::endian::native == std::endian::little) four = __builtin_bswap64(four);
+    if (order == std::endian::big) return four;
+    return (four & 0x00FF00FF00FF00FFU) << 8U | (four >> 8U & 0x00FF00FF00FF00FFU);
+}
+
 }  // namespace
 
 sample_counts &new_counts()
@@ -72,20 +58,10 @@ sample_counts &new_counts()
     return counts;
 }
 
-FOR_EACH_PROCESSOR void exchange_by_hand(const std::uint8_t *from, std::uint16_t *to,
-                                         std::size_t count)
-{
-    for (std::size_t i = 0; i < count; ++i) {
-        std::uint16_t sample;
-        std::memcpy(&sample, from + 2 * i, sizeof sample);
-        to[i] = static_cast<std::uint16_t>(sample << 8U | sample >> 8U);
-    }
-}
-
-void count_by_hand(const std::uint16_t *from, std::size_t first, std::size_t count,
+void count_by_hand(const std::uint8_t *row, std::size_t first, std::size_t count, std::endian order,
                    sample_counts &counts)
 {
-    for (std::size_t i = (4 - first % 4) % 4; i < count; i += 4) ++counts[from[i]];
+    for (std::size_t i = (4 - first % 4) % 4; i < count; i += 4) ++counts[sample_at(row, i, order)];
 }
 
 FOR_EACH_PROCESSOR void fill_table(std::uint8_t *table, double low, double gain)
@@ -96,33 +72,28 @@ FOR_EACH_PROCESSOR void fill_table(std::uint8_t *table, double low, double gain)
     }
 }
 
-FOR_EACH_PROCESSOR void map_along(const line &given, const std::uint16_t *from, std::size_t count,
-                                  std::uint8_t *to)
+const value_table &stretch_table(sample_counts &counts)
 {
-    const line of = given;  // which no store can change
-    for (std::size_t i = 0; i < count; ++i) to[i] = value_on(of, from[i]);
-}
-
-void stretch_by_hand(const std::uint16_t *from, std::size_t count, sample_counts &counts,
-                     std::uint8_t *to)
-{
-    static const auto all_samples = [] {
-        std::array<std::uint16_t, VALUES> samples{};
-        std::iota(samples.begin(), samples.end(), std::uint16_t{0});
-        return samples;
-    }();
+    static value_table table{};
     counts[0] = 0;  // the fill
     const auto [low, high] = find_cut(counts);
     const double gain = high != low ? 4096.0 / static_cast<double>(high - low) : 1.0;
-    std::array<std::uint8_t, VALUES> table, divided;
     fill_table(table.data(), static_cast<double>(low), gain);
+    if (table.back() != table[VALUES - 1])
+        std::fill(table.begin() + VALUES, table.end(), table[VALUES - 1]);
+    return table;
+}
 
-    // What is divided exactly and what comes of rounded factors may differ in a few entries.
-    const line of = line_over(low, high != low ? high - low : VALUES);
-    map_along(of, all_samples.data(), VALUES, divided.data());
-    if (divided == table)
-        map_along(of, from, count, to);
-    else
-        for (std::size_t i = 0; i < count; ++i)
-            to[i] = table[std::min(from[i], all_samples.back())];
+void look_up(const std::uint8_t *samples, std::size_t count, std::endian order,
+             const value_table &table, std::uint8_t *buffer)
+{
+    std::size_t i = 0;
+    for (; i + 4 <= count; i += 4) {  // one load for four samples
+        const std::uint64_t four = four_samples(samples + 2 * i, order);
+        buffer[i] = table[four >> 48U];
+        buffer[i + 1] = table[four >> 32U & 0xFFFFU];
+        buffer[i + 2] = table[four >> 16U & 0xFFFFU];
+        buffer[i + 3] = table[four & 0xFFFFU];
+    }
+    for (; i < count; ++i) buffer[i] = table[sample_at(samples, i, order)];
 }

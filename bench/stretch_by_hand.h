@@ -1,22 +1,26 @@
-// The stretch of big-endian 12-bit samples to bytes, written for this alone.
+// The stretch of 12-bit samples to bytes, written for this one use: a histogram of every fourth
+// sample gives a table, in which each sample is looked up.
 #ifndef BENCH_STRETCH_BY_HAND_H
 #define BENCH_STRETCH_BY_HAND_H
 
 #include <array>
+#include <bit>
 #include <cstddef>
 #include <cstdint>
 
-using sample_counts = std::array<std::uint32_t, 65536>;  // those beyond 12 bits are never looked at
+using sample_counts = std::array<std::uint32_t, 65536>;  // entries above 4095 are ignored
+using value_table = std::array<std::uint8_t, 65536>;
 
-// Counts of nothing yet, kept between windows.
+// Returns counts of 0. They are kept between windows, as the table is.
 sample_counts &new_counts();
-// Exchanges the bytes of `count` samples on the way; they may stay in place.
-void exchange_by_hand(const std::uint8_t *from, std::uint16_t *to, std::size_t count);
-// Counts every fourth sample of a part of a line that begins at sample `first` of that line.
-void count_by_hand(const std::uint16_t *from, std::size_t first, std::size_t count,
+// Counts every fourth sample of a row that begins at sample `first` of its line. Samples are stored
+// in the byte order `order`.
+void count_by_hand(const std::uint8_t *row, std::size_t first, std::size_t count, std::endian order,
                    sample_counts &counts);
-// Stretches samples by what was counted.
-void stretch_by_hand(const std::uint16_t *from, std::size_t count, sample_counts &counts,
-                     std::uint8_t *to);
+// Returns the table for what was counted.
+const value_table &stretch_table(sample_counts &counts);
+// Looks up `count` samples.
+void look_up(const std::uint8_t *samples, std::size_t count, std::endian order,
+             const value_table &table, std::uint8_t *buffer);
 
 #endif

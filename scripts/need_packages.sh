@@ -1,12 +1,12 @@
 # shellcheck shell=bash
-# Sourced by the commands of this folder.
+# Functions for the commands of this folder, which source this file.
 
-# Installs those of the named Debian packages that are missing; says so when there are any.
+# Installs the missing ones of the named Debian packages, and prints their names.
 need_packages()
 {
     local missing=() package as_root=()
     command -v dpkg-query >/dev/null || {
-        echo "Not a Debian system: taking it that these are here: $*"
+        echo "Not a Debian system: assuming that these are installed: $*"
         return
     }
     for package in "$@"; do
@@ -22,7 +22,7 @@ need_packages()
         apt-get install --yes --no-install-recommends "${missing[@]}"
 }
 
-# Runs a command whose output is of interest only when it fails.
+# Runs a command and prints its output only if it fails.
 quietly()
 {
     local log status=0
