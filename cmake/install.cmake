@@ -1,10 +1,10 @@
-# The installed tree, in components that can be had one by one (cmake --install BUILD --component C):
+# The installed tree, in components (cmake --install BUILD --component NAME installs one of them):
 #   library       the shared library
 #   development   header, CMake package, pkg-config file, example, manual pages of section 3
 #   tool          the program, its completion, manual pages of sections 1 and 5
-#   licence       what a package says in a way of its own
-# The CMake package and the pkg-config file give the same include folder, so that hosts write
-# #include <img.h>; both follow the tree when it is moved.
+#   licence       LICENSE, which Debian packages replace by their own file
+# The CMake package and the pkg-config file name the same include folder, so that hosts write
+# #include <img.h>. Both still work after the tree is moved.
 include(CMakePackageConfigHelpers)
 include(GNUInstallDirs)
 
@@ -14,7 +14,7 @@ install(TARGETS imgfile
     LIBRARY COMPONENT library NAMELINK_COMPONENT development
     FILE_SET HEADERS DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/imgfile COMPONENT development)
 install(EXPORT imgfile_targets
-    FILE imgfileConfig.cmake  # nothing else to find: the targets are the package
+    FILE imgfileConfig.cmake  # the targets are the whole package: no dependencies
     NAMESPACE imgfile::
     DESTINATION ${package_dir}
     COMPONENT development)
@@ -30,7 +30,7 @@ configure_file(${PROJECT_SOURCE_DIR}/cmake/imgfile.pc.in ${PROJECT_BINARY_DIR}/i
 install(FILES ${PROJECT_BINARY_DIR}/imgfile.pc
     DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig COMPONENT development)
 
-# A page describes every function that its section NAME names; man finds it by each of them.
+# A page describes all functions in its section NAME, and man finds it by each of these names.
 file(GLOB pages CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/docs/man/*.3)
 install(FILES ${pages} DESTINATION ${CMAKE_INSTALL_MANDIR}/man3 COMPONENT development)
 set_property(DIRECTORY APPEND PROPERTY CMAKE_CONFIGURE_DEPENDS ${pages})

@@ -1,11 +1,11 @@
-# Debian packages, one per component, with `cpack` in a build tree; scripts/package does it all.
-# The trees are completed by debian/tree.cmake before they are packed, and what CPack leaves to be
-# wished for is mended by debian/finish.cmake afterwards.
+# Debian packages, one per component, made by `cpack` in a build tree; scripts/package builds and runs
+# it. debian/tree.cmake completes the trees before they are packed; debian/finish.cmake then adds what
+# CPack cannot.
 set(package_files ${PROJECT_SOURCE_DIR}/cmake/debian)
 
 set(CPACK_GENERATOR DEB)
 set(CPACK_PACKAGE_CONTACT "imgfile developers <imgfile@example.org>")
-set(CPACK_PACKAGE_DESCRIPTION_SUMMARY "")  # each description has a first line of its own
+set(CPACK_PACKAGE_DESCRIPTION_SUMMARY "")  # each package has its own first line
 set(CPACK_PACKAGING_INSTALL_PREFIX /usr)
 set(CPACK_STRIP_FILES ON)
 set(CPACK_PRE_BUILD_SCRIPTS ${package_files}/tree.cmake)
@@ -42,8 +42,8 @@ Twelve C functions open, create and query images of two raster formats,
 VITec (.img) and Helava (.d), and read and write rectangular windows and
 whole tiles of them. Two-byte samples arrive stretched to one byte.
 
-This package contains the header, what CMake and pkg-config need to find
-the library, manual pages of the functions, and an example.")
+This package contains the header, files for CMake and pkg-config, manual
+pages of the functions, and an example.")
 
 if(TARGET imgfile_tool)
     list(APPEND CPACK_COMPONENTS_ALL tool)
@@ -53,8 +53,8 @@ if(TARGET imgfile_tool)
     set(CPACK_DEBIAN_TOOL_DESCRIPTION
 "look at, check and convert VITec and Helava raster images
 One program with sub-commands for archives of two raster formats, VITec
-(.img) and Helava (.d): it tells what files hold, finds what is wrong with
-them, converts them from and to PNG, TIFF, PGM and PPM, makes previews and
+(.img) and Helava (.d). It describes files and finds errors in them,
+converts them from and to PNG, TIFF, PGM and PPM, makes previews and
 statistics, and compares images sample by sample.")
 endif()
 

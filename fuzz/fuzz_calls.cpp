@@ -1,5 +1,5 @@
-// Any calls of the exported functions, on several files, with handles that are open and that are
-// not, each held against what is known of the handles and the files.
+// Calls the exported functions in any order, on several files, with open handles and with others.
+// Compares every result with a model of the handles and the files.
 #include "checked_image.h"
 
 #include "base/image_table.h"
@@ -75,7 +75,7 @@ private:
     }
 
     fuzz_input &m_in;
-    std::vector<img_handle> m_free;  // the next one last
+    std::vector<img_handle> m_free;  // the next handle to be given out comes last
     std::map<img_handle, open_image> m_open;
 };
 

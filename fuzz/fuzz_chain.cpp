@@ -1,6 +1,7 @@
-// Links of all kinds are added to an image's chain, removed, prepared and applied, with tables of
-// all widths. Whatever a chain is made of, it stays inside the buffers, and without it the image
-// is what it was.
+// Adds links of all kinds to an image's chain, removes, prepares and applies them, with tables of
+// all widths. No chain may reach outside the buffers, and without a chain the image must be
+// unchanged.
+#include "base/count.h"
 #include "chain/chain.h"
 #include "chain/chain_apply.h"
 #include "chain/chain_links.h"
@@ -14,7 +15,7 @@
 
 namespace {
 
-// What the functions of a link do is up to the byte of the input that `arg` points to.
+// `arg` points to a byte of the input, which decides what the functions of a link do.
 std::int32_t choice_of(void *arg)
 {
     return *static_cast<std::uint8_t *>(arg);
@@ -42,11 +43,11 @@ std::int32_t process(void *arg, const std::uint8_t *in_buffer, const img_buffer_
                      std::uint8_t *out_buffer, const img_buffer_def *out_def, std::int32_t pending,
                      const std::uint16_t *lut)
 {
-    const auto width_of = [](const img_buffer_def *def) {  // what a link says is not limited
+    const auto width_of = [](const img_buffer_def *def) {  // a link may state any width
         return static_cast<std::size_t>(std::clamp(def->nbytes, 0, 4));
     };
     for (std::int32_t i = 0; i < in_def->nlines * in_def->nsamps; ++i) {
-        const std::int32_t line = i / in_def->nsamps, samp = i % in_def->nsamps;
+        const std::int64_t line = i / in_def->nsamps, samp = i % in_def->nsamps;
         std::uint32_t sample = 0;
         std::memcpy(&sample, in_buffer + (line * in_def->stride + samp) * in_def->nbytes,
                     width_of(in_def));
@@ -57,7 +58,7 @@ std::int32_t process(void *arg, const std::uint8_t *in_buffer, const img_buffer_
     return choice_of(arg) % 8 == 7 ? 1 : 0;
 }
 
-// Adds a link of some kind and width; what was in its slots goes first, as the chain asks for.
+// Adds a link of some kind and width. Removes the links in its slots first, as the chain requires.
 void add_link(fuzz_input &in, img_handle image, std::uint8_t *arg)
 {
     const auto width = [&in] { return in.below(64) == 63 ? in.number() | 32 : in.below(13) + 1; };
@@ -86,7 +87,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size
     const fuzz_run run;
     fuzz_input in({data, size});
     const std::int32_t nbytes = in.below(2) + 1;
-    bytes pixels(static_cast<std::size_t>(35 * nbytes)), loaded = pixels, buffer;
+    bytes pixels(35 * img_count(nbytes)), loaded = pixels, buffer;
     for (auto &each : pixels) each = static_cast<std::uint8_t>(in.byte());
     const img_handle image = img_createfile("file@memory", 5, 7, 1, IMG_TYPE_VITEC, 0, 0, nbytes);
     img_dump_buffer(image, 0, 0, 5, 7, 0, pixels.data(), 7, nullptr);
@@ -98,10 +99,10 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size
         if (choice == 3) img_chain_remove_link(image, in.near(10));
         if (choice == 4) img_apply_img_chain(image);
         if (choice < 5 || out_nbytes > 8) continue;
-        img_chain_release(image);  // the buffer of an earlier preparation goes
+        img_chain_release(image);  // releases the buffer of an earlier preparation
         def = {in.below(6) + 1, in.below(9) + 1,           in.near(5), in.near(7), 9,
                out_nbytes,      img_chain_out_bits(image), 0};
-        buffer.assign(static_cast<std::size_t>((def.nlines * 9 - 9 + def.nsamps) * out_nbytes), 0);
+        buffer.assign(img_count(def.nlines * 9 - 9 + def.nsamps) * img_count(out_nbytes), 0);
         if (choice < 7)
             img_load_buffer(image, def.line, def.samp, def.nlines, def.nsamps, 0, buffer.data(), 9,
                             nullptr);
@@ -114,6 +115,6 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size
     }
     img_chain_init(image);
     img_load_buffer(image, 0, 0, 5, 7, 0, loaded.data(), 7, nullptr);
-    require(loaded == pixels, "without a chain an image is what it was");
+    require(loaded == pixels, "without a chain an image is unchanged");
     return 0;
 }

@@ -1,5 +1,5 @@
-// An image is created, written, read and closed, again and again, on a disk that goes wrong in
-// between; what a call was not writing when that happened must be as it was.
+// Creates, writes, reads and closes an image again and again on a disk that fails in between. Bytes
+// that no failing call was writing must be unchanged.
 #include "checked_image.h"
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size)
@@ -9,8 +9,10 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size
     const std::string name = "file@memory";
     open_image image = checked_create(in, name, 0);
     while (!in.ended() && image.handle != -1) {
-        for (int left = in.below(8); left > 0; --left)
-            disk.faults.push_back({in.below(32), in.below(DISK_FAULTS)});
+        for (int left = in.below(8); left > 0; --left) {
+            const std::int32_t calls_before = in.below(32);
+            disk.faults.emplace_back(calls_before, in.below(DISK_FAULTS));
+        }
         for (int left = in.below(8); left > 0; --left) checked_transfer(in, image, true);
         checked_close(image, true);
         image = in.below(4) == 0 ? checked_create(in, name, 0, true)

@@ -1,4 +1,4 @@
-// An image of any geometry is created, written, read, closed, opened again and read.
+// Creates, writes, reads and closes an image of any geometry, then opens and reads it again.
 #include "checked_image.h"
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size)

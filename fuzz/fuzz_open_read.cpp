@@ -1,5 +1,5 @@
-// The input is a file: it is opened, by way of the memory disk and of the operating system, and
-// read and, where it may be, written; every answer is held against what the file says.
+// The input is a file. Opens it on the memory disk and through the operating system, reads it and,
+// where it is opened for writing, writes it. Compares every result with the model.
 #include "checked_image.h"
 #include "support/random.h"
 

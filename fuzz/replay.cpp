@@ -1,5 +1,5 @@
-// Runs a fuzz target without a fuzzer: on every seed in the folders named, and on inputs made of
-// the seeds, always the same ones.
+// Runs a fuzz target without a fuzzer: on every seed in the named folders, and on changed seeds,
+// the same in every run.
 #include "support/effort.h"
 #include "support/files.h"
 #include "support/random.h"

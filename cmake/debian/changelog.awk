@@ -1,5 +1,5 @@
-# CHANGELOG.md as a Debian changelog, in lines of at most 78 characters. Variables: source,
-# maintainer, now (seconds since 1970, the date of what is not released yet).
+# Prints CHANGELOG.md as a Debian changelog, in lines of at most 78 characters. Variables: source;
+# maintainer; now, the date of an unreleased version, in seconds since 1970.
 function print_item(    words, count, i, line) {
     count = split(item, words)
     line = "  *"

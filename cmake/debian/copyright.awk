@@ -1,5 +1,5 @@
-# LICENSE, whose first line names the licence and whose third one the owners, as a Debian copyright
-# file. Variable: name (of the project).
+# Prints LICENSE as a Debian copyright file. Line 1 of LICENSE names the licence, line 3 the owners.
+# Variable: name, that of the project.
 NR == 1 {
     print "Format: https://www.debian.org/doc/packaging-manuals/copyright-format/1.0/"
     print "Upstream-Name: " name

@@ -1,6 +1,6 @@
-# Run by cpack on the packages it made. Packs each anew with dpkg-deb, so that the same sources give
-# the same bytes if SOURCE_DATE_EPOCH is set; says how packages of several architectures live
-# together; and drops the scripts that call ldconfig, which the trigger does.
+# Run by cpack on the packages it made. Repacks each with dpkg-deb, so that builds are reproducible if
+# SOURCE_DATE_EPOCH is set; adds the field Multi-Arch; removes the maintainer scripts, because the
+# trigger calls ldconfig.
 function(run)
     execute_process(COMMAND ${ARGV} COMMAND_ERROR_IS_FATAL ANY)
 endfunction()

@@ -1,6 +1,6 @@
-# Run by cpack on the trees of all packages before they are packed: adds to each its copyright file
-# and changelog, gives the documentation the package's name, and compresses the manual pages.
-string(TIMESTAMP now "%s" UTC)  # $SOURCE_DATE_EPOCH, where it is set
+# Run by cpack on the trees of all packages before they are packed: adds the copyright file and the
+# changelog, names the folder of documents after the package, and compresses the manual pages.
+string(TIMESTAMP now "%s" UTC)  # SOURCE_DATE_EPOCH if set
 
 function(run)
     execute_process(COMMAND ${ARGV} COMMAND_ERROR_IS_FATAL ANY)

@@ -1,5 +1,5 @@
 #!/bin/sh
-# check.sh [--renew] DESCRIPTION LIBRARY HEADERS: holds the interface of LIBRARY, which has debug
+# check_abi.sh [--renew] DESCRIPTION LIBRARY HEADERS: holds the interface of LIBRARY, which has debug
 # information, against the stored description; with --renew, stores it anew. Symbols, parameter and
 # result types and constants count; that a pointer is to constant void does not.
 set -eu

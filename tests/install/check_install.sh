@@ -1,8 +1,9 @@
 #!/bin/sh
-# check.sh CMAKE GENERATOR BUILD CC [CFLAGS]: installs the build tree, moves the installed tree, and builds
-# and runs a host against it both ways: through the CMake package and through pkg-config.
+# check_install.sh CMAKE GENERATOR BUILD VERSION CC [CFLAGS]: installs the build tree and moves the
+# installed tree. Then builds and runs a host with it, once through the CMake package and once through
+# pkg-config.
 set -eu
-cmake=$1 generator=$2 build=$3 cc=$4 cflags=${5:-}
+cmake=$1 generator=$2 build=$3 version=$4 cc=$5 cflags=${6:-}
 
 here=$(cd "$(dirname "$0")" && pwd)
 scratch=$(mktemp -d)
@@ -12,6 +13,7 @@ mv "$scratch/installed" "$scratch/moved"
 cd "$scratch"
 
 "$cmake" -G "$generator" -S "$here" -B by_cmake -DCMAKE_PREFIX_PATH="$scratch/moved" \
+    -DIMGFILE_VERSION="$version" \
     -DCMAKE_C_COMPILER="$cc" -DCMAKE_C_FLAGS="$cflags"
 "$cmake" --build by_cmake
 by_cmake/consumer by_cmake.img
@@ -23,5 +25,5 @@ ask() { PKG_CONFIG_PATH="$package" pkg-config "$@" imgfile; }
     -o by_pkg_config "$here/consumer.c" $(ask --libs) -Wl,-rpath,"$(ask --variable=libdir)"
 ./by_pkg_config by_pkg_config.img
 
-[ "$(ask --modversion)" = 0.1.0 ]
+[ "$(ask --modversion)" = "$version" ]
 ls moved/share/doc/imgfile/LICENSE moved/share/doc/imgfile/README.md
