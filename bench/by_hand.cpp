@@ -91,8 +91,14 @@ struct geometry {
     }
 };
 
-// Calls `visit(row, col, in_tile, in_window, nlines, nsamps)` for each tile that a window touches:
-// the index of the part's first sample in the tile and in the window, and the size of the part.
+// The part of a window that lies in one tile.
+struct tile_part {
+    std::size_t row, col;            // of the tile
+    std::size_t in_tile, in_window;  // index of the first sample in the tile and in the window
+    std::size_t nlines, nsamps;
+};
+
+// Calls `visit` with each part of a window.
 template <typename Visit>
 void for_each_tile(const geometry &image, const request &window, Visit visit)
 {
@@ -103,10 +109,13 @@ void for_each_tile(const geometry &image, const request &window, Visit visit)
         for (std::size_t col = left / image.tile; col * image.tile < right; ++col) {
             const std::size_t line = std::max(top, row * image.tile),
                               samp = std::max(left, col * image.tile);
-            visit(row, col, (line - row * image.tile) * image.tile + samp - col * image.tile,
-                  (line - top) * img_count(window.nsamps) + samp - left,
-                  std::min(bottom, (row + 1) * image.tile) - line,
-                  std::min(right, (col + 1) * image.tile) - samp);
+            visit(tile_part{.row = row,
+                            .col = col,
+                            .in_tile =
+                                (line - row * image.tile) * image.tile + samp - col * image.tile,
+                            .in_window = (line - top) * img_count(window.nsamps) + samp - left,
+                            .nlines = std::min(bottom, (row + 1) * image.tile) - line,
+                            .nsamps = std::min(right, (col + 1) * image.tile) - samp});
         }
 }
 
@@ -155,29 +164,25 @@ void read_tiles(const file &in, const geometry &image, const request &window, st
 {
     auto *const lines = kept(image.tile_bytes());
     const std::size_t pitch = image.tile * image.width;
-    for_each_tile(
-        image, window,
-        [&](auto row, auto col, auto in_tile, auto in_window, auto nlines, auto nsamps) {
-            const std::size_t skipped = in_tile / image.tile * pitch;  // lines above the window
-            in.read(lines, nlines * pitch, image.tile_offset(row, col) + skipped);
-            for (std::size_t i = 0; i < nlines; ++i)
-                std::memcpy(buffer + (in_window + i * img_count(window.nsamps)) * image.width,
-                            lines + i * pitch + (in_tile % image.tile) * image.width,
-                            nsamps * image.width);
-        });
+    for_each_tile(image, window, [&](const tile_part &part) {
+        const std::size_t skipped = part.in_tile / image.tile * pitch;  // lines above the window
+        in.read(lines, part.nlines * pitch, image.tile_offset(part.row, part.col) + skipped);
+        for (std::size_t i = 0; i < part.nlines; ++i)
+            std::memcpy(buffer + (part.in_window + i * img_count(window.nsamps)) * image.width,
+                        lines + i * pitch + (part.in_tile % image.tile) * image.width,
+                        part.nsamps * image.width);
+    });
 }
 
 void copy_tiles(const file &in, const geometry &image, const request &window, std::uint8_t *buffer)
 {
-    for_each_tile(image, window,
-                  [&](auto row, auto col, auto in_tile, auto in_window, auto nlines, auto nsamps) {
-                      for_each_row(
-                          in.bytes + image.tile_offset(row, col) + in_tile, image.tile, nlines,
-                          nsamps, [&, length = nsamps](std::size_t i, const auto *line) {
-                              std::memcpy(buffer + in_window + i * img_count(window.nsamps), line,
-                                          length);
-                          });
-                  });
+    for_each_tile(image, window, [&](const tile_part &part) {
+        for_each_row(in.bytes + image.tile_offset(part.row, part.col) + part.in_tile, image.tile,
+                     part.nlines, part.nsamps, [&](std::size_t i, const auto *line) {
+                         std::memcpy(buffer + part.in_window + i * img_count(window.nsamps), line,
+                                     part.nsamps);
+                     });
+    });
 }
 
 // A stretch goes over the samples twice: the first time it counts them, the second time, now from
@@ -187,24 +192,21 @@ void stretch_tiles(const file &in, const geometry &image, const request &window,
 {
     const std::size_t width = img_count(window.nsamps), pitch = image.tile * 2;
     sample_counts &counts = new_counts();
-    for_each_tile(image, window,
-                  [&](auto row, auto col, auto in_tile, auto in_window, auto nlines, auto nsamps) {
-                      for_each_row(in.bytes + image.tile_offset(row, col) + in_tile * 2, pitch,
-                                   nlines, nsamps * 2,
-                                   [&, count = nsamps](std::size_t /*i*/, const auto *line) {
-                                       count_by_hand(line, in_window % width, count,
-                                                     std::endian::big, counts);
-                                   });
-                  });
+    for_each_tile(image, window, [&](const tile_part &part) {
+        for_each_row(in.bytes + image.tile_offset(part.row, part.col) + part.in_tile * 2, pitch,
+                     part.nlines, part.nsamps * 2, [&](std::size_t /*i*/, const auto *line) {
+                         count_by_hand(line, part.in_window % width, part.nsamps, std::endian::big,
+                                       counts);
+                     });
+    });
     const value_table &table = stretch_table(counts);
-    for_each_tile(image, window,
-                  [&](auto row, auto col, auto in_tile, auto in_window, auto nlines, auto nsamps) {
-                      const std::uint8_t *const first =
-                          in.bytes + image.tile_offset(row, col) + in_tile * 2;
-                      for (std::size_t i = 0; i < nlines; ++i)
-                          look_up(first + i * pitch, nsamps, std::endian::big, table,
-                                  buffer + in_window + i * width);
-                  });
+    for_each_tile(image, window, [&](const tile_part &part) {
+        const std::uint8_t *const first =
+            in.bytes + image.tile_offset(part.row, part.col) + part.in_tile * 2;
+        for (std::size_t i = 0; i < part.nlines; ++i)
+            look_up(first + i * pitch, part.nsamps, std::endian::big, table,
+                    buffer + part.in_window + i * width);
+    });
 }
 
 void stretch_lines(const file &in, const geometry &image, const request &window,
@@ -260,12 +262,11 @@ void write_tile_strip(const file &out, const geometry &image, const request &win
                       const std::uint8_t *buffer)
 {
     auto *const run = kept(image.side * image.tile);
-    for_each_tile(image, window,
-                  [&](auto, auto col, auto, auto in_window, auto nlines, auto nsamps) {
-                      for (std::size_t i = 0; i < nlines; ++i)
-                          std::memcpy(run + col * image.tile_bytes() + i * image.tile,
-                                      buffer + in_window + i * image.side, nsamps);
-                  });
+    for_each_tile(image, window, [&](const tile_part &part) {
+        for (std::size_t i = 0; i < part.nlines; ++i)
+            std::memcpy(run + part.col * image.tile_bytes() + i * image.tile,
+                        buffer + part.in_window + i * image.side, part.nsamps);
+    });
     out.write(run, image.side * image.tile,
               image.tile_offset(img_count(window.line) / image.tile, 0));
 }
@@ -275,28 +276,26 @@ void overlay_tiles(const file &in_out, const geometry &image, const request &win
                    const std::uint8_t *buffer)
 {
     auto *const lines = kept(image.tile_bytes());
-    for_each_tile(image, window,
-                  [&](auto row, auto col, auto in_tile, auto in_window, auto nlines, auto nsamps) {
-                      const std::size_t first =
-                          image.tile_offset(row, col) + in_tile / image.tile * image.tile;
-                      if (nsamps < image.tile) in_out.read(lines, nlines * image.tile, first);
-                      for (std::size_t i = 0; i < nlines; ++i)
-                          std::memcpy(lines + i * image.tile + in_tile % image.tile,
-                                      buffer + in_window + i * img_count(window.nsamps), nsamps);
-                      in_out.write(lines, nlines * image.tile, first);
-                  });
+    for_each_tile(image, window, [&](const tile_part &part) {
+        const std::size_t first =
+            image.tile_offset(part.row, part.col) + part.in_tile / image.tile * image.tile;
+        if (part.nsamps < image.tile) in_out.read(lines, part.nlines * image.tile, first);
+        for (std::size_t i = 0; i < part.nlines; ++i)
+            std::memcpy(lines + i * image.tile + part.in_tile % image.tile,
+                        buffer + part.in_window + i * img_count(window.nsamps), part.nsamps);
+        in_out.write(lines, part.nlines * image.tile, first);
+    });
 }
 
 void store_tiles(const file &out, const geometry &image, const request &window,
                  const std::uint8_t *buffer)
 {
-    for_each_tile(image, window,
-                  [&](auto row, auto col, auto in_tile, auto in_window, auto nlines, auto nsamps) {
-                      for (std::size_t i = 0; i < nlines; ++i)
-                          std::memcpy(out.bytes + image.tile_offset(row, col) + in_tile +
-                                          i * image.tile,
-                                      buffer + in_window + i * img_count(window.nsamps), nsamps);
-                  });
+    for_each_tile(image, window, [&](const tile_part &part) {
+        for (std::size_t i = 0; i < part.nlines; ++i)
+            std::memcpy(out.bytes + image.tile_offset(part.row, part.col) + part.in_tile +
+                            i * image.tile,
+                        buffer + part.in_window + i * img_count(window.nsamps), part.nsamps);
+    });
 }
 
 void write_lines(const file &out, const geometry &image, const request &window,
