@@ -35,10 +35,11 @@ std::vector<task> make_tasks(const image_set &images)
     const auto anywhere = [&](std::size_t count, std::int32_t nlines, std::int32_t nsamps) {
         return windows_anywhere(images, count, nlines, nsamps);
     };
-    const std::int32_t side = images.side, tile = images.tile;
+    const std::int32_t side = images.side, tile = images.tile, strip = STRIP_LINES;
     const auto area = [](std::int32_t nlines, std::int32_t nsamps) {
         return img_count(nlines) * img_count(nsamps);
     };
+    const std::size_t run_size = 32 * area(tile, tile);
     const std::size_t facts = 5 * sizeof(std::int32_t);  // lines, samples, tile sizes, bands
     return {
         {"T1", "untiled, 512 x 512", 1.4, anywhere(300, 512, 512), area(512, 512), {}},
@@ -48,15 +49,10 @@ std::vector<task> make_tasks(const image_set &images)
         {"T5", "tiled, 64 x 64", 1.6, anywhere(6000, 64, 64), area(64, 64), {}},
         {"T6", "tiled two-byte, 512 x 512", 1.2, anywhere(80, 512, 512), area(512, 512), {}},
         {"T7", "untiled two-byte, 512 x 512", 1.3, anywhere(80, 512, 512), area(512, 512), {}},
-        {"T8", "write untiled, 512 lines", 1.2, strips(images, 512), area(512, side), {}},
+        {"T8", "write untiled, 512 lines", 1.2, strips(images, strip), area(strip, side), {}},
         {"T9", "write tiled, 256 lines", 1.25, strips(images, tile), area(tile, side), {}},
         {"T10", "write tiled, 200 x 200", 1.3, anywhere(300, 200, 200), area(200, 200), {}},
-        {"T11",
-         "whole tiles, runs of 32",
-         1.1,
-         tile_runs(images, 60, 32),
-         32 * area(tile, tile),
-         {}},
+        {"T11", "whole tiles, runs of 32", 1.1, tile_runs(images, 60, 32), run_size, {}},
         {"T12", "open, query, close", 1.6, std::vector<request>(1000), facts, {}},
     };
 }
@@ -129,12 +125,13 @@ std::vector<task> tasks_with_candidates(const image_set &images)
 int run(const options &asked)
 {
     if (asked.list) {
-        for (const task &each : make_tasks({.folder = {}, .side = 8192, .tile = 256}))
+        for (const task &each : make_tasks({.folder = {}, .side = FULL_SIDE, .tile = FULL_TILE}))
             std::printf("%-4s%s\n", each.name.c_str(), each.title.c_str());
         return 0;
     }
     const bench_folder folder(asked.folder);
-    const image_set images{folder.path(), asked.small ? 256 : 8192, asked.small ? 32 : 256};
+    const image_set images{folder.path(), asked.small ? SMALL_SIDE : FULL_SIDE,
+                           asked.small ? SMALL_TILE : FULL_TILE};
     medians times;
     if (asked.scaling) {
         register_scaling(images, asked.small);

@@ -71,8 +71,8 @@ candidate creating(const image_set &images, bool tiled)
             .begin =
                 [=] {
                     std::filesystem::remove(path);
-                    *out =
-                        create(images, path, tiled ? images.tile : 0, std::min(images.side, 512));
+                    *out = create(images, path, tiled ? images.tile : 0,
+                                  std::min(images.side, STRIP_LINES));
                 },
             .end = [=] { out->reset(); },
             .written = path,

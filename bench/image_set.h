@@ -7,6 +7,9 @@
 #include <string>
 #include <vector>
 
+inline constexpr std::int32_t FULL_SIDE = 8192, FULL_TILE = 256;  // samples
+inline constexpr std::int32_t SMALL_SIDE = 256, SMALL_TILE = 32;  // with --small
+
 // Squares of `side` samples a side, in one folder; tiles have `tile` samples a side.
 struct image_set {
     std::filesystem::path folder;

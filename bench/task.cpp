@@ -12,7 +12,7 @@ constexpr std::uint32_t SEED = 20'061;
 
 std::size_t affordable(const image_set &images, std::size_t count)
 {
-    return images.side < 8192 ? 5 : count;
+    return images.side < FULL_SIDE ? 5 : count;
 }
 
 }  // namespace

@@ -36,6 +36,8 @@ struct task {
     std::vector<candidate> candidates;
 };
 
+inline constexpr std::int32_t STRIP_LINES = 512;  // of T8
+
 // --- Requests; fewer in a small set of images ---
 
 // `count` windows anywhere in an image, the same in every run.
