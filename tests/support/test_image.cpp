@@ -6,7 +6,7 @@
 #include "base/img_desc.h"
 #include "base/types.h"
 #include "chain/chain_links.h"
-#include "formats/words.h"
+#include "formats/header_file.h"
 #include "imgfile/img.h"
 #include "std/std.h"
 
@@ -41,14 +41,16 @@ test_geometry wanted;  // what write_header stores that img_createfile has no ar
 std::int32_t probe(img_desc *desc)
 {
     test_header header{};
-    img_header_seek(desc, 0, 0);
-    return img_header_read(desc, as_bytes(header)) == 0 && header[MAGIC] == TEST_MAGIC ? 1 : 0;
+    const img_header_file file = img_header_file_of(desc);
+    img_header_seek(file, 0, 0);
+    return img_header_read(file, as_bytes(header)) && header[MAGIC] == TEST_MAGIC ? 1 : 0;
 }
 
 std::int32_t read_header(img_desc *desc)
 {
     test_header header{};
-    if (img_header_seek(desc, 0, 0) != 0 || img_header_read(desc, as_bytes(header)) != 0) return -1;
+    const img_header_file file = img_header_file_of(desc);
+    if (img_header_seek(file, 0, 0) != 0 || !img_header_read(file, as_bytes(header))) return -1;
     desc->swap = header[SWAP];
     img_set_image_params(desc, header[NLINES], header[NSAMPS], header[TILE_NSAMPS],
                          header[TILE_NLINES], header[NBANDS], header[NBYTES], -1, header[LAYOUT], 0,
@@ -65,7 +67,7 @@ std::int32_t write_header(img_desc *desc)
     desc->layout = wanted.layout;
     desc->swap = wanted.swap;
     desc->std_file->data_offset = TEST_HEADER_LENGTH;
-    return img_header_write(desc, as_bytes(header));
+    return img_header_write(img_header_file_of(desc), as_bytes(header)) ? 0 : -1;
 }
 
 std::int32_t padded(std::int32_t extent, std::int32_t tile_extent)
