@@ -13,7 +13,7 @@
 #include "chain/chain_apply.h"
 #include "chain/chain_links.h"
 #include "chain/stretch.h"
-#include "formats/header_file.h"
+#include "formats/words.h"
 #include "imgfile/img.h"
 #include "io/io_method.h"
 #include "std/std_interleaved_lines.h"

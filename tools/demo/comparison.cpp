@@ -1,3 +1,4 @@
+// Choosing windows, and comparing their samples one by one. Read comparison.h first.
 #include "comparison.h"
 
 #include <algorithm>
@@ -9,7 +10,7 @@
 
 namespace {
 
-constexpr std::uint8_t fill = 77;  // what windows hold outside the picture
+constexpr std::uint8_t fill = 77;  // of samples outside the picture
 
 void compare(tally &seen, int expected, int found, const char *what, std::int32_t band,
              std::int32_t line, std::int32_t samp)
@@ -54,8 +55,8 @@ std::vector<std::uint8_t> load(img_handle image, const window &area, std::int32_
     return buffer;
 }
 
-// Compares a loaded window with what `expect(sample, found)` says, `sample` being the picture's or
-// the fill.
+// Compares each sample of a loaded window with `expect(sample, found)`; `sample` is the picture's,
+// or the fill.
 template <typename Expect>
 void compare_window(examined &file, const window &area, std::int32_t band,
                     const std::vector<std::uint8_t> &buffer, Expect expect)
@@ -72,7 +73,7 @@ void compare_window(examined &file, const window &area, std::int32_t band,
 
 void check_stretched(examined &file, const window &area, std::int32_t band, img_handle twin)
 {
-    constexpr int brightest = 4095, unknown = -1;  // samples beyond 12 bits look as `brightest`
+    constexpr int brightest = 4095, unknown = -1;  // also for samples beyond 12 bits
     const std::vector<std::uint8_t> buffer = load(file.image, area, band);
     std::array<int, brightest + 1> shown{};
     shown.fill(unknown);
@@ -92,7 +93,7 @@ void check_stretched(examined &file, const window &area, std::int32_t band, img_
 
 }  // namespace
 
-open_image::open_image(img_handle handle) : m_handle{handle}
+image_closer::image_closer(img_handle handle) : m_handle{handle}
 {
     if (handle == -1) throw std::runtime_error("cannot be opened or created");
 }
@@ -102,11 +103,11 @@ void check_description(examined &file, std::int32_t type, std::int32_t tile)
     std::int32_t nlines = -1, nsamps = -1, tile_nsamps = -1, tile_nlines = -1;
     if (img_query_dimension(file.image, &nlines, &nsamps) != 0 ||
         img_query_tile_size(file.image, &tile_nsamps, &tile_nlines) != 0)
-        throw std::runtime_error("its sizes cannot be asked");
+        throw std::runtime_error("its sizes cannot be queried");
     if (nlines != file.source.nlines || nsamps != file.source.nsamps || tile_nsamps != tile ||
         tile_nlines != tile || img_query_num_bands(file.image) != file.source.nbands ||
         img_query_image_type(file.image) != type)
-        throw std::runtime_error("it does not describe itself as it was made");
+        throw std::runtime_error("its description differs from how it was created");
 }
 
 void check_windows(examined &file, img_handle twin)

@@ -1,55 +1,53 @@
-// Whether an image file holds a picture, asked as a host would ask.
+// Comparing an image file with a picture through the functions that a host calls.
 #ifndef DEMO_COMPARISON_H
 #define DEMO_COMPARISON_H
 
 #include "img.h"
 #include "picture.h"
 
+#include "common/window.h"
+
 #include <cstdint>
 #include <string>
 
-// An image, closed when it goes out of scope. Takes what img_openfile and img_createfile answer,
+// An image, closed when it goes out of scope. Takes the result of img_openfile or img_createfile
 // and throws std::runtime_error for -1.
-class open_image {
+class image_closer {
 public:
-    explicit open_image(img_handle handle);
-    open_image(const open_image &) = delete;
-    open_image &operator=(const open_image &) = delete;
-    ~open_image() { img_closefile(m_handle); }
+    explicit image_closer(img_handle handle);
+    image_closer(const image_closer &) = delete;
+    image_closer &operator=(const image_closer &) = delete;
+    ~image_closer() { img_closefile(m_handle); }
     operator img_handle() const { return m_handle; }
 
 private:
     img_handle m_handle;
 };
 
-struct window {
-    std::int32_t line, samp, nlines, nsamps;
-};
-
-// What was compared of one image file.
+// The result of comparing one image file.
 struct tally {
     std::int64_t nwindows = 0, ntiles = 0, nsamples = 0, nunequal = 0;
-    std::string first_unequal;  // where; empty: nowhere
+    std::string first_unequal;  // a description; empty: all are equal
 };
 
-// An image file under examination. All that follow add to `seen`, and throw std::runtime_error
-// when the library refuses what it is asked.
+// An image file under examination. The functions below add to `seen`, and throw std::runtime_error
+// when a call of the library fails.
 struct examined {
     img_handle image;
     const picture &source;
     tally seen{};
 };
 
-// Size, bands, type and tile size; `tile` 0: untiled.
+// Checks size, bands, type and tile size; `tile` 0: untiled.
 void check_description(examined &file, std::int32_t type, std::int32_t tile);
 
-// Windows inside, across each edge and corner and outside, and such as cover the whole picture
-// together. One-byte samples are compared with the picture. Two-byte samples arrive stretched:
-// then equal samples must look equal and brighter ones no darker; and the windows must equal
-// those of `twin`, another image of the picture, unless it is -1.
+// Checks windows inside the picture, across each edge and corner, outside, and windows that
+// together cover the picture. One-byte samples are compared with the picture. Two-byte samples
+// arrive stretched: equal samples must give equal bytes, and brighter ones no darker bytes; unless
+// `twin` is -1, the windows must equal those of that image, which holds the same picture.
 void check_windows(examined &file, img_handle twin);
 
-// All tiles, whole; their parts outside the picture must be 0.
+// Checks all whole tiles; their parts outside the picture must be 0.
 void check_tiles(examined &file, std::int32_t tile);
 
 #endif

@@ -1,7 +1,10 @@
-// imgfile_demo OUTDIR [PICTURE...]: makes image files of pictures, or of a scene of its own, opens
-// them again through the library, compares them with the pictures and tells what it saw.
+// imgfile_demo OUTDIR [PICTURE...]: writes pictures, or a generated scene, as image files, opens
+// them again through the library, compares them with the pictures and prints the results. Read
+// comparison.h first.
 #include "comparison.h"
 #include "scene.h"
+
+#include "common/grouped.h"
 
 #include <algorithm>
 #include <chrono>
@@ -18,7 +21,9 @@
 namespace {
 
 constexpr std::int32_t tile = 256;
-constexpr std::int32_t strip = 100;  // lines; tiles are completed in several goes
+constexpr std::int32_t strip = 100;  // lines; a tile is completed by several strips
+constexpr std::int32_t header_length =
+    48 + 64 + 68 + 64;  // bytes before the pixels of a VITec file
 
 struct image_kind {
     const char *suffix, *tiling;
@@ -33,15 +38,7 @@ struct totals {
     std::int64_t nsamples = 0;
 };
 
-std::string grouped(std::int64_t number)  // 1234567: "1,234,567"
-{
-    std::string text = std::to_string(number);
-    for (auto at = static_cast<std::ptrdiff_t>(text.size()) - 3; at > 0; at -= 3)
-        text.insert(static_cast<std::size_t>(at), 1, ',');
-    return text;
-}
-
-// The last part of a path; of a long one its end, so that columns stay aligned.
+// The last part of a path, shortened to its end so that columns stay aligned.
 std::string shown_name(const std::string &path)
 {
     const std::string name = std::filesystem::path(path).filename();
@@ -56,15 +53,16 @@ double rate_of_strips(const picture &source, Move move)
     for (std::int32_t band = 0; band < source.nbands; ++band)
         for (std::int32_t line = 0; line < source.nlines; line += strip)
             if (move(band, line, std::min(strip, source.nlines - line)) != 0)
-                throw std::runtime_error("a strip of lines cannot be moved");
+                throw std::runtime_error("a strip of lines cannot be read or written");
     const std::chrono::duration<double> taken = std::chrono::steady_clock::now() - start;
     return static_cast<double>(source.bytes.size()) / 1e6 / std::max(taken.count(), 1e-6);
 }
 
 double write_image(const std::string &name, const picture &source, const image_kind &kind)
 {
-    const open_image image(img_createfile(name.c_str(), source.nlines, source.nsamps, source.nbands,
-                                          kind.type, kind.tile, kind.tile, source.nbytes));
+    const image_closer image(img_createfile(name.c_str(), source.nlines, source.nsamps,
+                                            source.nbands, kind.type, kind.tile, kind.tile,
+                                            source.nbytes));
     const std::uint16_t fill = 0;
     return rate_of_strips(source, [&](std::int32_t band, std::int32_t line, std::int32_t nlines) {
         return img_dump_buffer(image, line, 0, nlines, source.nsamps, band,
@@ -82,20 +80,20 @@ double read_image(img_handle image, const picture &source)
     });
 }
 
-// One image file: written, closed, opened again, examined, told of in one line. `twin` names
+// Writes an image file, closes it, opens it again, examines it and prints one line. `twin` names
 // another file of the picture, or is empty.
 void make_and_examine(const std::string &name, const picture &source, const image_kind &kind,
                       const std::string &twin, totals &all)
 try {
     const double write_rate = write_image(name, source, kind);
-    const open_image image(img_openfile(name.c_str(), IMG_OPEN_READ_ONLY));
+    const image_closer image(img_openfile(name.c_str(), IMG_OPEN_READ_ONLY));
     examined file{image, source};
     check_description(file, kind.type, kind.tile);
     const double read_rate = read_image(image, source);
     if (twin.empty()) {
         check_windows(file, -1);
     } else {
-        const open_image other(img_openfile(twin.c_str(), IMG_OPEN_READ_ONLY));
+        const image_closer other(img_openfile(twin.c_str(), IMG_OPEN_READ_ONLY));
         check_windows(file, other);
     }
     if (kind.tile != 0) check_tiles(file, kind.tile);
@@ -122,12 +120,13 @@ void describe(const std::string &name, const picture &source)
                 source.nlines, source.nsamps, source.nbands, source.nbands == 1 ? "" : "s",
                 source.nbytes, source.nbytes == 1 ? "" : "s");
     if (source.nbytes == 2) {
-        std::int64_t beyond = 0;  // the bands are counted as lines: they lie one after the other
+        std::int64_t beyond =
+            0;  // bands are stored one after another, so their lines are counted on
         for (std::int32_t line = 0; line < source.nlines * source.nbands; ++line)
             for (std::int32_t samp = 0; samp < source.nsamps; ++samp)
                 beyond += source.sample(0, line, samp) > 4095 ? 1 : 0;
         std::printf("  %s samples lie beyond 12 bits%s\n", grouped(beyond).c_str(),
-                    beyond == 0 ? "" : "; windows show them as 4095, tiles hold them");
+                    beyond == 0 ? "" : "; windows show them as 4095, tiles keep them");
     }
     std::printf("  %-31s %7s  %-9s %8s %6s %12s %7s %6s\n", "file", "MB", "tiling", "windows",
                 "tiles", "compared", "write", "read");
@@ -138,7 +137,7 @@ void demonstrate(const std::string &name, const std::string &stem, totals &all)
     const picture source = read_pnm(name);
     const auto padded = [](std::int64_t size) { return (size + tile - 1) / tile * tile; };
     if (padded(source.nlines) * padded(source.nsamps) >
-        (INT32_MAX - 244) / (source.nbands * source.nbytes))
+        (INT32_MAX - header_length) / (source.nbands * source.nbytes))
         throw std::runtime_error("too large for an image file, which ends below 2 GiB");
 
     describe(name, source);
@@ -148,8 +147,8 @@ void demonstrate(const std::string &name, const std::string &stem, totals &all)
     if (source.nbytes == 1) make_and_examine(stem + helava.suffix, source, helava, "", all);
 }
 
-// OUTDIR and the picture's name without its folder and suffix, the like of no other; an "@" would
-// end the file name.
+// Returns OUTDIR and the picture's name without folder and suffix, made unique. An "@" is replaced,
+// since it would end the file name.
 std::string choose_stem(const std::string &outdir, const std::string &name)
 {
     static std::set<std::string> taken;
@@ -171,7 +170,7 @@ std::vector<std::string> write_scene(const std::string &outdir)
 int run(const std::string &outdir, std::vector<std::string> names)
 {
     if (outdir.find('@') != std::string::npos)
-        throw std::runtime_error(outdir + ": an image's name cannot hold an \"@\"");
+        throw std::runtime_error(outdir + ": the name of an image cannot contain \"@\"");
     std::error_code error;
     std::filesystem::create_directories(outdir, error);
     if (error) throw std::runtime_error(outdir + ": " + error.message());
@@ -191,7 +190,7 @@ int run(const std::string &outdir, std::vector<std::string> names)
         try {
             demonstrate(name, choose_stem(outdir, name), all);
         } catch (const std::bad_alloc &) {
-            refuse("too large for the memory");
+            refuse("too large for memory");
         } catch (const std::exception &problem) {
             refuse(problem.what());
         }

@@ -1,3 +1,4 @@
+// Hashes of cell positions, and gradient noise between them. Read noise.h first.
 #include "noise.h"
 
 #include <algorithm>
@@ -13,8 +14,10 @@ double hash_noise(int line, int samp, unsigned seed)
     return static_cast<double>(h ^ h >> 15) / 4294967296.0;
 }
 
-// Each corner of a cell slopes its own way.
-static double gradient_noise(double line, double samp, unsigned seed)
+namespace {
+
+// Each corner of a cell has a slope of its own.
+double gradient_noise(double line, double samp, unsigned seed)
 {
     const int l0 = static_cast<int>(std::floor(line)), s0 = static_cast<int>(std::floor(samp));
     const double dl = line - l0, ds = samp - s0;
@@ -27,6 +30,8 @@ static double gradient_noise(double line, double samp, unsigned seed)
                            std::lerp(corner(1, 0), corner(1, 1), ease(ds)), ease(dl));
 }
 
+}  // namespace
+
 double fractal_noise(double line, double samp, int noctaves, unsigned seed)
 {
     double sum = 0, strength = 0.5;
@@ -35,8 +40,8 @@ double fractal_noise(double line, double samp, int noctaves, unsigned seed)
     return sum;
 }
 
-double smooth_step(double from, double to, double value)
+double smooth_step(double low, double high, double value)
 {
-    const double t = std::clamp((value - from) / (to - from), 0.0, 1.0);
+    const double t = std::clamp((value - low) / (high - low), 0.0, 1.0);
     return t * t * (3 - 2 * t);
 }

@@ -1,15 +1,15 @@
-// Randomness that is the same on every run.
+// Pseudo-random numbers that are the same in every run.
 #ifndef DEMO_NOISE_H
 #define DEMO_NOISE_H
 
-// One number per cell, 0..1; other ones for each `seed`, as below.
+// Returns a number from 0 to 1 for each cell; each `seed` gives other numbers, here and below.
 double hash_noise(int line, int samp, unsigned seed);
 
-// Hills and hollows, one per unit, and octaves of them, each half as large and as strong as the
-// one before; about -1..1.
+// Returns smooth noise of about -1 to 1: the sum of octaves, the first with one hill per unit, each
+// of half the size and strength of the one before.
 double fractal_noise(double line, double samp, int noctaves, unsigned seed);
 
-// 0 up to `from`, 1 from `to` on, and an easy slope between.
-double smooth_step(double from, double to, double value);
+// Returns 0 up to `low`, 1 from `high` on, and a smooth slope in between.
+double smooth_step(double low, double high, double value);
 
 #endif

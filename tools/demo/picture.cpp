@@ -1,63 +1,46 @@
+// Pictures in memory, and their files: read with the reader that the tool uses, too. Read picture.h
+// and common/pnm_file.h first.
 #include "picture.h"
 
-#include <array>
-#include <cstdio>
+#include "common/pnm_file.h"
+
 #include <cstring>
 #include <filesystem>
 #include <fstream>
-#include <limits>
 #include <stdexcept>
 #include <system_error>
 
+#include <fcntl.h>
+#include <unistd.h>
+
 namespace {
 
-// The next number of a header, after blanks and comments; -1: there is none, or it is not below
-// 2^31.
-std::int64_t read_number(std::istream &file)
-{
-    int next = file.get();
-    while (next == '#' || next == ' ' || (next >= '\t' && next <= '\r')) {
-        if (next == '#')
-            while (next != '\n' && next != '\r' && next != EOF) next = file.get();
-        else
-            next = file.get();
+// Closes its file when it goes out of scope.
+class open_file {
+public:
+    explicit open_file(const std::string &name) : m_fd(::open(name.c_str(), O_RDONLY | O_CLOEXEC))
+    {
+        if (m_fd == -1) throw std::runtime_error("cannot be opened");
     }
-    std::int64_t number = next >= '0' && next <= '9' ? 0 : -1;
-    for (; next >= '0' && next <= '9'; next = file.get()) {
-        number = number * 10 + (next - '0');
-        if (number > std::numeric_limits<std::int32_t>::max()) return -1;
-    }
-    if (next != EOF) file.unget();
-    return number;
-}
+    ~open_file() { ::close(m_fd); }
+    open_file(const open_file &) = delete;
+    open_file &operator=(const open_file &) = delete;
+    int fd() const { return m_fd; }
 
-// Reads the header of a file of `length` bytes, up to its first sample.
-picture read_header(std::istream &file, std::uintmax_t length)
+private:
+    int m_fd;
+};
+
+// Stores a line of pixels, as the file holds them, in the bands of the picture.
+void store_line(picture &image, std::int32_t line, const std::vector<std::uint8_t> &pixels)
 {
-    std::array<char, 2> magic{};
-    file.read(magic.data(), magic.size());
-    if (magic[0] != 'P' || (magic[1] != '5' && magic[1] != '6'))
-        throw std::runtime_error("not a binary PGM or PPM picture");
-    const std::int32_t nbands = magic[1] == '6' ? 3 : 1;
-
-    const std::int64_t nsamps = read_number(file), nlines = read_number(file);
-    const std::int64_t maxval = read_number(file);
-    const int blank = file.get();
-    if (nsamps < 1 || nlines < 1)
-        throw std::runtime_error("no usable width and height in its header");
-    if (maxval < 1 || maxval > 65535)
-        throw std::runtime_error("the highest value in its header is not in 1..65535");
-    if (blank != ' ' && (blank < '\t' || blank > '\r'))
-        throw std::runtime_error("no blank after its header");
-
-    // What the file must hold is held against its length before any memory is taken for it.
-    const std::int64_t pixel = std::int64_t{nbands} * (maxval > 255 ? 2 : 1);
-    const auto expected = static_cast<std::uintmax_t>(nlines * nsamps);
-    const std::uintmax_t left = length - static_cast<std::uintmax_t>(file.tellg());
-    if (expected > left / static_cast<std::uintmax_t>(pixel))
-        throw std::runtime_error("cut short: its header announces more samples than it holds");
-    return {static_cast<std::int32_t>(nlines), static_cast<std::int32_t>(nsamps), nbands,
-            static_cast<std::int32_t>(maxval)};
+    auto next = pixels.begin();
+    for (std::int32_t samp = 0; samp < image.nsamps; ++samp)
+        for (std::int32_t band = 0; band < image.nbands; ++band) {
+            int value = *next++;
+            if (image.nbytes == 2) value = value << 8 | *next++;  // the high byte comes first
+            image.set_sample(band, line, samp, value);
+        }
 }
 
 }  // namespace
@@ -70,22 +53,22 @@ picture::picture(std::int32_t lines, std::int32_t samps, std::int32_t bands, std
 
 int picture::sample(std::int32_t band, std::int32_t line, std::int32_t samp) const
 {
-    const std::uint8_t *at = &bytes[offset(band, line, samp)];
-    if (nbytes == 1) return *at;
+    const std::uint8_t *const first = &bytes[offset(band, line, samp)];
+    if (nbytes == 1) return *first;
     std::uint16_t value;
-    std::memcpy(&value, at, sizeof value);
+    std::memcpy(&value, first, sizeof value);
     return value;
 }
 
 void picture::set_sample(std::int32_t band, std::int32_t line, std::int32_t samp, int value)
 {
-    std::uint8_t *at = &bytes[offset(band, line, samp)];
+    std::uint8_t *const first = &bytes[offset(band, line, samp)];
     if (nbytes == 1) {
-        *at = static_cast<std::uint8_t>(value);
+        *first = static_cast<std::uint8_t>(value);
         return;
     }
     const auto wide = static_cast<std::uint16_t>(value);
-    std::memcpy(at, &wide, sizeof wide);
+    std::memcpy(first, &wide, sizeof wide);
 }
 
 picture read_pnm(const std::string &name)
@@ -95,25 +78,19 @@ picture read_pnm(const std::string &name)
     if (status.type() == std::filesystem::file_type::not_found)
         throw std::runtime_error("no such file");
     if (!std::filesystem::is_regular_file(status)) throw std::runtime_error("not a regular file");
-    const std::uintmax_t length = std::filesystem::file_size(name, error);
-    std::ifstream file(name, std::ios::binary);
-    if (error || !file) throw std::runtime_error("cannot be opened");
+    const open_file file(name);
+    const pnm_file pnm(file.fd());
+    const pnm_header &header = pnm.header();
+    // The length is checked before memory is allocated for the samples.
+    const std::int64_t length = header.file_length();
+    if (length == -1 || length > ::lseek(file.fd(), 0, SEEK_END))
+        throw std::runtime_error("truncated: its header states more samples than it holds");
 
-    picture image = read_header(file, length);
-    const std::int32_t width = image.nbands * image.nbytes;  // bytes of a pixel
-    std::vector<char> row(static_cast<std::size_t>(image.nsamps) * static_cast<std::size_t>(width));
+    picture image{header.nlines, header.nsamps, header.nbands, header.highest};
+    std::vector<std::uint8_t> pixels(static_cast<std::size_t>(header.line_length()));
     for (std::int32_t line = 0; line < image.nlines; ++line) {
-        if (!file.read(row.data(), static_cast<std::streamsize>(row.size())))
-            throw std::runtime_error("cannot be read to its end");
-        std::size_t from = 0;
-        const auto byte = [&] { return static_cast<unsigned char>(row[from++]); };
-        for (std::int32_t samp = 0; samp < image.nsamps; ++samp) {
-            for (std::int32_t band = 0; band < image.nbands; ++band) {
-                int value = byte();
-                if (image.nbytes == 2) value = value << 8 | byte();  // the high byte comes first
-                image.set_sample(band, line, samp, value);
-            }
-        }
+        pnm.read(line, 0, pixels);
+        store_line(image, line, pixels);
     }
     return image;
 }

@@ -28,7 +28,7 @@ struct picture {
     std::vector<std::uint8_t> bytes;
 };
 
-// Throws std::runtime_error, which says what is wrong with the file.
+// Throws std::runtime_error, whose text says what is wrong with the file.
 picture read_pnm(const std::string &name);
 
 // Throws std::runtime_error, which names the file.

@@ -1,4 +1,4 @@
-// A made-up landscape as two sensors on a satellite would see it.
+// A generated landscape as seen by two sensors of a satellite.
 #ifndef DEMO_SCENE_H
 #define DEMO_SCENE_H
 
@@ -6,7 +6,7 @@
 
 struct scene {
     picture rgb;     // 8 bits in three bands
-    picture gray12;  // 12 bits of near infrared in a frame that stands askew; 0 outside it
+    picture gray12;  // 12 bits, near infrared, in a rotated frame; 0 outside the frame
 };
 
 scene make_scene();

@@ -1,4 +1,4 @@
-// A made-up landscape: heights worn down by running water, a lake, and the rivers that feed it.
+// A generated landscape: heights eroded by water, a lake, and the rivers that feed it.
 #ifndef DEMO_TERRAIN_H
 #define DEMO_TERRAIN_H
 
@@ -19,7 +19,7 @@ struct field {
     }
     double &at(int line, int samp) { return values[index(line, samp)]; }
     double at(int line, int samp) const { return values[index(line, samp)]; }
-    double between(double line, double samp) const;  // smooth; the border goes on outside
+    double between(double line, double samp) const;  // interpolated; outside, that of the border
 
     int nlines, nsamps;
     std::vector<double> values;
@@ -28,7 +28,7 @@ struct field {
 struct terrain {
     field height;  // above the lake, in samples; below 0: the lake's floor
     field river;   // 0: dry .. 1: covered by a river
-    field shore;   // samples to the lake, about
+    field shore;   // approximate distance from the lake, in samples
 };
 
 terrain make_terrain(int nlines, int nsamps);

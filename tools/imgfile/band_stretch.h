@@ -1,24 +1,26 @@
-// How often each value occurs, and the stretch to bytes that follows from it.
+// The stretch of a band's samples to bytes.
 #ifndef TOOL_BAND_STRETCH_H
 #define TOOL_BAND_STRETCH_H
 
-#include "image.h"
+#include "codecs/image.h"
 
 #include <cstdint>
 #include <vector>
 
-// How the values of one band are stretched to bytes, as the library does it with a window: the
-// lowest half and the highest one of a hundred samples are cut off, 0 is not counted.
-class stretch {
+// Maps the values of one band to bytes, as the library does for a window. Zeros are not counted;
+// the lowest 0.5 % and the highest 1 % of the other samples are clipped.
+class band_stretch {
 public:
-    explicit stretch(std::int32_t nbits);
-    // The highest 8 bits as they are, without a cut.
-    static stretch straight(std::int32_t nbits);
-    // Counts every fourth sample of each line; `first` is the place of the samples in their line.
-    void count(const block &samples, std::int32_t band, std::int32_t first);
-    void finish();  // after the last sample was counted
+    explicit band_stretch(std::int32_t nbits);
+    // A mapping to the highest 8 bits, without clipping.
+    static band_stretch straight(std::int32_t nbits);
+    // Counts every fourth sample of each line; the samples of the block begin at sample
+    // `first_samp` of their lines.
+    void count(const block &samples, std::int32_t band, std::int32_t first_samp);
+    // Computes the mapping, after the last sample was counted.
+    void finish();
 
-    // Of a value; those that are more than the bits allow map as the highest.
+    // Returns the byte of a value. Values beyond the stated bits map as the highest value.
     std::uint8_t operator()(std::uint32_t value) const
     {
         return m_table[value < m_table.size() ? value : m_table.size() - 1];
@@ -31,14 +33,14 @@ private:
     std::vector<std::uint8_t> m_table;
 };
 
-// Stretches all of a block to one byte per sample; one stretch for each of its bands.
-block stretched(const block &from, const std::vector<stretch> &by);
+// Returns the samples of a block stretched to one byte, with one stretch for each band.
+block stretched(const block &samples, const std::vector<band_stretch> &stretches);
 
-// Measures the stretches of a window.
-std::vector<stretch> measure_stretches(image_reader &from, const window &part,
-                                       const band_list &bands);
+// Reads a window and returns the stretch of each of its bands.
+std::vector<band_stretch> measure_stretches(image_reader &reader, const window &part,
+                                            const band_list &bands);
 
-// Counts the samples that are more than `highest`.
+// Counts the samples above `highest`.
 std::int64_t count_beyond(const block &samples, std::int32_t highest);
 
 #endif

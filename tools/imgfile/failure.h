@@ -1,35 +1,31 @@
-// What goes wrong, in the words of the people whose files these are.
+// Failures of the tool: one line each, which names the file and says what is wrong.
 #ifndef TOOL_FAILURE_H
 #define TOOL_FAILURE_H
 
-#include <algorithm>
-#include <cstring>
 #include <sstream>
 #include <stdexcept>
 #include <string>
 
-// A name as it can be part of a line.
-inline std::string in_one_line(std::string name)
-{
-    std::ranges::replace_if(
-        name, [](unsigned char c) { return c < ' ' || c == 0x7f; }, '?');
-    return name;
-}
+// A name as part of a line: control characters become "?".
+std::string in_one_line(std::string name);
 
-// The work on a file failed. what() is one line, "FILE: what is wrong with it".
+// The system's text for an error number.
+std::string system_text(int error);
+
+// The work on a file failed. what() is one line: "FILE: what is wrong".
 class failure : public std::runtime_error {
 public:
-    failure(const std::string &file, const std::string &what)
-        : std::runtime_error(in_one_line(file + ": " + what))
-    {
-    }
+    failure(const std::string &file, const std::string &reason);
 };
 
-// The command line asks for something that cannot be meant.
+// The command line makes no sense.
 class wrong_usage : public std::runtime_error {
 public:
     using std::runtime_error::runtime_error;
 };
+
+// Prints a failure to standard error, after all that was printed before it.
+void print_failure(const std::string &line);
 
 // Joins numbers and texts: text("line ", 7).
 template <typename... Parts>
@@ -38,11 +34,6 @@ std::string text(const Parts &...parts)
     std::ostringstream out;
     (out << ... << parts);
     return out.str();
-}
-
-inline std::string system_text(int error)
-{
-    return std::strerror(error);
 }
 
 #endif

@@ -1,10 +1,15 @@
+// Counting samples, and what follows from the counts. Read histogram.h first.
 #include "histogram.h"
 
 #include "walk.h"
 
+#include "common/grouped.h"
+
 #include <algorithm>
 #include <cmath>
 #include <cstdio>
+#include <numeric>
+#include <string>
 
 std::uint64_t band_histogram::total() const
 {
@@ -37,10 +42,15 @@ double band_histogram::deviation() const
     const double middle = mean();
     double sum = 0;
     for (std::size_t value = 0; value < counts.size(); ++value) {
-        const double off = static_cast<double>(value) - middle;
-        sum += off * off * static_cast<double>(counts[value]);
+        const double distance = static_cast<double>(value) - middle;
+        sum += distance * distance * static_cast<double>(counts[value]);
     }
     return std::sqrt(sum / static_cast<double>(total()));
+}
+
+double band_histogram::share_of_zero() const
+{
+    return static_cast<double>(counts[0]) / static_cast<double>(total());
 }
 
 std::uint64_t band_histogram::beyond() const
@@ -51,39 +61,40 @@ std::uint64_t band_histogram::beyond() const
                            std::uint64_t{0});
 }
 
-std::vector<band_histogram> measure_histograms(image_reader &image)
+std::vector<band_histogram> measure_histograms(image_reader &reader)
 {
-    std::vector<band_histogram> all;
-    for (const std::int32_t band : image.all_bands())
-        all.push_back({band, image.form.nbits,
-                       std::vector<std::uint64_t>(image.form.nbytes == 1 ? 256 : 65536),
-                       stretch(image.form.nbits)});
-    walk(image, whole(image.form), image.all_bands(), {},
-         [&](const window &place, const block &samples) {
-             samples.for_each_row([&](std::int32_t band, std::int32_t, const auto *row) {
-                 auto &counts = all[static_cast<std::size_t>(band)].counts;
-                 for (std::int32_t i = 0; i < samples.nsamps; ++i) ++counts[row[i]];
-             });
-             for (band_histogram &each : all) each.spread.count(samples, each.band, place.samp);
-         });
-    for (band_histogram &each : all) each.spread.finish();
-    return all;
+    const shape &form = reader.form;
+    const band_list bands = reader.all_bands();
+    std::vector<band_histogram> histograms;
+    for (const std::int32_t band : bands)
+        histograms.push_back({band, form.nbits,
+                              std::vector<std::uint64_t>(form.nbytes == 1 ? 256 : 65536),
+                              band_stretch(form.nbits)});
+    walk(reader, form.whole(), bands, {}, [&](const window &piece, const block &samples) {
+        samples.for_each_row([&](std::int32_t band, std::int32_t, const auto *row) {
+            auto &counts = histograms[static_cast<std::size_t>(band)].counts;
+            for (std::int32_t i = 0; i < samples.nsamps; ++i) ++counts[row[i]];
+        });
+        for (band_histogram &each : histograms) each.stretch.count(samples, each.band, piece.samp);
+    });
+    for (band_histogram &each : histograms) each.stretch.finish();
+    return histograms;
 }
 
-void print_histogram(const band_histogram &of, std::int32_t nrows)
+void print_histogram(const band_histogram &histogram, std::int32_t nrows)
 {
-    const std::int32_t low = of.lowest(), high = of.highest();
+    const std::int32_t low = histogram.lowest(), high = histogram.highest();
     const std::int32_t step = (high - low) / nrows + 1;
     std::vector<std::uint64_t> rows;
     for (std::int32_t first = low; first <= high; first += step) {
-        const auto begin = of.counts.begin() + first;
+        const auto begin = histogram.counts.begin() + first;
         rows.push_back(
             std::accumulate(begin, begin + std::min(step, high - first + 1), std::uint64_t{0}));
     }
     const std::uint64_t most = std::ranges::max(rows);
     for (std::size_t i = 0; i < rows.size(); ++i) {
         const std::int32_t first = low + static_cast<std::int32_t>(i) * step;
-        // Ranges that hold anything have a mark.
+        // Rounded up: a range that holds any sample has a mark.
         const auto length = (rows[i] * 50 + most - 1) / most;
         std::printf("  %5d..%-5d |%-50s| %s\n", first, std::min(first + step - 1, high),
                     std::string(length, '#').c_str(),

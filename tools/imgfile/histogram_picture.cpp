@@ -1,7 +1,10 @@
-// The histogram as a picture for a report.
+// Drawing histograms with cairo: axes, a filled outline of the counts and a line for the stretch.
+// Read histogram_picture.h first.
+#include "histogram_picture.h"
+
 #include "failure.h"
-#include "histogram.h"
-#include "walk.h"
+
+#include "common/grouped.h"
 
 #include <algorithm>
 #include <array>
@@ -18,17 +21,17 @@ constexpr double PLOT_WIDTH = WIDTH - LEFT - RIGHT, PLOT_HEIGHT = HEIGHT - TOP -
 struct color {
     double red, green, blue;
 };
-constexpr color ink{0.15, 0.17, 0.2}, faint{0.88, 0.89, 0.91};
+constexpr color dark{0.15, 0.17, 0.2}, faint{0.88, 0.89, 0.91};
 constexpr std::array colors{color{0.80, 0.22, 0.20}, color{0.16, 0.55, 0.25},
                             color{0.13, 0.37, 0.75}};
 constexpr color gray{0.36, 0.45, 0.56}, orange{0.85, 0.42, 0.05};
 
 struct caption {
-    std::string what;
-    color by;
+    std::string text;
+    color ink;
 };
 
-// A picture with a plot in it, of values in [low, high] and heights in [0, top].
+// A picture with a plot of values in [low, high] and counts in [0, top].
 class plot {
 public:
     plot(double low, double high, double top)
@@ -44,30 +47,28 @@ public:
     {
         cairo_destroy(m_cairo);
         cairo_surface_destroy(m_surface);
-        cairo_debug_reset_static_data();  // what they know of fonts is not needed again
+        cairo_debug_reset_static_data();  // frees the caches of fonts
         FcFini();
     }
     plot(const plot &) = delete;
     plot &operator=(const plot &) = delete;
 
     double x(double value) const { return LEFT + (value - m_low) / (m_high - m_low) * PLOT_WIDTH; }
-    double y(double share) const
-    {
-        return TOP + (1 - share) * PLOT_HEIGHT;
-    }  // of the plot's height
+    // `share` of the plot's height, from 0 to 1.
+    double y(double share) const { return TOP + (1 - share) * PLOT_HEIGHT; }
 
-    void use(color what, double opacity = 1)
+    void use(color ink, double opacity = 1)
     {
-        cairo_set_source_rgba(m_cairo, what.red, what.green, what.blue, opacity);
+        cairo_set_source_rgba(m_cairo, ink.red, ink.green, ink.blue, opacity);
     }
-    // Returns the width.
-    double write(const std::string &what, double at_x, double at_y, double align, double size)
+    // Returns the width of the text. `align`: the part of it that lies left of `text_x`.
+    double write(const std::string &words, double text_x, double text_y, double align, double size)
     {
         cairo_set_font_size(m_cairo, size);
         cairo_text_extents_t extents;
-        cairo_text_extents(m_cairo, what.c_str(), &extents);
-        cairo_move_to(m_cairo, at_x - align * extents.x_advance, at_y);
-        cairo_show_text(m_cairo, what.c_str());
+        cairo_text_extents(m_cairo, words.c_str(), &extents);
+        cairo_move_to(m_cairo, text_x - align * extents.x_advance, text_y);
+        cairo_show_text(m_cairo, words.c_str());
         return extents.x_advance;
     }
     void line(double x0, double y0, double x1, double y1, double width)
@@ -80,26 +81,26 @@ public:
 
     void axes(const std::string &title, const std::vector<caption> &captions)
     {
-        use(ink);
+        use(dark);
         write(title, LEFT, 30, 0, 18);
-        double at = LEFT;
+        double left = LEFT;
         for (const caption &each : captions) {
-            use(each.by);
-            at += write(each.what, at, 50, 0, 12) + 18;
+            use(each.ink);
+            left += write(each.text, left, 50, 0, 12) + 18;
         }
-        use(ink);
+        use(dark);
         const double step = rounded_step((m_high - m_low) / 8);
         for (double value = std::ceil(m_low / step) * step; value <= m_high; value += step) {
             use(faint);
             line(x(value), y(0), x(value), y(1), 1);
-            use(ink);
+            use(dark);
             write(grouped(static_cast<std::int64_t>(value)), x(value), y(0) + 18, 0.5, 12);
         }
         const double rise = rounded_step(m_top / 5);
         for (double count = 0; count <= m_top; count += rise) {
             use(faint);
             line(LEFT, y(count / m_top), LEFT + PLOT_WIDTH, y(count / m_top), 1);
-            use(ink);
+            use(dark);
             write(grouped(static_cast<std::int64_t>(count)), LEFT - 8, y(count / m_top) + 4, 1, 12);
         }
         for (const int byte : {0, 64, 128, 192, 255})
@@ -110,25 +111,25 @@ public:
         line(LEFT, y(0), LEFT + PLOT_WIDTH, y(0), 1);
     }
 
-    void draw(const band_histogram &of, color by, color stretch_by, double bin)
+    void draw(const band_histogram &histogram, color bars, color curve, double bin)
     {
         cairo_move_to(m_cairo, x(m_low), y(0));
         for (double first = m_low; first < m_high; first += bin) {
-            const double share = std::min(sum(of, first, bin) / m_top, 1.0);
+            const double share = std::min(sum(histogram, first, bin) / m_top, 1.0);
             cairo_line_to(m_cairo, x(first), y(share));
             cairo_line_to(m_cairo, x(first + bin), y(share));
         }
         cairo_line_to(m_cairo, x(m_high), y(0));
         cairo_close_path(m_cairo);
-        use(by, 0.45);
+        use(bars, 0.45);
         cairo_fill(m_cairo);
 
-        const auto &table = of.spread.table();
+        const auto &table = histogram.stretch.table();
         for (double value = m_low; value < m_high; value += bin) {
             const auto index = std::min(static_cast<std::size_t>(value), table.size() - 1);
             cairo_line_to(m_cairo, x(value), y(table[index] / 255.0));
         }
-        use(stretch_by);
+        use(curve);
         cairo_set_line_width(m_cairo, 2);
         cairo_stroke(m_cairo);
     }
@@ -138,8 +139,8 @@ public:
         if (const cairo_status_t status = cairo_status(m_cairo); status != CAIRO_STATUS_SUCCESS)
             throw std::runtime_error(cairo_status_to_string(status));
         std::string bytes;
-        const auto append = [](void *to, const unsigned char *data, unsigned count) {
-            static_cast<std::string *>(to)->append(reinterpret_cast<const char *>(data), count);
+        const auto append = [](void *target, const unsigned char *data, unsigned count) {
+            static_cast<std::string *>(target)->append(reinterpret_cast<const char *>(data), count);
             return CAIRO_STATUS_SUCCESS;
         };
         if (cairo_surface_write_to_png_stream(m_surface, append, &bytes) != CAIRO_STATUS_SUCCESS)
@@ -148,31 +149,31 @@ public:
     }
 
     // Samples with values in [first, first + bin).
-    static double sum(const band_histogram &of, double first, double bin)
+    static double sum(const band_histogram &histogram, double first, double bin)
     {
         const auto begin = static_cast<std::size_t>(first);
-        const auto end = std::min(static_cast<std::size_t>(first + bin), of.counts.size());
+        const auto end = std::min(static_cast<std::size_t>(first + bin), histogram.counts.size());
         double all = 0;
         for (std::size_t value = begin; value < end; ++value)
-            all += static_cast<double>(of.counts[value]);
+            all += static_cast<double>(histogram.counts[value]);
         return all;
     }
 
 private:
-    // 1, 2 or 5 times a power of ten, at least 1.
-    static double rounded_step(double about)
+    // Returns the next number that is 1, 2 or 5 times a power of ten, at least 1.
+    static double rounded_step(double least)
     {
-        const double power = std::pow(10, std::floor(std::log10(std::max(about, 1.0))));
+        const double power = std::pow(10, std::floor(std::log10(std::max(least, 1.0))));
         for (const double factor : {1.0, 2.0, 5.0})
-            if (factor * power >= about) return factor * power;
+            if (factor * power >= least) return factor * power;
         return 10 * power;
     }
-    void write_upright(const std::string &what, double at_x)
+    void write_upright(const std::string &words, double text_x)
     {
         cairo_save(m_cairo);
-        cairo_translate(m_cairo, at_x, TOP + PLOT_HEIGHT / 2);
+        cairo_translate(m_cairo, text_x, TOP + PLOT_HEIGHT / 2);
         cairo_rotate(m_cairo, -std::acos(0.0));
-        write(what, 0, 0, 0.5, 13);
+        write(words, 0, 0, 0.5, 13);
         cairo_restore(m_cairo);
     }
 
@@ -181,7 +182,7 @@ private:
     double m_low, m_high, m_top;
 };
 
-// Bytes that are not UTF-8 cannot be drawn.
+// A name that is not UTF-8 cannot be drawn; its other bytes become "?".
 std::string drawable(std::string name)
 {
     int characters, widest;
@@ -192,40 +193,39 @@ std::string drawable(std::string name)
     return in_one_line(name);
 }
 
-double rounded(double number)  // to tenths
+// To tenths.
+double rounded(double number)
 {
     return std::round(number * 10) / 10;
 }
 
 }  // namespace
 
-std::string draw_histograms(const std::vector<band_histogram> &of, const std::string &title)
+std::string draw_histograms(const std::vector<band_histogram> &histograms, const std::string &title)
 {
     std::int32_t high = 0;
-    for (const band_histogram &each : of) high = std::max(high, each.highest() + 1);
+    for (const band_histogram &each : histograms) high = std::max(high, each.highest() + 1);
     const std::int32_t bin = std::max(high / 400, 1);
     high = (high + bin - 1) / bin * bin;
-    // The fill, 0, often is most of an image: the rest decides how high the plot is.
+    // Zeros are often most of an image; the other values decide the height of the plot.
     double top = 1;
-    for (const band_histogram &each : of)
+    for (const band_histogram &each : histograms)
         for (std::int32_t first = 0; first < high; first += bin)
             top = std::max(
                 top, plot::sum(each, std::max(first, 1), first == 0 ? std::max(bin - 1, 0) : bin));
     plot picture(0, high, top * 1.05);
-    const bool is_alone = of.size() == 1;
+    const bool is_alone = histograms.size() == 1;
     const auto own = [](std::size_t i) { return colors.at(i % colors.size()); };
     std::vector<caption> captions;
-    for (std::size_t i = 0; i < of.size(); ++i) {
-        const band_histogram &each = of[i];
-        const double zeros =
-            static_cast<double>(each.counts[0]) / static_cast<double>(each.total());
+    for (std::size_t i = 0; i < histograms.size(); ++i) {
+        const band_histogram &each = histograms[i];
         captions.push_back(
             {text("band ", each.band, ": ", each.lowest(), " to ", each.highest(), ", mean ",
-                  rounded(each.mean()), ", ", rounded(100 * zeros), " % zero"),
-             is_alone ? ink : own(i)});
+                  rounded(each.mean()), ", ", rounded(100 * each.share_of_zero()), " % zero"),
+             is_alone ? dark : own(i)});
     }
     picture.axes(drawable(title), captions);
-    for (std::size_t i = 0; i < of.size(); ++i)
-        picture.draw(of[i], is_alone ? gray : own(i), is_alone ? orange : own(i), bin);
+    for (std::size_t i = 0; i < histograms.size(); ++i)
+        picture.draw(histograms[i], is_alone ? gray : own(i), is_alone ? orange : own(i), bin);
     return picture.as_png();
 }

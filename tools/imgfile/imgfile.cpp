@@ -1,15 +1,17 @@
-// imgfile: looks at VITec and Helava images, checks them, and moves them to and from other formats.
+// imgfile: describes, checks and converts VITec and Helava images. This file defines the command
+// line; commands/commands.h lists what it calls.
 //
 // Exit status: 0 done; 1 the work failed, or a check or comparison found something; 2 wrong usage.
-#include "commands.h"
+#include "commands/commands.h"
 #include "failure.h"
-#include "walk.h"
+#include "notes.h"
 
 #include <CLI/CLI.hpp>
 #include <array>
 #include <csignal>
 #include <cstdio>
 #include <functional>
+#include <iostream>
 #include <new>
 
 #include <fcntl.h>
@@ -19,8 +21,8 @@ namespace {
 
 constexpr const char *VERSION = IMGFILE_VERSION;
 
-// A host that has closed a standard stream must not find its text in an image: the descriptor is
-// taken, by something that cannot be written.
+// When the caller has closed a standard stream, an image could get its descriptor, and text would
+// be written into the image. So the descriptor is taken by a file that cannot be written.
 void take_standard_descriptors()
 {
     for (int fd = STDIN_FILENO; fd <= STDERR_FILENO; ++fd)
@@ -28,17 +30,17 @@ void take_standard_descriptors()
 }
 
 template <typename Value>
-void add_operand(CLI::App *command, const char *name, Value &value, const char *what)
+void add_operand(CLI::App *command, const char *name, Value &value, const char *help)
 {
-    command->add_option(name, value, what)->required()->type_name("");
+    command->add_option(name, value, help)->required()->type_name("");
 }
 
-// `kind` stands for the value in the help.
+// `placeholder` stands for the value in the help.
 template <typename Value>
-CLI::Option *add_option(CLI::App *command, const char *name, Value &value, const char *kind,
-                        const char *what)
+CLI::Option *add_option(CLI::App *command, const char *name, Value &value, const char *placeholder,
+                        const char *help)
 {
-    return command->add_option(name, value, what)->type_name(kind);
+    return command->add_option(name, value, help)->type_name(placeholder);
 }
 
 void add_quiet(CLI::App *app)
@@ -46,117 +48,118 @@ void add_quiet(CLI::App *app)
     app->add_flag("--quiet", quiet, "Print no progress and no notes");
 }
 
-CLI::App *add_command(CLI::App &app, const char *name, const char *what)
+CLI::App *add_command(CLI::App &app, const char *name, const char *help)
 {
-    CLI::App *const command = app.add_subcommand(name, what);
+    CLI::App *const command = app.add_subcommand(name, help);
     command->group("Commands");
     add_quiet(command);
     return command;
 }
 
-void add_output(CLI::App *command, std::string &name, bool &overwrite, const char *what)
+void add_output(CLI::App *command, std::string &name, bool &overwrite, const char *help)
 {
-    add_operand(command, "OUT", name, what);
+    add_operand(command, "OUT", name, help);
     command->add_flag("--overwrite", overwrite, "Replace OUT if it exists");
 }
 
-CLI::App *add_info(CLI::App &app, info_options &asked)
+CLI::App *add_info(CLI::App &app, info_options &options)
 {
-    CLI::App *const command = add_command(app, "info", "Tell what image files are");
-    add_operand(command, "FILE", asked.files, "Images of any format; - is standard input");
-    command->add_flag("--json", asked.json, "Print an array with one object for each file");
+    CLI::App *const command = add_command(app, "info", "Describe image files");
+    add_operand(command, "FILE", options.files, "Images of any format; - is standard input");
+    command->add_flag("--json", options.json, "Print an array with one object for each file");
     return command;
 }
 
-CLI::App *add_check(CLI::App &app, check_options &asked)
+CLI::App *add_check(CLI::App &app, check_options &options)
 {
-    CLI::App *const command =
-        add_command(app, "check", "Look for all that can be wrong with image files");
-    add_operand(command, "FILE", asked.files, "Images of any format");
+    CLI::App *const command = add_command(app, "check", "Check image files for errors");
+    add_operand(command, "FILE", options.files, "Images of any format");
     return command;
 }
 
-CLI::App *add_convert(CLI::App &app, convert_options &asked)
+CLI::App *add_convert(CLI::App &app, convert_options &options)
 {
     CLI::App *const command =
-        add_command(app, "convert", "Write an image, or a part of it, in another format");
-    add_operand(command, "IN", asked.in, "The image; - is standard input");
-    add_output(command, asked.out, asked.overwrite,
-               "What to write; its ending tells the format; - is standard output");
-    add_option(command, "--format", asked.format, "FORMAT",
-               "vitec, helava, pgm, ppm, png or tiff, whatever OUT ends in")
+        add_command(app, "convert", "Convert an image, or a part of it, to another format");
+    add_operand(command, "IN", options.in, "The image; - is standard input");
+    add_output(command, options.out, options.overwrite,
+               "The output; its ending selects the format; - is standard output");
+    add_option(command, "--format", options.format, "FORMAT",
+               "vitec, helava, pgm, ppm, png or tiff (default: by the ending of OUT)")
         ->check(CLI::IsMember({"vitec", "helava", "pgm", "ppm", "png", "tiff"}, CLI::ignore_case)
                     .description(""));
-    add_option(command, "--tile", asked.tile, "N|NxM",
-               "Store in tiles of N x N, or N lines x M samples; or none");
-    add_option(command, "--window", asked.window, "LINE,SAMP,NLINES,NSAMPS",
-               "Only this part; lines and samples count from 0");
-    add_option(command, "--band", asked.bands, "N[,N...]",
-               "Only these bands, in this order; they count from 0");
-    command->add_flag("--stretch", asked.stretch,
-                      "Stretch to one byte per sample, all by one histogram");
+    add_option(command, "--tile", options.tile, "N|NxM",
+               "Tiles of N x N, or of N lines x M samples; or none (none)");
+    add_option(command, "--window", options.window, "LINE,SAMP,NLINES,NSAMPS",
+               "Only this part; lines and samples are counted from 0");
+    add_option(command, "--band", options.bands, "N[,N...]",
+               "Only these bands, in this order; counted from 0");
+    command->add_flag("--stretch", options.stretch, "Stretch each band to one byte per sample");
     return command;
 }
 
-CLI::App *add_preview(CLI::App &app, preview_options &asked)
+CLI::App *add_preview(CLI::App &app, preview_options &options)
 {
-    CLI::App *const command = add_command(app, "preview", "Make a picture for people to look at");
-    add_operand(command, "FILE", asked.in, "The image; - is standard input");
-    add_output(command, asked.out, asked.overwrite, "The picture, a PNG file");
-    add_option(command, "--size", asked.size, "N", "Lines or samples at most, 16 to 2048 (1024)")
+    CLI::App *const command = add_command(app, "preview", "Write a reduced picture of an image");
+    add_operand(command, "FILE", options.in, "The image; - is standard input");
+    add_output(command, options.out, options.overwrite, "The picture, a PNG file");
+    add_option(command, "--size", options.size, "N",
+               "At most N lines and N samples, 16 to 2048 (1024)")
         ->check(CLI::Range(16, 2048).description(""));
-    add_option(command, "--band", asked.bands, "N[,N,N]",
-               "One band, or three to be red, green and blue");
-    command->add_flag("--raw", asked.raw, "Do not stretch: show the samples as they are");
+    add_option(command, "--band", options.bands, "N[,N,N]",
+               "One band, or three as red, green and blue");
+    command->add_flag("--raw", options.raw,
+                      "Do not stretch: show the highest 8 bits of each sample");
     return command;
 }
 
-CLI::App *add_stats(CLI::App &app, stats_options &asked)
+CLI::App *add_stats(CLI::App &app, stats_options &options)
 {
-    CLI::App *const command =
-        add_command(app, "stats", "Tell what the samples of an image are like");
-    add_operand(command, "FILE", asked.in, "The image; - is standard input");
-    command->add_flag("--json", asked.json, "Print an object");
-    add_option(command, "--histogram", asked.histogram, "OUT.png",
-               "Write a picture of the histogram and of the stretch");
-    command->add_flag("--overwrite", asked.overwrite, "Replace the picture if it exists");
+    CLI::App *const command = add_command(app, "stats", "Print sample statistics");
+    add_operand(command, "FILE", options.in, "The image; - is standard input");
+    command->add_flag("--json", options.json, "Print an object");
+    add_option(command, "--histogram", options.histogram, "OUT.png",
+               "Write a picture of the histograms and stretches");
+    command->add_flag("--overwrite", options.overwrite, "Replace the picture if it exists");
     return command;
 }
 
-CLI::App *add_compare(CLI::App &app, compare_options &asked)
+CLI::App *add_compare(CLI::App &app, compare_options &options)
 {
     CLI::App *const command = add_command(app, "compare", "Compare two images sample by sample");
-    add_operand(command, "A", asked.a, "An image; - is standard input");
-    add_operand(command, "B", asked.b, "Another image, of any format");
+    add_operand(command, "A", options.a, "An image; - is standard input");
+    add_operand(command, "B", options.b, "Another image, of any format");
     return command;
 }
 
-CLI::App *add_create(CLI::App &app, create_options &asked)
+CLI::App *add_create(CLI::App &app, create_options &options)
 {
-    CLI::App *const command = add_command(app, "create", "Create an image, all samples 0");
-    add_output(command, asked.out, asked.overwrite, "What to write; its ending tells the type");
+    CLI::App *const command =
+        add_command(app, "create", "Create an image of zeros or of a test pattern");
+    add_output(command, options.out, options.overwrite, "The output; its ending selects the type");
     const auto not_negative = CLI::Range(0, INT32_MAX).description("");
-    add_option(command, "--lines", asked.nlines, "N", "Lines")->required()->check(not_negative);
-    add_option(command, "--samples", asked.nsamps, "N", "Samples per line")
+    add_option(command, "--lines", options.nlines, "N", "Lines")->required()->check(not_negative);
+    add_option(command, "--samples", options.nsamps, "N", "Samples per line")
         ->required()
         ->check(not_negative);
-    add_option(command, "--bands", asked.nbands, "N", "Bands (1)")->check(not_negative);
-    add_option(command, "--bytes", asked.nbytes, "N", "Bytes of a sample, 1 or 2 (1)")
+    add_option(command, "--bands", options.nbands, "N", "Bands (1)")->check(not_negative);
+    add_option(command, "--bytes", options.nbytes, "N", "Bytes per sample, 1 or 2 (1)")
         ->check(CLI::Range(1, 2).description(""));
-    add_option(command, "--type", asked.type, "TYPE", "vitec or helava, whatever OUT ends in")
+    add_option(command, "--type", options.type, "TYPE",
+               "vitec or helava (default: by the ending of OUT)")
         ->check(CLI::IsMember({"vitec", "helava"}, CLI::ignore_case).description(""));
-    add_option(command, "--tile", asked.tile, "N|NxM",
-               "Store in tiles of N x N, or N lines x M samples; or none");
-    command->add_flag("--pattern", asked.pattern, "With a test pattern instead of zeros");
+    add_option(command, "--tile", options.tile, "N|NxM",
+               "Tiles of N x N, or of N lines x M samples; or none (none)");
+    command->add_flag("--pattern", options.pattern, "A test pattern instead of zeros");
     return command;
 }
 
 // Prints one line to standard error; returns the status for wrong usage.
-int tell_usage(const CLI::App &app, const std::string &what)
+int report_wrong_usage(const CLI::App &app, const std::string &problem)
 {
     std::string command = "imgfile";
     for (const CLI::App *each : app.get_subcommands()) command += " " + each->get_name();
-    std::fprintf(stderr, "imgfile: %s (see %s --help)\n", in_one_line(what).c_str(),
+    std::fprintf(stderr, "imgfile: %s (see %s --help)\n", in_one_line(problem).c_str(),
                  command.c_str());
     return 2;
 }
@@ -170,26 +173,27 @@ void describe(CLI::App &app)
     add_quiet(&app);
     app.get_formatter()->column_width(34);
     app.get_formatter()->label("SUBCOMMAND", "COMMAND");
-    app.footer("Exit status: 0 done, 1 failed or found something, 2 wrong usage.\n"
-               "\"imgfile COMMAND --help\" and \"man imgfile-COMMAND\" tell more.");
+    app.footer("Exit status: 0 success, 1 a failure, a finding or a difference, 2 wrong usage.\n"
+               "For details: \"imgfile COMMAND --help\" and \"man imgfile-COMMAND\".");
 }
 
-// Returns what is left to say about arguments that could not be parsed.
-std::string complaint(const CLI::App &app, const CLI::ParseError &error)
+// Returns the problem with arguments that cannot be parsed.
+std::string parse_problem(const CLI::App &app, const CLI::ParseError &error)
 {
-    const std::vector<std::string> left = app.remaining();
+    const std::vector<std::string> unknown = app.remaining();
     if (!app.get_subcommands().empty()) {
-        const std::string what = error.what();
-        return what.substr(0, what.find('\n'));
+        const std::string lines = error.what();
+        return lines.substr(0, lines.find('\n'));
     }
-    if (left.empty()) return "a command is required";
-    return (left[0].starts_with('-') ? "there is no option " : "there is no command ") + left[0];
+    if (unknown.empty()) return "a command is required";
+    return (unknown[0].starts_with('-') ? "unknown option: " : "unknown command: ") + unknown[0];
 }
 
 int run(int argc, char **argv)
 {
-    CLI::App app("Looks at VITec and Helava images, checks them, and moves them to and from\n"
-                 "PGM, PPM, PNG and TIFF files.");
+    CLI::App app(
+        "Describes, checks and converts VITec and Helava images. Reads and writes PGM, PPM,\n"
+        "PNG and TIFF files as well.");
     describe(app);
     info_options info;
     check_options check;
@@ -214,20 +218,17 @@ int run(int argc, char **argv)
         app.exit(wanted);
         return 0;
     } catch (const CLI::ParseError &error) {
-        return tell_usage(app, complaint(app, error));
+        return report_wrong_usage(app, parse_problem(app, error));
     }
     try {
         for (const auto &[command, action] : commands)
             if (command->parsed()) return action();
     } catch (const wrong_usage &error) {
-        return tell_usage(app, error.what());
-    } catch (const failure &error) {
-        std::fflush(stdout);
-        std::fprintf(stderr, "imgfile: %s\n", error.what());
+        return report_wrong_usage(app, error.what());
     } catch (const std::bad_alloc &) {
-        std::fprintf(stderr, "imgfile: not enough memory\n");
+        print_failure("not enough memory");
     } catch (const std::exception &error) {
-        std::fprintf(stderr, "imgfile: %s\n", error.what());
+        print_failure(error.what());
     }
     return 1;
 }
@@ -237,7 +238,7 @@ int run(int argc, char **argv)
 int main(int argc, char **argv)
 {
     take_standard_descriptors();
-    std::signal(SIGPIPE, SIG_IGN);  // a reader that went away is an error like others
+    std::signal(SIGPIPE, SIG_IGN);  // a closed pipe is an error like others
     std::signal(SIGXFSZ, SIG_IGN);
     const int status = run(argc, argv);
     if (std::fflush(stdout) == 0 && std::ferror(stdout) == 0 && std::cout.flush().good())

@@ -1,0 +1,16 @@
+// The library's messages, which the tool reports in words of its own.
+#ifndef TOOL_LIBRARY_MESSAGE_H
+#define TOOL_LIBRARY_MESSAGE_H
+
+#include <string>
+
+// The last system error that the library reported. Messages go nowhere else from the first use on.
+class library_message {
+public:
+    static void collect();  // from now on
+    static void forget();
+    // Returns the system's text for the last error since forget(); `otherwise` if there was none.
+    static std::string reason(const std::string &otherwise);
+};
+
+#endif
