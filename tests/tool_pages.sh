@@ -27,8 +27,8 @@ operands_of_page() {
     sed -n '/^\.Sh SYNOPSIS/,/^\.Sh DESC/s/^\.Ar \([A-Z ]*\).*/\1/p' "$1" | tr ' ' '\n' |
         grep . | sorted
 }
-values_of_help() {  # COMMAND OPTION: those of "a, b or c, whatever ..."
-    "$program" "$1" --help | sed -n "s/^  $2 [A-Z]*  *\([a-z, ]*\), whatever.*/\1/p" |
+values_of_help() {  # COMMAND OPTION: those of "a, b or c (default ..."
+    "$program" "$1" --help | sed -n "s/^  $2 [A-Z]*  *\([a-z, ]*[a-z]\) (default.*/\1/p" |
         sed 's/ or /, /; s/, /\n/g' | sorted
 }
 offered() {  # WORD...: what completion offers for the last of them

@@ -1,5 +1,6 @@
 // The command-line tool, run as its users run it.
 #include "img.h"
+#include "support/files.h"
 
 #include <algorithm>
 #include <array>
@@ -7,7 +8,6 @@
 #include <csignal>
 #include <cstring>
 #include <filesystem>
-#include <fstream>
 #include <gtest/gtest.h>
 #include <nlohmann/json.hpp>
 #include <random>
@@ -24,21 +24,21 @@ namespace fs = std::filesystem;
 
 namespace {
 
-std::string content_of(const fs::path &file)
+std::string content_of(const std::string &file)
 {
-    std::ifstream in(file, std::ios::binary);
-    return {std::istreambuf_iterator<char>(in), {}};
+    const bytes content = read_file(file);
+    return {content.begin(), content.end()};
 }
 
-void write_content(const fs::path &file, const std::string &bytes)
+void write_content(const std::string &file, const std::string &content)
 {
-    std::ofstream(file, std::ios::binary) << bytes;
+    write_file(file, bytes(content.begin(), content.end()));
 }
 
 struct finished {
-    int status;  // below 0: the signal that ended it
+    int status;  // below 0: the signal that ended the tool
     std::string out, err;
-    long kilobytes;  // of memory that it had at most
+    long kilobytes;  // of memory, at most
 };
 
 // Samples in the order of PNM files.
@@ -46,7 +46,7 @@ struct picture {
     int nlines, nsamps, nbands, nbytes;
     std::vector<int> samples;
 
-    int at(int line, int samp, int band) const
+    int sample(int line, int samp, int band) const
     {
         return samples[static_cast<std::size_t>((line * nsamps + samp) * nbands + band)];
     }
@@ -58,8 +58,8 @@ struct picture {
         for (int line = 0; line < nlines; ++line)
             for (int samp = 0; samp < nsamps; ++samp)
                 for (const int band : bands) {
-                    if (nbytes == 2) out.put(static_cast<char>(at(line, samp, band) >> 8));
-                    out.put(static_cast<char>(at(line, samp, band) & 255));
+                    if (nbytes == 2) out.put(static_cast<char>(sample(line, samp, band) >> 8));
+                    out.put(static_cast<char>(sample(line, samp, band) & 255));
                 }
         return out.str();
     }
@@ -77,22 +77,13 @@ picture random_picture(int nlines, int nsamps, int nbands, int nbytes, int highe
 
 class Tool : public testing::Test {
 protected:
-    Tool()
-    {
-        std::string pattern = fs::temp_directory_path() / "imgfile_tool_XXXXXX";
-        m_folder = ::mkdtemp(pattern.data());
-        fs::current_path(m_folder);
-    }
-    ~Tool() override
-    {
-        fs::current_path("/");
-        fs::remove_all(m_folder);
-    }
+    Tool() { fs::current_path(m_folder / ""); }
+    ~Tool() override { fs::current_path("/"); }
 
-    // Runs the tool with arguments that are divided by blanks. `prepare` runs in the new process;
-    // `signal` is sent to it after so many milliseconds.
+    // Runs the tool with arguments that are separated by blanks. `prepare` runs in the new process,
+    // which is sent `signal` after `delay` milliseconds.
     template <typename Prepare>
-    finished run(const std::string &arguments, Prepare prepare, int signal = 0, int after = 0)
+    finished run(const std::string &arguments, Prepare prepare, int signal = 0, int delay = 0)
     {
         std::istringstream words(arguments);
         std::vector<std::string> list{IMGFILE_TOOL};
@@ -102,25 +93,23 @@ protected:
         argv.push_back(nullptr);
         const pid_t child = ::fork();
         if (child == 0) {
-            redirect(m_folder.string() + ".out", STDOUT_FILENO);
-            redirect(m_folder.string() + ".err", STDERR_FILENO);
+            for (const auto &[name, stream] :
+                 {std::pair{"out", STDOUT_FILENO}, {"err", STDERR_FILENO}})
+                ::dup2(::open((m_streams / name).c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0600),
+                       stream);
             prepare();
             ::execv(argv[0], argv.data());
             ::_exit(127);
         }
         if (signal != 0) {
-            ::usleep(static_cast<useconds_t>(after) * 1000);
+            ::usleep(static_cast<useconds_t>(delay) * 1000);
             ::kill(child, signal);
         }
         int status = -1;
         rusage used{};
         ::wait4(child, &status, 0, &used);
-        finished end{WIFSIGNALED(status) ? -WTERMSIG(status) : WEXITSTATUS(status),
-                     content_of(m_folder.string() + ".out"), content_of(m_folder.string() + ".err"),
-                     used.ru_maxrss};
-        fs::remove(m_folder.string() + ".out");
-        fs::remove(m_folder.string() + ".err");
-        return end;
+        return {WIFSIGNALED(status) ? -WTERMSIG(status) : WEXITSTATUS(status),
+                content_of(m_streams / "out"), content_of(m_streams / "err"), used.ru_maxrss};
     }
     finished run(const std::string &arguments)
     {
@@ -135,19 +124,13 @@ protected:
     std::vector<std::string> files() const
     {
         std::vector<std::string> names;
-        for (const auto &each : fs::directory_iterator(m_folder))
+        for (const auto &each : fs::directory_iterator("."))
             names.push_back(each.path().filename());
         std::ranges::sort(names);
         return names;
     }
 
-    fs::path m_folder;
-
-private:
-    static void redirect(const std::string &file, int to)
-    {
-        ::dup2(::open(file.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0600), to);
-    }
+    scratch_folder m_folder, m_streams;
 };
 
 struct kept_as {
@@ -165,7 +148,7 @@ const std::vector<kept_as> formats{
     {"tiled.tif", "--tile 32x16", {false, true, true, true}, true},
 };
 
-TEST_F(Tool, KeepsEachSampleFromAnyFormatToAnyOther)
+TEST_F(Tool, KeepsSamplesFromAnyFormatToAnyOther)
 {
     for (const int nbands : {1, 2, 3})
         for (const int nbytes : {1, 2}) {
@@ -180,15 +163,16 @@ TEST_F(Tool, KeepsEachSampleFromAnyFormatToAnyOther)
                 return format.bands.at(static_cast<std::size_t>(nbands)) &&
                        (nbytes == 1 || format.two_bytes);
             };
-            for (const kept_as &from : formats) {
-                if (!holds(from)) continue;
-                const std::string first = std::string("from_") + from.name;
+            for (const kept_as &source_format : formats) {
+                if (!holds(source_format)) continue;
+                const std::string first = std::string("from_") + source_format.name;
                 expect_done("convert source.ppm " + first + " --overwrite --band " + chosen + " " +
-                            from.options);
-                for (const kept_as &to : formats) {
-                    if (!holds(to)) continue;
-                    const std::string second = std::string("to_") + to.name;
-                    expect_done("convert " + first + " " + second + " --overwrite " + to.options);
+                            source_format.options);
+                for (const kept_as &target : formats) {
+                    if (!holds(target)) continue;
+                    const std::string second = std::string("to_") + target.name;
+                    expect_done("convert " + first + " " + second + " --overwrite " +
+                                target.options);
                     const int band = nbytes - 1 < nbands ? nbytes - 1 : 0;
                     expect_done("convert " + second + " seen.pgm --overwrite --band " +
                                 std::to_string(band));
@@ -201,7 +185,7 @@ TEST_F(Tool, KeepsEachSampleFromAnyFormatToAnyOther)
         }
 }
 
-TEST_F(Tool, CutsWindowsAndPassesPicturesThrough)
+TEST_F(Tool, ExtractsWindowsAndReadsStandardInput)
 {
     const picture source = random_picture(40, 50, 3, 2, 65535);
     write_content("a.ppm", source.as_pnm({0, 1, 2}));
@@ -213,14 +197,14 @@ TEST_F(Tool, CutsWindowsAndPassesPicturesThrough)
         picture part{20, 30, 1, 2, {}};
         for (int line = 0; line < 20; ++line)
             for (int samp = 0; samp < 30; ++samp)
-                part.samples.push_back(source.at(line + 9, samp + 17, 2));
+                part.samples.push_back(source.sample(line + 9, samp + 17, 2));
         EXPECT_EQ(content_of("w.pgm"), part.as_pnm({0})) << name;
     }
     const finished piped =
         run("convert - - --format ppm", [] { ::dup2(::open("a.ppm", O_RDONLY), STDIN_FILENO); });
     EXPECT_EQ(piped.out, content_of("a.ppm"));
     EXPECT_EQ(piped.err, "");
-    // Standard input is read as often as it takes, by more than one reader at once.
+    // Standard input can be read more than once, by more than one reader at a time.
     const auto from_picture = [] { ::dup2(::open("a.png", O_RDONLY), STDIN_FILENO); };
     EXPECT_EQ(run("compare - -", from_picture).status, 0);
     EXPECT_EQ(run("convert - b.ppm --stretch", from_picture).status, 0);
@@ -228,32 +212,32 @@ TEST_F(Tool, CutsWindowsAndPassesPicturesThrough)
     EXPECT_EQ(content_of("b.ppm"), content_of("c.ppm"));
 }
 
-void write_tiff(const char *name, const char *mode, const picture &of, int compression, bool planar,
-                int strip)
+void write_tiff(const char *name, const char *mode, const picture &source, int compression,
+                bool planar, int strip)
 {
     TIFF *const file = TIFFOpen(name, mode);
-    TIFFSetField(file, TIFFTAG_IMAGELENGTH, of.nlines);
-    TIFFSetField(file, TIFFTAG_IMAGEWIDTH, of.nsamps);
-    TIFFSetField(file, TIFFTAG_SAMPLESPERPIXEL, of.nbands);
+    TIFFSetField(file, TIFFTAG_IMAGELENGTH, source.nlines);
+    TIFFSetField(file, TIFFTAG_IMAGEWIDTH, source.nsamps);
+    TIFFSetField(file, TIFFTAG_SAMPLESPERPIXEL, source.nbands);
     TIFFSetField(file, TIFFTAG_BITSPERSAMPLE, 16);
     TIFFSetField(file, TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_RGB);
     TIFFSetField(file, TIFFTAG_PLANARCONFIG, planar ? PLANARCONFIG_SEPARATE : PLANARCONFIG_CONTIG);
     TIFFSetField(file, TIFFTAG_COMPRESSION, compression);
     TIFFSetField(file, TIFFTAG_ROWSPERSTRIP, strip);
-    const int step = planar ? 1 : of.nbands;
-    for (int plane = 0; plane < of.nbands; plane += step)
-        for (int line = 0; line < of.nlines; ++line) {
+    const int step = planar ? 1 : source.nbands;
+    for (int plane = 0; plane < source.nbands; plane += step)
+        for (int line = 0; line < source.nlines; ++line) {
             std::vector<std::uint16_t> samples;
-            for (int samp = 0; samp < of.nsamps; ++samp)
+            for (int samp = 0; samp < source.nsamps; ++samp)
                 for (int band = plane; band < plane + step; ++band)
-                    samples.push_back(static_cast<std::uint16_t>(of.at(line, samp, band)));
+                    samples.push_back(static_cast<std::uint16_t>(source.sample(line, samp, band)));
             TIFFWriteScanline(file, samples.data(), static_cast<std::uint32_t>(line),
                               static_cast<std::uint16_t>(plane));
         }
     TIFFClose(file);
 }
 
-// Strips are read piece by piece, and from anywhere in them.
+// Strips are read piece by piece, from any line.
 TEST_F(Tool, ReadsStripsOfAllKinds)
 {
     const picture source = random_picture(1700, 900, 3, 2, 300);
@@ -299,7 +283,7 @@ TEST_F(Tool, StretchesAsTheLibraryDoesAllAtOnce)
     }
 }
 
-TEST_F(Tool, RefusesInOneLineAndLeavesTheTargetAsItWas)
+TEST_F(Tool, RefusesInOneLineAndKeepsTheTarget)
 {
     write_content("rgb.ppm", random_picture(20, 30, 3, 1, 255).as_pnm({0, 1, 2}));
     expect_done("create two.img --lines 20 --samples 30 --bytes 2 --pattern");
@@ -322,28 +306,30 @@ TEST_F(Tool, RefusesInOneLineAndLeavesTheTargetAsItWas)
     const std::string pixels = content_of("rgb.ppm");
     for (const auto &[arguments, status, message] : {
              refusal{"convert rgb.ppm old --format png", 1, "old: exists; --overwrite replaces it"},
-             {"convert rgb.ppm rgb.ppm --overwrite", 1, "rgb.ppm: is the input itself"},
-             {"convert rgb.ppm twin.ppm --overwrite", 1, "twin.ppm: is the input itself"},
-             {"convert link.ppm rgb.ppm --overwrite", 1, "rgb.ppm: is the input itself"},
+             {"convert rgb.ppm rgb.ppm --overwrite", 1, "rgb.ppm: is the input file"},
+             {"convert rgb.ppm twin.ppm --overwrite", 1, "twin.ppm: is the input file"},
+             {"convert link.ppm rgb.ppm --overwrite", 1, "rgb.ppm: is the input file"},
              {"convert missing.img old --format png --overwrite", 1,
               "missing.img: No such file or directory"},
              {"convert . old --format png --overwrite", 1, ".: is a folder"},
              {"convert pipe old --format png --overwrite", 1, "pipe: is not a regular file"},
              {"convert vast.pgm old --format png --overwrite", 1,
-              "vast.pgm: has no usable PGM or PPM header"},
+              "vast.pgm: has no valid PGM or PPM header"},
              {"convert rgb.ppm pipe --format png --overwrite", 1,
               "pipe: exists and is not a regular file"},
              {"convert rgb.ppm nowhere/new.png", 1,
               "nowhere/new.png: cannot be written: No such file or directory"},
              {"convert junk old --format png --overwrite", 1,
-              "junk: is no image of a known format, or its header is damaged"},
+              "junk: is not a known image format, or its header is damaged"},
              {"convert cut.pgm old --format img --overwrite", 2, nullptr},
              {"convert cut.pgm old --format vitec --overwrite", 1,
-              "cut.pgm: cut short: line 12 is missing"},
+              "cut.pgm: truncated: line 12 is missing"},
              {"convert cut.img old --format png --overwrite", 1,
-              "cut.img: cut short: line 8 of band 0 is missing"},
+              "cut.img: truncated: line 8 of band 0 is missing"},
              {"convert two.img old --format helava --overwrite", 1,
-              "old: Helava files hold samples of one byte (imgfile convert --stretch makes such)"},
+              "old: Helava files hold samples of one byte (imgfile convert --stretch reduces "
+              "samples "
+              "to one byte)"},
              {"convert seven.d old --format vitec --overwrite", 1,
               "old: VITec files hold at most 3 bands, not 7 (imgfile convert --band chooses some)"},
              {"convert seven.d old --format png --overwrite", 1,
@@ -351,17 +337,17 @@ TEST_F(Tool, RefusesInOneLineAndLeavesTheTargetAsItWas)
              {"convert rgb.ppm old --format pgm --overwrite", 1,
               "old: PGM files hold 1 band, not 3"},
              {"convert rgb.ppm old --format vitec --tile 100 --overwrite", 1,
-              "old: tiles of VITec files are powers of two from 8 to 32768 high and wide"},
+              "old: the tile sides of VITec files are powers of two from 8 to 32768"},
              {"convert rgb.ppm old --format tiff --tile 8 --overwrite", 1,
-              "old: tiles of TIFF files are multiples of 16 high and wide"},
+              "old: the tile sides of TIFF files are multiples of 16"},
              {"convert rgb.ppm old --format png --tile 16 --overwrite", 1,
               "old: PNG files have no tiles"},
              {"convert rgb.ppm old --format png --window 0,0,21,1 --overwrite", 1,
               "rgb.ppm: has no window 0,0,21,1: it has 20 lines x 30 samples"},
              {"convert rgb.ppm old --format png --band 3 --overwrite", 1,
               "rgb.ppm: has no band 3: it has 3, counted from 0"},
-             {"convert rgb.ppm old --format png --window 0,0,1 --overwrite", 2, nullptr},
-             {"convert rgb.ppm old --format png --window 0,0,0,1 --overwrite", 2, nullptr},
+             {"convert rgb.ppm old --format png --window 0,0,0,1 --overwrite", 2,
+              "--window is empty (see imgfile convert --help)"},
              {"convert rgb.ppm old --format png --tile 0 --overwrite", 2, nullptr},
              {"convert rgb.ppm old --format png --band x --overwrite", 2, nullptr},
              {"convert rgb.ppm old --overwrite", 2, nullptr},
@@ -375,21 +361,18 @@ TEST_F(Tool, RefusesInOneLineAndLeavesTheTargetAsItWas)
              {"create old --type helava --lines 5 --samples 5 --tile 8 --overwrite", 1,
               "old: Helava files have no tiles"},
              {"create old.png --lines 5 --samples 5", 2, nullptr},
-             {"create old --type vitec --lines -1 --samples 5 --overwrite", 2, nullptr},
              {"create old.xyz --lines 5 --samples 5", 2,
-              "old.xyz: .xyz tells no format that can be written; say --type (see imgfile create "
-              "--help)"},
+              "old.xyz: cannot write .xyz files; use --type (see imgfile create --help)"},
              {"create old --type vitec --lines -5 --samples 5 --overwrite", 2,
               "--lines: Value -5 not in range 0 to 2147483647 (see imgfile create --help)"},
              {"convert rgb.ppm old --format png --overwrite --window=", 2, nullptr},
              {"convert rgb.ppm old --format png --overwrite --band=", 2, nullptr},
-             {"check -", 2, "check reads files alone (see imgfile check --help)"},
-             {"--quiet nonsense", 2, "there is no command nonsense (see imgfile --help)"},
+             {"check -", 2, "check cannot read standard input (see imgfile check --help)"},
+             {"--quiet nonsense", 2, "unknown command: nonsense (see imgfile --help)"},
              {"info junk", 1, nullptr},
              {"info empty", 1, "empty: is empty"},
-             {"--versio", 2, "there is no option --versio (see imgfile --help)"},
+             {"--versio", 2, "unknown option: --versio (see imgfile --help)"},
              {"compare rgb.ppm missing.img", 1, "missing.img: No such file or directory"},
-             {"nonsense", 2, "there is no command nonsense (see imgfile --help)"},
              {"", 2, "a command is required (see imgfile --help)"},
          }) {
         const auto before = files();
@@ -406,7 +389,7 @@ TEST_F(Tool, RefusesInOneLineAndLeavesTheTargetAsItWas)
     }
 }
 
-TEST_F(Tool, LeavesNothingWhereItsWorkCannotEnd)
+TEST_F(Tool, LeavesNothingWhenItFails)
 {
     expect_done("create a.img --lines 900 --samples 700 --bands 3 --pattern");
     for (const char *const name : {"b.img", "b.d", "b.ppm", "b.png", "b.tif"}) {
@@ -424,7 +407,7 @@ TEST_F(Tool, LeavesNothingWhereItsWorkCannotEnd)
                 "convert a.img c.png", [] {}, signal, delay);
             EXPECT_TRUE(end.status == 0 || end.status == -signal);
             EXPECT_TRUE(end.status != 0 || fs::exists("c.png"));
-            const bool is_there = fs::exists("c.png");  // ended right after its work
+            const bool is_there = fs::exists("c.png");  // the work may end before the signal
             EXPECT_TRUE(!is_there || run("compare a.img c.png").status == 0);
             fs::remove("c.png");
         }
@@ -445,7 +428,7 @@ TEST_F(Tool, LeavesNothingWhereItsWorkCannotEnd)
         }
 }
 
-TEST_F(Tool, TellsWhatFilesAre)
+TEST_F(Tool, DescribesFiles)
 {
     expect_done("create a.img --lines 100 --samples 70 --bands 2 --bytes 2 --tile 16x32");
     expect_done("create user@host.d --lines 3 --samples 5 --bands 4");
@@ -477,11 +460,11 @@ TEST_F(Tool, TellsWhatFilesAre)
     EXPECT_EQ(facts[2]["tile_size"], facts[0]["tile_size"]);
 
     write_content("a.img", content_of("a.img").substr(0, 1000));
-    EXPECT_NE(run("info a.img").out.find("1,000 bytes, CUT SHORT: 42,252 of 43,252 are missing"),
+    EXPECT_NE(run("info a.img").out.find("1,000 bytes, TRUNCATED: 42,252 of 43,252 are missing"),
               std::string::npos);
 }
 
-TEST_F(Tool, FindsWhatIsWrongWithFiles)
+TEST_F(Tool, FindsErrorsInFiles)
 {
     expect_done("create a.img --lines 64 --samples 40 --pattern --tile 8");
     expect_done("check a.img");
@@ -493,24 +476,24 @@ TEST_F(Tool, FindsWhatIsWrongWithFiles)
     };
     for (const auto &[at, byte, findings] : std::vector<damage>{
              {7, "\x6d", {"image_block_link is 109, not 108", "has a header that"}},
-             {12, "\x01", {"bytes 8 to 15, which are reserved, are not 0"}},
-             {17, "\x0c", {"create_date is no date: "}},
+             {12, "\x01", {"the reserved bytes 8 to 15 are not 0"}},
+             {17, "\x0c", {"create_date is not a date: "}},
              {32, "v", {"signature is not VITec"}},
              {115, "\x83", {"header_length is 131, not 132"}},
              {119, "\x01", {"total_length is 2561, not 2692"}},
              {139,
               "\x08",
               {"version is 8, not 7", "has a header that describes no readable image"}},
-             {151, "\x29", {"total_length is 2692, not 3204", "cut short: 512 of 3,316 bytes"}},
+             {151, "\x29", {"total_length is 2692, not 3204", "truncated: 512 of 3,316 bytes"}},
              {159, "\x07", {"tile_nsamps is 7, neither 0 nor a power of two from 8 to 32768"}},
              {159,
               "",
               {"only one of tile_nlines and tile_nsamps is 0: the image is untiled, but padded"}},
              {167, "", {"band_flag is 0, not 1"}},
-             {171, "\x05", {"nbands is 5, not 0 to 3", "cut short: 10,240 of "}},
+             {171, "\x05", {"nbands is 5, not 0 to 3", "truncated: 10,240 of "}},
              {175,
               "\x03",
-              {"nbytes_code says 4 bytes per sample, not 1 or 2", "has a header that"}},
+              {"nbytes_code states 4 bytes per sample, not 1 or 2", "has a header that"}},
              {148, "\xff", {"nsamps is -16777176", "has a header that"}},
          }) {
         std::string damaged = whole;
@@ -524,7 +507,7 @@ TEST_F(Tool, FindsWhatIsWrongWithFiles)
                 << end.out;
     }
     write_content("a.img", whole + "more");
-    EXPECT_EQ(run("check a.img").out, "a.img: 4 bytes more than the header asks for\n");
+    EXPECT_EQ(run("check a.img").out, "a.img: 4 bytes more than the header states\n");
     write_content("a.img", whole.substr(0, 244 + 5 * 64 * 3) +
                                std::string(whole.size() - 244 - 5 * 64 * 3, '\0'));
     EXPECT_EQ(run("check a.img").out, "a.img: band 0 is 0 from line 24 on, of 64\n");
@@ -533,12 +516,105 @@ TEST_F(Tool, FindsWhatIsWrongWithFiles)
     EXPECT_NE(run("check b.img").out.find("samples beyond 12 bits\n"), std::string::npos);
     expect_done("check b.pgm");
     write_content("c.pgm", content_of("b.pgm") + "more");
-    EXPECT_EQ(run("check c.pgm").out, "c.pgm: 4 bytes more than the header asks for\n");
+    EXPECT_EQ(run("check c.pgm").out, "c.pgm: 4 bytes more than the header states\n");
     fs::create_symlink("loop", "loop");
     const finished none = run("check missing loop b.pgm");
     EXPECT_EQ(none.status, 1);
     EXPECT_EQ(none.err, "imgfile: missing: No such file or directory\n"
                         "imgfile: loop: Too many levels of symbolic links\n");
+}
+
+struct golden_file {
+    const char *name, *facts;  // facts: part of the output of info
+    int nlines, nsamps, nbands, nbytes;
+    std::vector<std::string> findings;
+};
+
+// data/README.md describes the files and states the formula of their samples.
+picture golden_picture(const golden_file &golden)
+{
+    picture made{golden.nlines, golden.nsamps, golden.nbands, golden.nbytes, {}};
+    for (int line = 0; line < golden.nlines; ++line)
+        for (int samp = 0; samp < golden.nsamps; ++samp)
+            for (int band = 0; band < golden.nbands; ++band)
+                made.samples.push_back(golden.nbytes == 1
+                                           ? (band * 101 + line * 31 + samp * 7) % 251
+                                           : (band * 501 + line * 13 + samp * 3) % 4096);
+    return made;
+}
+
+TEST_F(Tool, ReadsFilesMadeOutsideThisCode)
+{
+    const std::vector<golden_file> list{
+        {"untiled_8bit.img",
+         "big-endian\n  layout     band sequential\n  tiles      none\n  data at    byte 244\n",
+         37,
+         53,
+         1,
+         1,
+         {"signature is not VITec"}},
+        {"untiled_3bands_little.img",
+         "little-endian\n  layout     band sequential\n",
+         20,
+         31,
+         3,
+         1,
+         {}},
+        {"tiled_3bands.img",
+         "tiles of band planes\n  tiles      16 lines x 8 samples, 3 down x 7 across\n",
+         37,
+         53,
+         3,
+         1,
+         {}},
+        {"untiled_16bit.img", "2 bytes, 12 bits\n  order      big-endian\n", 29, 41, 1, 2, {}},
+        {"tiled_16bit_little.img", "8 lines x 32 samples, 4 down x 2 across\n", 29, 41, 2, 2, {}},
+        {"long_header.img",
+         "data at    byte 504\n",
+         9,
+         11,
+         1,
+         1,
+         {"image_block_link is 300, not 108", "header_length is 200, not 132"}},
+        {"helava_2bands.d",
+         "Helava\n  size       23 lines x 35 samples x 2 bands\n",
+         23,
+         35,
+         2,
+         1,
+         {}},
+        {"helava_little.d", "little-endian\n", 23, 35, 1, 1, {}},
+    };
+    for (const golden_file &golden : list) {
+        const std::string file = IMGFILE_TEST_DATA "/" + std::string(golden.name);
+        const picture source = golden_picture(golden);
+        const finished info = run("info " + file);
+        EXPECT_NE(info.out.find(golden.facts), std::string::npos) << info.out;
+        EXPECT_NE(info.out.find(" bytes, as the header states\n"), std::string::npos) << info.out;
+        const std::string found = run("check " + file).out;
+        for (const std::string &finding : golden.findings)
+            EXPECT_NE(found.find(finding), std::string::npos) << found;
+        for (int band = 0; band < golden.nbands; ++band) {
+            expect_done("convert " + file + " band.pgm --overwrite --band " + std::to_string(band));
+            EXPECT_EQ(content_of("band.pgm"), source.as_pnm({band})) << file;
+        }
+        const auto facts = nlohmann::json::parse(run("stats --json " + file).out);
+        const auto [low, high] = std::ranges::minmax(source.samples);
+        int least = high, most = low;
+        for (const auto &band : facts["bands"]) {
+            least = std::min<int>(least, band["minimum"]);
+            most = std::max<int>(most, band["maximum"]);
+        }
+        EXPECT_EQ(least, low) << file;
+        EXPECT_EQ(most, high) << file;
+    }
+    const std::string cut = IMGFILE_TEST_DATA "/cut_in_line_20.img";
+    EXPECT_NE(run("info " + cut).out.find("TRUNCATED: 884 of 2,205 are missing"),
+              std::string::npos);
+    EXPECT_EQ(run("convert " + cut + " cut.png").err,
+              "imgfile: " + cut + ": truncated: line 20 of band 0 is missing\n");
+    EXPECT_NE(run("check " + cut).out.find("truncated: line 20 of band 0 is missing\n"),
+              std::string::npos);
 }
 
 TEST_F(Tool, ComparesAndMeasuresSamples)
@@ -553,7 +629,7 @@ TEST_F(Tool, ComparesAndMeasuresSamples)
     write_content("b.ppm", source.as_pnm({0, 1, 2}));
     const finished end = run("compare a.img b.ppm");
     EXPECT_EQ(end.status, 1);
-    const int changed = source.at(7, 5, 2);
+    const int changed = source.sample(7, 5, 2);
     EXPECT_EQ(end.out,
               "a.img and b.ppm differ: 2 of 1,800 samples; first at line 7, sample 5, band 2: " +
                   std::to_string(changed ^ 64) + " and " + std::to_string(changed) +
@@ -593,13 +669,14 @@ TEST_F(Tool, ComparesAndMeasuresSamples)
     EXPECT_EQ(reduced[0]["samples"], 10);
     expect_done("convert p.png p.ppm");
     const std::string pixels = content_of("p.ppm");
-    const int mean =
-        (source.at(8, 4, 1) + source.at(8, 5, 1) + source.at(9, 4, 1) + source.at(9, 5, 1)) / 4;
+    const int mean = (source.sample(8, 4, 1) + source.sample(8, 5, 1) + source.sample(9, 4, 1) +
+                      source.sample(9, 5, 1)) /
+                     4;
     EXPECT_EQ(static_cast<unsigned char>(pixels[pixels.size() - 450 + (4 * 10 + 2) * 3 + 1]), mean);
 }
 
-#ifndef IMGFILE_SANITIZED  // which takes memory of its own
-TEST_F(Tool, TakesLittleMemoryForLargeImages)
+#ifndef IMGFILE_SANITIZED  // sanitizers use memory of their own
+TEST_F(Tool, UsesLittleMemoryForLargeImages)
 {
     expect_done("create line.img --lines 1 --samples 200000000");
     const char header[] = "\x89PNG\r\n\x1a\n\0\0\0\rIHDR\x7f\xff\xff\xff\0\0\0\1\x10\2\0\0\0\x7f"

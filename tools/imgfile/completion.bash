@@ -1,9 +1,9 @@
-# bash completion for imgfile: commands, their options, values of options, and files.
+# bash completion for imgfile: commands, options, values of options, and file names.
 _imgfile()
 {
     local word=${COMP_WORDS[COMP_CWORD]} previous=${COMP_WORDS[COMP_CWORD - 1]} command='' i
     local commands='info check convert preview stats compare create'
-    # --option=value comes in three words, the last of which may be missing.
+    # bash splits --option=value into three words; the value may be missing.
     if [[ $word == = ]]; then
         word=''
     elif [[ $previous == = ]]; then
