@@ -15,6 +15,7 @@
 #include <tiffio.h>
 
 #include <fcntl.h>
+#include <sys/inotify.h>
 #include <sys/resource.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
@@ -462,6 +463,50 @@ TEST_F(Tool, DescribesFiles)
     write_content("a.img", content_of("a.img").substr(0, 1000));
     EXPECT_NE(run("info a.img").out.find("1,000 bytes, TRUNCATED: 42,252 of 43,252 are missing"),
               std::string::npos);
+}
+
+// Counts how often a file is opened while an object lives.
+class open_counter {
+public:
+    explicit open_counter(const char *file) : m_notifications(::inotify_init1(IN_NONBLOCK))
+    {
+        // Equal events in a row come as one; reads and closes lie between two opens.
+        ::inotify_add_watch(m_notifications, file, IN_OPEN | IN_ACCESS | IN_CLOSE);
+    }
+    ~open_counter() { ::close(m_notifications); }
+    open_counter(const open_counter &) = delete;
+    open_counter &operator=(const open_counter &) = delete;
+    long count() const
+    {
+        std::array<inotify_event, 1000> events;
+        const ssize_t length = ::read(m_notifications, events.data(), sizeof events);
+        return std::count_if(events.begin(),
+                             events.begin() + std::max<ssize_t>(length, 0) /
+                                                  static_cast<ssize_t>(sizeof(inotify_event)),
+                             [](const inotify_event &event) { return event.mask == IN_OPEN; });
+    }
+
+private:
+    int m_notifications;
+};
+
+// Facts of one file come from one open: else a file replaced in between would mix them.
+TEST_F(Tool, OpensAFileOnce)
+{
+    expect_done("create a.img --lines 40 --samples 40 --tile 8 --bytes 2 --pattern");
+    expect_done("create b.d --lines 40 --samples 40 --pattern");
+    for (const char *const name : {"c.ppm", "c.png", "c.tif"})
+        expect_done(std::string("convert --band 0,0,0 a.img ") + name);
+    for (const std::string name : {"a.img", "b.d", "c.ppm", "c.png", "c.tif"})
+        for (const std::string &arguments :
+             {"info " + name, "info --json " + name, "check " + name, "stats " + name,
+              "stats --overwrite --histogram h.png " + name,
+              "preview --overwrite " + name + " p.png", "convert --overwrite " + name + " o.tif",
+              "convert --overwrite --stretch " + name + " o.tif"}) {
+            const open_counter opens(name.c_str());
+            run(arguments);
+            EXPECT_EQ(opens.count(), 1) << arguments;
+        }
 }
 
 TEST_F(Tool, FindsErrorsInFiles)
