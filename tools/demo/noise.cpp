@@ -35,8 +35,12 @@ double gradient_noise(double line, double samp, unsigned seed)
 double fractal_noise(double line, double samp, int noctaves, unsigned seed)
 {
     double sum = 0, strength = 0.5;
-    for (int octave = 0; octave < noctaves; ++octave, strength /= 2, line *= 2, samp *= 2)
+    for (int octave = 0; octave < noctaves; ++octave) {
         sum += strength * gradient_noise(line, samp, seed + static_cast<unsigned>(octave));
+        strength /= 2;
+        line *= 2;
+        samp *= 2;
+    }
     return sum;
 }
 

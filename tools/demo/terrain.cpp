@@ -121,9 +121,11 @@ field draw_rivers(int nlines, int nsamps, const field &height, const drainage &f
         if (flow.area[here] < 900 || height.values[here] < -12) continue;
         const std::size_t next = flow.receiver[here];
         const double radius = std::min(0.012 * std::sqrt(flow.area[here]), 4.5);
-        for (double t = 0; t < 1; t += 0.2)
+        for (int step = 0; step < 5; ++step) {
+            const double t = step * 0.2;
             stamp_disc(river, std::lerp(lines[here], lines[next], t),
                        std::lerp(samps[here], samps[next], t), radius);
+        }
     }
     return river;
 }

@@ -31,12 +31,13 @@ struct caption {
     color ink;
 };
 
-// A picture with a plot of values in [low, high] and counts in [0, top].
+// A picture with a plot of values in [0, high] and counts in [0, top].
 class plot {
 public:
-    plot(double low, double high, double top)
-        : m_surface(cairo_image_surface_create(CAIRO_FORMAT_RGB24, int(WIDTH), int(HEIGHT))),
-          m_cairo(cairo_create(m_surface)), m_low(low), m_high(high), m_top(top)
+    plot(std::int32_t high, double top)
+        : m_surface(cairo_image_surface_create(CAIRO_FORMAT_RGB24, static_cast<int>(WIDTH),
+                                               static_cast<int>(HEIGHT))),
+          m_cairo(cairo_create(m_surface)), m_high(high), m_top(top)
     {
         use({1, 1, 1});
         cairo_paint(m_cairo);
@@ -53,9 +54,12 @@ public:
     plot(const plot &) = delete;
     plot &operator=(const plot &) = delete;
 
-    double x(double value) const { return LEFT + (value - m_low) / (m_high - m_low) * PLOT_WIDTH; }
+    double x(std::int64_t value) const
+    {
+        return LEFT + static_cast<double>(value) / m_high * PLOT_WIDTH;
+    }
     // `share` of the plot's height, from 0 to 1.
-    double y(double share) const { return TOP + (1 - share) * PLOT_HEIGHT; }
+    static double y(double share) { return TOP + (1 - share) * PLOT_HEIGHT; }
 
     void use(color ink, double opacity = 1)
     {
@@ -89,19 +93,20 @@ public:
             left += write(each.text, left, 50, 0, 12) + 18;
         }
         use(dark);
-        const double step = rounded_step((m_high - m_low) / 8);
-        for (double value = std::ceil(m_low / step) * step; value <= m_high; value += step) {
+        const std::int64_t step = rounded_step(m_high / 8.0);
+        for (std::int64_t value = 0; value <= m_high; value += step) {
             use(faint);
             line(x(value), y(0), x(value), y(1), 1);
             use(dark);
-            write(grouped(static_cast<std::int64_t>(value)), x(value), y(0) + 18, 0.5, 12);
+            write(grouped(value), x(value), y(0) + 18, 0.5, 12);
         }
-        const double rise = rounded_step(m_top / 5);
-        for (double count = 0; count <= m_top; count += rise) {
+        const std::int64_t rise = rounded_step(m_top / 5);
+        for (std::int64_t count = 0; static_cast<double>(count) <= m_top; count += rise) {
+            const double height = y(static_cast<double>(count) / m_top);
             use(faint);
-            line(LEFT, y(count / m_top), LEFT + PLOT_WIDTH, y(count / m_top), 1);
+            line(LEFT, height, LEFT + PLOT_WIDTH, height, 1);
             use(dark);
-            write(grouped(static_cast<std::int64_t>(count)), LEFT - 8, y(count / m_top) + 4, 1, 12);
+            write(grouped(count), LEFT - 8, height + 4, 1, 12);
         }
         for (const int byte : {0, 64, 128, 192, 255})
             write(std::to_string(byte), LEFT + PLOT_WIDTH + 8, y(byte / 255.0) + 4, 0, 12);
@@ -111,10 +116,10 @@ public:
         line(LEFT, y(0), LEFT + PLOT_WIDTH, y(0), 1);
     }
 
-    void draw(const band_histogram &histogram, color bars, color curve, double bin)
+    void draw(const band_histogram &histogram, color bars, color curve, std::int32_t bin)
     {
-        cairo_move_to(m_cairo, x(m_low), y(0));
-        for (double first = m_low; first < m_high; first += bin) {
+        cairo_move_to(m_cairo, x(0), y(0));
+        for (std::int32_t first = 0; first < m_high; first += bin) {
             const double share = std::min(sum(histogram, first, bin) / m_top, 1.0);
             cairo_line_to(m_cairo, x(first), y(share));
             cairo_line_to(m_cairo, x(first + bin), y(share));
@@ -125,7 +130,7 @@ public:
         cairo_fill(m_cairo);
 
         const auto &table = histogram.stretch.table();
-        for (double value = m_low; value < m_high; value += bin) {
+        for (std::int32_t value = 0; value < m_high; value += bin) {
             const auto index = std::min(static_cast<std::size_t>(value), table.size() - 1);
             cairo_line_to(m_cairo, x(value), y(table[index] / 255.0));
         }
@@ -149,7 +154,7 @@ public:
     }
 
     // Samples with values in [first, first + bin).
-    static double sum(const band_histogram &histogram, double first, double bin)
+    static double sum(const band_histogram &histogram, std::int32_t first, std::int32_t bin)
     {
         const auto begin = static_cast<std::size_t>(first);
         const auto end = std::min(static_cast<std::size_t>(first + bin), histogram.counts.size());
@@ -161,12 +166,12 @@ public:
 
 private:
     // Returns the next number that is 1, 2 or 5 times a power of ten, at least 1.
-    static double rounded_step(double least)
+    static std::int64_t rounded_step(double least)
     {
         const double power = std::pow(10, std::floor(std::log10(std::max(least, 1.0))));
         for (const double factor : {1.0, 2.0, 5.0})
-            if (factor * power >= least) return factor * power;
-        return 10 * power;
+            if (factor * power >= least) return static_cast<std::int64_t>(factor * power);
+        return static_cast<std::int64_t>(10 * power);
     }
     void write_upright(const std::string &words, double text_x)
     {
@@ -179,7 +184,8 @@ private:
 
     cairo_surface_t *m_surface;
     cairo_t *m_cairo;
-    double m_low, m_high, m_top;
+    std::int32_t m_high;
+    double m_top;
 };
 
 // A name that is not UTF-8 cannot be drawn; its other bytes become "?".
@@ -213,7 +219,7 @@ std::string draw_histograms(const std::vector<band_histogram> &histograms, const
         for (std::int32_t first = 0; first < high; first += bin)
             top = std::max(
                 top, plot::sum(each, std::max(first, 1), first == 0 ? std::max(bin - 1, 0) : bin));
-    plot picture(0, high, top * 1.05);
+    plot picture(high, top * 1.05);
     const bool is_alone = histograms.size() == 1;
     const auto own = [](std::size_t i) { return colors.at(i % colors.size()); };
     std::vector<caption> captions;

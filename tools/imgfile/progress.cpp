@@ -28,7 +28,8 @@ void progress::add(std::int64_t bytes)
     m_shown = now;
     m_is_shown = true;
     const double taken = std::chrono::duration<double>(now - m_start).count();
-    const double done = static_cast<double>(m_done), total = static_cast<double>(m_total);
+    const auto done = static_cast<double>(m_done);
+    const auto total = static_cast<double>(m_total);
     std::fprintf(stderr, "\r\033[K%3.0f %%  %.0f MB/s  %.0f s left", 100 * done / total,
                  done / taken / 1e6, taken / done * (total - done));
 }

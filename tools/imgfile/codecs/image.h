@@ -27,6 +27,10 @@ struct shape {
     std::int32_t nbits;   // stated for a sample: 8, 12 in VITec files of 2 bytes, up to 16
     std::int64_t nsamples() const { return std::int64_t{nlines} * nsamps * nbands; }
     std::int64_t bytes() const { return nsamples() * nbytes; }
+    std::size_t pixel_size() const  // in bytes
+    {
+        return static_cast<std::size_t>(nbands) * static_cast<std::size_t>(nbytes);
+    }
     std::int32_t highest() const { return (1 << nbits) - 1; }
     window whole() const { return {0, 0, nlines, nsamps}; }
 };

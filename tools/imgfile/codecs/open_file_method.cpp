@@ -83,8 +83,8 @@ constexpr std::int32_t LARGEST_LOAN = 9 << 20;
 
 // Reads the bytes into a buffer by one call and lends that: the ordinary calls would read line by
 // line.
-std::int32_t lend_buffer(std::int32_t fd, std::int32_t offset, std::int32_t count, img_io_use_fn use,
-                       void *arg)
+std::int32_t lend_buffer(std::int32_t fd, std::int32_t offset, std::int32_t count,
+                         img_io_use_fn use, void *arg)
 {
     static const auto buffer = std::make_unique_for_overwrite<std::uint8_t[]>(LARGEST_LOAN);
     if (count < 1 || count > LARGEST_LOAN ||

@@ -54,7 +54,7 @@ public:
     void read(const window &part, const band_list &bands, block &samples) override
     {
         if (part.line < m_next) start();
-        const auto pixel = static_cast<std::size_t>(form.nbands * form.nbytes);
+        const std::size_t pixel = form.pixel_size();
         m_pixels.resize(static_cast<std::size_t>(form.nsamps) * pixel);
         for (std::int32_t line = m_next; line < part.line + part.nlines; ++line) {
             if (!guarded(m_failed, [this] { png_read_row(m_png, m_pixels.data(), nullptr); }))

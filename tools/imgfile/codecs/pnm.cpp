@@ -87,7 +87,7 @@ public:
             text(form.nbands == 3 ? "P6" : "P5", "\n", form.nsamps, " ", form.nlines, "\n",
                  form.nbytes == 2 ? HIGHEST_OF_TWO_BYTES : HIGHEST_BYTE, "\n");
         m_first = static_cast<std::int64_t>(header.size());
-        if (!in_order) out.reserve(finish());
+        if (!in_order) out.reserve(offset(m_form.nlines, 0));
         out.write(header.data(), header.size());
     }
 

@@ -217,7 +217,7 @@ private:
         constexpr std::int64_t at_once = std::int64_t{1} << 20U;  // bytes
         TIFF *const file = m_file.get();
         const std::int64_t before = line % m_strip_nlines;
-        const std::int64_t count = std::min<std::int64_t>(
+        const auto count = std::min<std::int64_t>(
             {most, m_strip_nlines - before, std::max<std::int64_t>(at_once / line_length, 1)});
         m_piece.resize(static_cast<std::size_t>(count * line_length));
         const std::uint32_t strip = TIFFComputeStrip(file, static_cast<std::uint32_t>(line), plane);
@@ -274,9 +274,9 @@ private:
         const std::int32_t last_line = part.line + part.nlines, last_samp = part.samp + part.nsamps;
         for_each_plane(bands, [&](std::uint16_t plane, std::int32_t nbands, const band_list &chosen,
                                   std::int32_t position) {
-            for (std::int64_t top = part.line / tiles.nlines * tiles.nlines; top < last_line;
+            for (std::int64_t top = part.line - part.line % tiles.nlines; top < last_line;
                  top += tiles.nlines)
-                for (std::int64_t left = part.samp / tiles.nsamps * tiles.nsamps; left < last_samp;
+                for (std::int64_t left = part.samp - part.samp % tiles.nsamps; left < last_samp;
                      left += tiles.nsamps) {
                     if (TIFFReadTile(m_file.get(), m_piece.data(), static_cast<std::uint32_t>(left),
                                      static_cast<std::uint32_t>(top), 0, plane) == -1 ||
@@ -303,7 +303,7 @@ private:
 
     std::size_t pixel_size(std::int32_t nbands) const
     {
-        return static_cast<std::size_t>(nbands * form.nbytes);
+        return static_cast<std::size_t>(nbands) * static_cast<std::size_t>(form.nbytes);
     }
 
     std::string m_message;  // the last one of libtiff; empty: none
@@ -354,7 +354,7 @@ public:
             const std::uint16_t unspecified = EXTRASAMPLE_UNSPECIFIED;
             if (TIFFSetField(m_file.get(), TIFFTAG_EXTRASAMPLES, 1, &unspecified) != 1) fail();
         }
-        m_pixel = static_cast<std::size_t>(form.nbands * form.nbytes);
+        m_pixel = form.pixel_size();
         if (tiling.nlines != 0) {
             in_order = false;
             whole_tiles = true;
