@@ -1,3 +1,4 @@
+// The colours of the ground, the light on it, and both pictures. Read scene.h and terrain.h first.
 #include "scene.h"
 
 #include "noise.h"
@@ -9,9 +10,9 @@
 
 namespace {
 
-constexpr int nlines = 1210, nsamps = 1530;  // no multiples of a tile size
+constexpr int nlines = 1210, nsamps = 1530;  // not multiples of a tile size
 
-// The part of the light that the ground sends back: red, green, blue, near infrared.
+// The share of light that the ground reflects: red, green, blue, near infrared.
 using colour = std::array<double, 4>;
 
 constexpr colour grass{0.30, 0.36, 0.17, 0.46}, forest{0.10, 0.17, 0.08, 0.34};
@@ -26,15 +27,17 @@ constexpr std::array<colour, 6> crops{{{0.66, 0.57, 0.33, 0.48},
                                        {0.56, 0.50, 0.28, 0.42},
                                        {0.18, 0.31, 0.12, 0.64}}};
 
-colour mix(const colour &from, const colour &to, double part)
+// Returns `first`, `second`, or a mixture; `part`: the share of `second`, 0 to 1.
+colour mix(const colour &first, const colour &second, double part)
 {
     colour result;
-    for (std::size_t i = 0; i < result.size(); ++i) result[i] = std::lerp(from[i], to[i], part);
+    for (std::size_t i = 0; i < result.size(); ++i)
+        result[i] = std::lerp(first[i], second[i], part);
     return result;
 }
 
-// Parcels of farmland: the cells of a turned, irregular grid, each with its crop and its furrows,
-// with hedges between them.
+// Returns the colour of farmland: parcels are the cells of a rotated, irregular grid, each with a
+// crop and furrows, and hedges lie between them.
 colour farmland(double line, double samp)
 {
     constexpr double size = 23;
@@ -59,7 +62,7 @@ colour farmland(double line, double samp)
 }
 
 struct ground {
-    explicit ground(const terrain &of) : land{of} {}
+    explicit ground(const terrain &shape) : land{shape} {}
     double height(int line, int samp) const
     {
         return land.height.at(std::clamp(line, 0, nlines - 1), std::clamp(samp, 0, nsamps - 1));
@@ -99,11 +102,11 @@ colour ground::cover(int line, int samp) const
     return mix(result, stream, land.river.at(line, samp));
 }
 
-// 0: in a shadow .. 1: level ground .. above: a slope that faces the sun, which stands in the
+// Returns 0 in a shadow, 1 on level ground, and more on a slope that faces the sun in the
 // north-west.
 double ground::sunlight(int line, int samp) const
 {
-    constexpr double rise = 0.72;  // height that the light loses per sample of its way
+    constexpr double rise = 0.72;  // height that the light loses per sample
     const double high = std::max(height(line, samp), 0.0);
     double shade = 0;
     for (int away = 2; away < 90; away += 3) {
@@ -116,7 +119,7 @@ double ground::sunlight(int line, int samp) const
     return std::max(facing, 0.0) * (1 - smooth_step(0, 4, shade));
 }
 
-// What the frame of the near-infrared sensor leaves of a point: it stands askew in the picture.
+// Whether a point lies in the frame of the near-infrared sensor, which is rotated in the picture.
 bool in_frame(int line, int samp)
 {
     const double y = line - nlines / 2.0, x = samp - nsamps / 2.0;
@@ -130,8 +133,8 @@ scene make_scene()
     const terrain land = make_terrain(nlines, nsamps);
     const ground view{land};
     scene result{picture{nlines, nsamps, 3, 255}, picture{nlines, nsamps, 1, 4095}};
-    // The light of the sun and of the sky in red, green and blue; what comes back is toned like
-    // film.
+    // The light of the sun and of the sky in red, green and blue. The reflected light is mapped to
+    // samples by a curve like that of film.
     constexpr std::array<double, 3> sun{1.16, 1.08, 0.98}, sky{0.22, 0.27, 0.36};
     for (int line = 0; line < nlines; ++line) {
         for (int samp = 0; samp < nsamps; ++samp) {

@@ -1,3 +1,5 @@
+// Heights eroded on a coarse grid, refined to samples, with rivers drawn along the drainage. Read
+// terrain.h first.
 #include "terrain.h"
 
 #include "noise.h"
@@ -11,13 +13,13 @@
 
 namespace {
 
-constexpr int cell = 3;     // samples per cell of the grid on which the water runs
-constexpr int margin = 32;  // cells of it above the picture and on its left: the watershed
+constexpr int cell = 3;     // samples per cell of the coarse grid
+constexpr int margin = 32;  // cells above the picture and on its left, from which water flows in
 
 struct drainage {
-    std::vector<std::size_t> order;     // cells, each after the one that it flows into
-    std::vector<std::size_t> receiver;  // per cell; the lake's deepest: itself
-    std::vector<double> area;           // per cell: the cells whose water passes it
+    std::vector<std::size_t> order;     // cells; each follows the cell that it flows into
+    std::vector<std::size_t> receiver;  // per cell: the next one downstream; the deepest has itself
+    std::vector<double> area;           // per cell: number of cells whose water passes it
 };
 
 // Signed distance from the shore of the lake in the lower right, positive on land; 1 is the width
@@ -28,8 +30,8 @@ double shore_distance(double y, double x)
            0.11 * fractal_noise(y * 4, x * 4, 5, 11);
 }
 
-// Lets water rise from the deepest cell over the land, lowest cells first: every cell is reached
-// from its lowest neighbour, and pits are filled on the way.
+// Floods the land from the deepest cell, lowest cells first: every cell is reached from its lowest
+// neighbour, and pits are filled.
 drainage drain(field &height)
 {
     const std::size_t ncells = height.values.size();
@@ -64,9 +66,9 @@ drainage drain(field &height)
     return flow;
 }
 
-// Lifts the land and lets the rivers cut into it, deeper where more water runs and where the rock
-// is softer; nothing stands steeper than loose rock. Each round lifts a little unevenly, so that
-// the rivers find courses off the grid's directions.
+// Lifts the land and cuts rivers into it, deeper where more water flows and where the rock is
+// softer. Slopes are limited to that of loose rock. Each round lifts unevenly, so that rivers do
+// not follow the directions of the grid.
 void erode(field &height, const field &uplift, const field &hardness, const drainage &flow,
            int round)
 {
@@ -98,8 +100,8 @@ void stamp_disc(field &river, double line, double samp, double radius)
     }
 }
 
-// Draws the courses that carry enough water. Each point is drawn towards the next one downstream,
-// so that the grid does not show.
+// Draws the rivers that carry enough water. Each point is moved towards the next one downstream, so
+// that the grid is not visible.
 field draw_rivers(int nlines, int nsamps, const field &height, const drainage &flow)
 {
     std::vector<double> lines(flow.order.size()), samps(flow.order.size());

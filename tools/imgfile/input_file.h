@@ -1,5 +1,5 @@
 // The file that a command reads. It is opened once; everything that the command says about it comes
-// from this one descriptor, even when the file is replaced meanwhile.
+// from this one descriptor, even when the file is replaced in the meantime.
 #ifndef TOOL_INPUT_FILE_H
 #define TOOL_INPUT_FILE_H
 

@@ -83,7 +83,7 @@ private:
         return last;
     }
 
-    // Names the first line of the file that cannot be read, whatever part was asked for. Tiled
+    // Names the first line of the file that cannot be read, not only of the window. Tiled
     // files hold their bands side by side, others one after the other.
     [[noreturn]] void fail(const window &part, std::int32_t failed_band)
     {
