@@ -5,7 +5,7 @@
 #include "img.h"
 #include "picture.h"
 
-#include "common/window.h"
+#include "common/image_window.h"
 
 #include <cstdint>
 #include <string>

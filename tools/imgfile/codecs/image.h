@@ -4,7 +4,7 @@
 
 #include "input_file.h"
 
-#include "common/window.h"
+#include "common/image_window.h"
 
 #include <cstddef>
 #include <cstdint>

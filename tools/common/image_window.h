@@ -1,6 +1,6 @@
 // A rectangular part of an image.
-#ifndef TOOLS_WINDOW_H
-#define TOOLS_WINDOW_H
+#ifndef TOOLS_IMAGE_WINDOW_H
+#define TOOLS_IMAGE_WINDOW_H
 
 #include <cstdint>
 
