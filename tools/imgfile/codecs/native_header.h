@@ -10,8 +10,8 @@
 #include <optional>
 #include <string>
 
-// Words in the host's order. At most one of both is there: a file that begins with a whole VITec
-// header is not looked at for a Helava trailer.
+// Words in the host's order. At most one is set: a file with a complete VITec header is not
+// searched for a Helava trailer.
 struct native_header {
     std::optional<img_vitec_blocks> vitec;
     std::optional<std::array<std::uint8_t, IMG_HELAVA_TRAILER_LENGTH>> helava;

@@ -8,8 +8,8 @@
 #include "base/img_desc.h"
 #include "imgfile/img.h"
 
-// An image of the library, closed when it goes out of scope. Its file has a descriptor, which
-// belongs to the caller and must live longer. The name of the file may hold any "@".
+// An image of the library, closed when it goes out of scope. The caller owns the descriptor of its
+// file and closes it later. The name of the file may contain "@".
 class native_image {
 public:
     // Opens for reading. Throws `failure` when the library refuses the file.
