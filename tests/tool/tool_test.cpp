@@ -545,6 +545,7 @@ TEST_F(Tool, FindsErrorsInFiles)
         damaged[at] = *byte;
         write_content("a.img", damaged);
         const finished end = run("check a.img");
+        EXPECT_EQ(end.err, "");
         EXPECT_EQ(end.status, 1) << at;
         for (const std::string &finding : findings)
             EXPECT_NE(end.out.find("a.img: " + finding), std::string::npos)

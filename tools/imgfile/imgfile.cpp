@@ -2,6 +2,7 @@
 // line; commands/commands.h lists what it calls.
 //
 // Exit status: 0 done; 1 the work failed, or a check or comparison found something; 2 wrong usage.
+#include "codecs/library_message.h"
 #include "commands/commands.h"
 #include "failure.h"
 #include "notes.h"
@@ -238,6 +239,7 @@ int run(int argc, char **argv)
 int main(int argc, char **argv)
 {
     take_standard_descriptors();
+    library_message::collect();
     std::signal(SIGPIPE, SIG_IGN);  // a closed pipe is an error like others
     std::signal(SIGXFSZ, SIG_IGN);
     const int status = run(argc, argv);

@@ -4,10 +4,10 @@
 
 #include <string>
 
-// The last system error that the library reported. Messages go nowhere else from the first use on.
+// The last system error that the library reported.
 class library_message {
 public:
-    static void collect();  // from now on
+    static void collect();  // from now on, the library prints nothing
     static void forget();
     // Returns the system's text for the last error since forget(); `otherwise` if there was none.
     static std::string reason(const std::string &otherwise);

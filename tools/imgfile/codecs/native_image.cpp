@@ -2,7 +2,6 @@
 // native_image.h, api/open.h and codecs/open_file_method.h first.
 #include "codecs/native_image.h"
 
-#include "codecs/library_message.h"
 #include "codecs/native_header.h"
 #include "codecs/open_file_method.h"
 #include "failure.h"
@@ -27,7 +26,6 @@ std::int64_t padded(std::int32_t extent, std::int32_t tile_extent)
 
 native_image::native_image(int fd, const std::string &name)
 {
-    library_message::collect();
     const offered_descriptor offer(fd);
     m_handle = img_open_plain_file(name.c_str(), &plain_method(), IMG_OPEN_READ_ONLY);
     if (m_handle != -1 && img_is_tiled(&desc()) && img_plane_size(&desc()) > LARGEST_TILE) {
@@ -44,7 +42,6 @@ native_image::native_image(int fd, const std::string &name)
 native_image::native_image(int fd, const std::string &path, const std::string &shown,
                            std::int32_t type, const shape &form, tile_size tiles)
 {
-    library_message::collect();
     const offered_descriptor offer(fd);
     const std::int64_t length =
         padded(form.nlines, tiles.nlines) * padded(form.nsamps, tiles.nsamps);
