@@ -1,3 +1,4 @@
+// Tests of std_offset.cpp: where samples lie.
 #include "base/image_table.h"
 #include "base/img_desc.h"
 #include "imgfile/img.h"

@@ -1,9 +1,10 @@
 #!/bin/sh
-# packages.sh CPACK BUILD SOURCE CC: makes the Debian packages of a build tree, twice, and looks at them
+# debian_packages.sh CPACK BUILD SOURCE CC: makes the Debian packages of a build tree, twice, and looks at them
 # as their users will: what they ask for, what is in them, whether man finds every function, and a
 # host and the program of the unpacked tree at work.
 # shellcheck disable=SC2016 # dpkg-deb puts the fields in
 set -eu
+. "$(dirname "$0")/expect.sh"
 cpack=$1 build=$2 source=$3 cc=$4
 
 scratch=$(mktemp -d)
@@ -11,12 +12,6 @@ trap 'rm -rf "$scratch"' EXIT
 cd "$scratch"
 export LC_ALL=C.UTF-8 SOURCE_DATE_EPOCH=1700000000
 
-failed=0
-expect() {  # WHAT EXPECTED FOUND
-    [ "$2" = "$3" ] && return
-    printf '%s\n  expected: %s\n  found:    %s\n' "$1" "$2" "$3"
-    failed=1
-}
 
 for folder in once again; do
     "$cpack" --config "$build/CPackConfig.cmake" -B "$scratch/$folder" >log 2>&1 || { cat log; exit 1; }
