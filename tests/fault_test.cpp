@@ -237,9 +237,13 @@ private:
     }
     // The first call that did not do what was asked ends a transfer, with a line that tells it. A
     // write may meet the end of the file where it looks at what is there.
-    void expect_told(const std::string &text, bool done, bool writing, bool looks)
+    void expect_told(std::string text, bool done, bool writing, bool looks)
     {
         if (is_short_of_memory()) return;
+        // Lines that virtual tiles look for in vain are reported, whatever becomes of the write.
+        const std::string missed = WORDINGS[IMG_LAYOUT_BSQ].read;
+        while (writing && m_image.virtual_nlines != 0 && text.starts_with(missed))
+            text.erase(0, text.find('\n') + 1);
         const auto bad = std::ranges::find_if(
             m_bad_calls, [=](const bad_call &each) { return each.planned || !writing; });
         if (bad == m_bad_calls.end())

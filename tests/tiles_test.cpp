@@ -117,7 +117,7 @@ TEST_F(Tiles, OfATypeWithItsOwnOperationsAreMovedByThose)
         ++calls;
         return img_std_write_tiles(arguments...);
     };
-    const img_handle image = open_test_file(m_file, IMG_OPEN_READ_WRITE);
+    const img_handle image = opening(m_file).result;
     bytes buffer(64);
     for (const transfer &window :
          {transfer{.nlines = 8, .nsamps = 8}, {.nlines = 2, .nsamps = 3}}) {
