@@ -1,8 +1,6 @@
 // Tests of chain_links.cpp and chain.cpp: adding and removing links.
 #include "support/chain_fixture.h"
 
-namespace {
-
 TEST_F(Chain, FreesWhatItsLinksOwn)  // and nothing twice: the leak checker counts
 {
     for (const bool by_reset : {false, true}) {
@@ -57,5 +55,3 @@ TEST_F(Chain, RefusesLinksThatCannotWork)
     EXPECT_EQ(img_chain_add_remap_link(image, 0, 8, nullptr, nullptr, nullptr), -1);
     expect_no_links();
 }
-
-}  // namespace

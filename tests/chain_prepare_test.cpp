@@ -3,8 +3,6 @@
 
 #include <numeric>
 
-namespace {
-
 TEST_F(Chain, GivesBuffersToLinksThatChangeTheDefinition)
 {
     enum { ALLOC, FINAL, PLACE, KEEP = 4, FREE };
@@ -53,5 +51,3 @@ TEST_F(Chain, KeepsTheStatedWidthOfALinkInPlace)
     EXPECT_EQ(load(), 0);
     EXPECT_EQ((std::pair{buffer[0], buffer[1]}), (std::pair<std::uint8_t, std::uint8_t>{250, 6}));
 }
-
-}  // namespace

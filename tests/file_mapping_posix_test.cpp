@@ -8,8 +8,6 @@
 #include <sys/prctl.h>
 #include <sys/wait.h>
 
-namespace {
-
 TEST_F(Lending, GivesWhatTheFileHasNow)
 {
     for (const std::int32_t oflags : {0, 2}) {
@@ -183,5 +181,3 @@ TEST_F(Lending, DeliversExactWindowsOrFailsWhileAFileIsTruncated)
         img_closefile(handle);
     }
 }
-
-}  // namespace

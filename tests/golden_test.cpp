@@ -6,6 +6,8 @@
 #include "support/sample.h"
 #include "support/stretch_model.h"
 
+#include <numeric>
+
 namespace {
 
 struct golden_file {
@@ -58,25 +60,22 @@ TEST_P(Golden, IsReadAsItWasMade)
     EXPECT_EQ(desc->std_file->data_offset, data_offset);
     const bool exchanged = little_endian != IS_LITTLE_ENDIAN;
     for (std::int32_t band = 0; band < image.nbands; ++band)
-        for (const transfer &at : {transfer{band, 0, 0, image.nlines, image.nsamps},
-                                   {band, image.nlines - 2, 3, 2, image.nsamps - 3},
-                                   {band, 5, 7, 3, 2}}) {
-            const auto samples_in = static_cast<std::size_t>(at.nlines * at.nsamps);
-            bytes raw(samples_in * static_cast<std::size_t>(image.nbytes)), delivered(samples_in);
+        for (const transfer &at :
+             {transfer{band, 0, 0, image.nlines, image.nsamps}, {band, 5, 7, 3, 2}}) {
+            const auto count = static_cast<std::size_t>(at.nlines * at.nsamps);
+            bytes raw(count * static_cast<std::size_t>(image.nbytes)), delivered(count);
             EXPECT_EQ(img_type_of(desc).read(desc, at.line, at.samp, at.nlines, at.nsamps, band,
                                              raw.data(), at.nsamps),
                       0);
             expect_samples(at, raw);
             EXPECT_EQ(load(handle, at, delivered.data()), 0);
-            if (image.nbytes == 1) {
-                EXPECT_EQ(delivered, raw);
-                continue;
-            }
-            samples window;
-            for (std::size_t i = 0; i < raw.size(); i += 2)
-                window.push_back(get_sample(&raw[i], 2));
-            const samples lut = expected_stretch(window, at.nsamps, 0, 12, 8);
-            for (std::size_t i = 0; i < window.size(); ++i) ASSERT_EQ(delivered[i], lut[window[i]]);
+            samples window, identity(256);
+            std::iota(identity.begin(), identity.end(), std::uint16_t{0});
+            for (std::size_t i = 0; i < count; ++i)
+                window.push_back(get_sample(&raw[i * raw.size() / count], image.nbytes));
+            const samples lut =
+                image.nbytes == 1 ? identity : expected_stretch(window, at.nsamps, 0, 12, 8);
+            for (std::size_t i = 0; i < count; ++i) ASSERT_EQ(delivered[i], lut[window[i]]);
         }
     const tile_grid grid = tiles_of(image);
     for (std::int32_t tile = 0; tile < grid.across * grid.down * image.nbands; ++tile) {

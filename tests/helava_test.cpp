@@ -2,8 +2,6 @@
 #include "std/std.h"
 #include "support/file_test.h"
 
-namespace {
-
 using Helava = FileTest;
 
 TEST_F(Helava, FilesAreSamplesAndATrailer)
@@ -25,5 +23,3 @@ TEST_F(Helava, FilesAreSamplesAndATrailer)
     EXPECT_EQ(creating(m_name, IMG_TYPE_HELAVA, {.nbytes = 2}).result, -1);
     EXPECT_EQ(read_file(m_file), bytes{});  // of what is refused nothing is left
 }
-
-}  // namespace

@@ -1,8 +1,6 @@
 // Tests of image_table.cpp and id_pool.cpp: the handles of open images.
 #include "support/file_test.h"
 
-namespace {
-
 using Handles = FileTest;
 
 TEST_F(Handles, NumberSixtyImagesFromTheLowestAndReuseTheLastReturned)
@@ -19,5 +17,3 @@ TEST_F(Handles, NumberSixtyImagesFromTheLowestAndReuseTheLastReturned)
     }
     img_pool_give_back(img_handle_pool, 7);  // of which none was taken
 }
-
-}  // namespace

@@ -6,8 +6,6 @@
 #include "io/io_method.h"
 #include "support/file_test.h"
 
-namespace {
-
 TEST(Library, StartsWithTheFirstOpen)
 {
     if (img_io_method_count != 0) GTEST_SKIP() << "the library is in use: not the first test";
@@ -41,5 +39,3 @@ TEST_F(CleanUp, LeavesOpenImagesAloneAndNoHandleForOthers)
     EXPECT_EQ(img_closefile(handle), 0);
     EXPECT_EQ(read_file(m_file)[1], 9);
 }
-
-}  // namespace

@@ -4,8 +4,6 @@
 #include "chain/chain.h"
 #include "support/file_test.h"
 
-namespace {
-
 using Limits = FileTest;
 
 TEST_F(Limits, HoldForTheMemoryOfACall)
@@ -96,5 +94,3 @@ TEST_F(Limits, LetTwoImagesOfOneFileSeeAndKeepWhatTheOtherWrote)
         EXPECT_EQ(bytes(file.begin() + VITEC_HEADER, file.end()), expected);
     }
 }
-
-}  // namespace

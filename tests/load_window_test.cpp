@@ -6,8 +6,6 @@
 #include "support/sample.h"
 #include "support/stretch_model.h"
 
-namespace {
-
 using Windows = FileTest;
 
 TEST_F(Windows, AreCheckedByHandleModeStrideAndBandInThisOrder)
@@ -102,5 +100,3 @@ TEST_F(Windows, OfTwoByteImagesAreStretchedInEveryPlace)
         img_closefile(handle);
     }
 }
-
-}  // namespace

@@ -2,8 +2,6 @@
 #include "io/local_time.h"
 #include "support/file_test.h"
 
-namespace {
-
 using LocalTime = FileTest;
 
 TEST_F(LocalTime, IsStoredInFilesIfItIsKnown)
@@ -21,5 +19,3 @@ TEST_F(LocalTime, IsStoredInFilesIfItIsKnown)
     ::setenv("TZ", "EST-7", 1);
     EXPECT_NE(img_local_time(), date);
 }
-
-}  // namespace

@@ -9,8 +9,6 @@
 
 #include <sys/stat.h>
 
-namespace {
-
 using Open = FileTest;
 using Create = FileTest;
 
@@ -130,5 +128,3 @@ TEST_F(Open, GivesImagesOfOneByteIdentityTablesAndThoseOfTwoTheStretch)
         EXPECT_EQ(std::to_string(seen.result) + seen.text, "-1" + text);
     }
 }
-
-}  // namespace

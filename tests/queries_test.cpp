@@ -2,8 +2,6 @@
 #include "api/open.h"
 #include "support/file_test.h"
 
-namespace {
-
 using Queries = FileTest;
 
 TEST_F(Queries, RefuseHandlesThatNameNoImageAndStoreNothing)
@@ -44,5 +42,3 @@ TEST_F(Queries, FindNoTypeInAFreshRecordAndCountMergedBandsAsOne)
     EXPECT_EQ(img_query_num_bands(handle), 1);
     img_release_image(handle, 0);
 }
-
-}  // namespace

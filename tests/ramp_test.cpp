@@ -11,8 +11,6 @@
 
 #include <gtest/gtest.h>
 
-namespace {
-
 TEST(Ramps, MapAsTheTableDoes)
 {
     random_numbers random(1);
@@ -52,5 +50,3 @@ TEST(Ramps, MapAsTheTableDoes)
     EXPECT_GT(ramps, tables / 4);
     EXPECT_LT(ramps, tables);
 }
-
-}  // namespace

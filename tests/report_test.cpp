@@ -2,8 +2,6 @@
 #include "base/report.h"
 #include "support/file_test.h"
 
-namespace {
-
 using Messages = FileTest;
 
 TEST_F(Messages, GoToTheSinkThatIsSet)
@@ -22,5 +20,3 @@ TEST_F(Messages, GoToTheSinkThatIsSet)
     EXPECT_EQ(told[2], std::pair(std::string("img_std_read_tiles:read"), 5));
     EXPECT_EQ(told[3], std::pair(std::string(511, 'x'), 0));
 }
-
-}  // namespace

@@ -6,8 +6,6 @@
 #include <gtest/gtest.h>
 #include <vector>
 
-namespace {
-
 TEST(Scratch, KeepsALittleOfWhatWasTaken)
 {
     constexpr std::size_t page = IMG_SCRATCH_ALIGNMENT, limit = IMG_SCRATCH_LIMIT;
@@ -34,5 +32,3 @@ TEST(Scratch, KeepsALittleOfWhatWasTaken)
     img_mgr_cleanup();
     EXPECT_EQ(fresh_bytes({1}), page);
 }
-
-}  // namespace

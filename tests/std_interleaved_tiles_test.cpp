@@ -4,8 +4,6 @@
 
 #include <gtest/gtest.h>
 
-namespace {
-
 TEST(InterleavedTiles, FollowTheBandMapAndSkipMissingPlanes)
 {
     const bytes tile{1, 2, 3, 4, 5, 6, 7, 8, 9, 10, 11, 12};
@@ -16,5 +14,3 @@ TEST(InterleavedTiles, FollowTheBandMapAndSkipMissingPlanes)
     EXPECT_EQ(merged, (bytes{1, 2, 3, 4, 77, 77, 7, 8, 9, 10, 77, 77}));
     EXPECT_EQ(band0, (bytes{3, 4, 9, 10}));
 }
-
-}  // namespace

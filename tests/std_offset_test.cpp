@@ -10,8 +10,6 @@
 
 #include <gtest/gtest.h>
 
-namespace {
-
 TEST(SampleOffset, FollowsTheLayoutRulesOrIsRefused)
 {
     constexpr std::int32_t max = INT32_MAX;
@@ -61,5 +59,3 @@ TEST(SampleOffset, FollowsTheLayoutRulesOrIsRefused)
         img_closefile(desc->handle);
     }
 }
-
-}  // namespace

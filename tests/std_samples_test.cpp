@@ -6,8 +6,6 @@
 
 #include <gtest/gtest.h>
 
-namespace {
-
 TEST(CopyingRows, MovesSampleAfterSample)
 {
     random_numbers random(1);
@@ -31,5 +29,3 @@ TEST(CopyingRows, MovesSampleAfterSample)
         ASSERT_EQ(to, expected);
     }
 }
-
-}  // namespace

@@ -3,8 +3,6 @@
 #include "std/std_virtual_tiles.h"
 #include "support/file_test.h"
 
-namespace {
-
 using VirtualTiles = FileTest;
 
 TEST_F(VirtualTiles, StopAtTheFirstFailure)
@@ -23,5 +21,3 @@ TEST_F(VirtualTiles, StopAtTheFirstFailure)
     EXPECT_EQ(calls_of(io_call::write), 1);
     img_closefile(desc->handle);
 }
-
-}  // namespace

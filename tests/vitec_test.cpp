@@ -6,8 +6,6 @@
 
 #include <ctime>
 
-namespace {
-
 using Vitec = FileTest;
 
 TEST_F(Vitec, HeaderIsWrittenToTheByte)
@@ -82,5 +80,3 @@ TEST_F(Vitec, HeaderMayBeginAnywhere)  // the first one here in its first block
     EXPECT_EQ(desc->std_file->data_offset, magic);
     img_closefile(desc->handle);
 }
-
-}  // namespace
