@@ -10,7 +10,7 @@ complain() {
 }
 
 for name in $(find src include tests tools examples fuzz bench cmake scripts -type f \
-    -name '*.[ch]*' ! -name CMakeLists.txt -o -name '*.sh' | sed 's|.*/||' | sort | uniq -d); do
+    \( -name '*.cpp' -o -name '*.[ch]' -o -name '*.sh' -o -name '*.cmake' \) | sed 's|.*/||' | sort | uniq -d); do
     complain "more than one file is named $name"
 done
 for source in src/*/*.cpp; do

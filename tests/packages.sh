@@ -1,5 +1,5 @@
 #!/bin/sh
-# debian_packages.sh CPACK BUILD SOURCE CC: makes the Debian packages of a build tree, twice, and looks at them
+# packages.sh CPACK BUILD SOURCE CC: makes the Debian packages of a build tree, twice, and looks at them
 # as their users will: what they ask for, what is in them, whether man finds every function, and a
 # host and the program of the unpacked tree at work.
 # shellcheck disable=SC2016 # dpkg-deb puts the fields in
