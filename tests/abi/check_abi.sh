@@ -1,9 +1,5 @@
 #!/bin/sh
-<<<<<<<< HEAD:tests/abi/check_abi.sh
 # check_abi.sh [--renew] DESCRIPTION LIBRARY HEADERS: holds the interface of LIBRARY, which has debug
-========
-# interface.sh [--renew] DESCRIPTION LIBRARY HEADERS: holds the interface of LIBRARY, which has debug
->>>>>>>> 42bba19 (Tests: one model of transfers, one record for windows and tiles, files named by source, golden files):tests/abi/interface.sh
 # information, against the stored description; with --renew, stores it anew. Symbols, parameter and
 # result types and constants count; that a pointer is to constant void does not.
 set -eu

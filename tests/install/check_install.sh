@@ -1,12 +1,7 @@
 #!/bin/sh
-<<<<<<<< HEAD:tests/install/check_install.sh
 # check_install.sh CMAKE GENERATOR BUILD VERSION CC [CFLAGS]: installs the build tree and moves the
 # installed tree. Then builds and runs a host with it, once through the CMake package and once through
 # pkg-config.
-========
-# installed.sh CMAKE GENERATOR BUILD CC [CFLAGS]: installs the build tree, moves the installed tree, and builds
-# and runs a host against it both ways: through the CMake package and through pkg-config.
->>>>>>>> 42bba19 (Tests: one model of transfers, one record for windows and tiles, files named by source, golden files):tests/install/installed.sh
 set -eu
 cmake=$1 generator=$2 build=$3 version=$4 cc=$5 cflags=${6:-}
 
