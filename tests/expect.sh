@@ -1,4 +1,4 @@
-# shellcheck shell=sh
+# shellcheck shell=sh disable=SC2034 # who sources it reads `failed`
 # expect.sh: for tests in shell, which source it. `failed` is 1 once an expectation was not met.
 failed=0
 expect() {  # WHAT EXPECTED FOUND

@@ -4,6 +4,7 @@
 # host and the program of the unpacked tree at work.
 # shellcheck disable=SC2016 # dpkg-deb puts the fields in
 set -eu
+# shellcheck source=/dev/null
 . "$(dirname "$0")/expect.sh"
 cpack=$1 build=$2 source=$3 cc=$4
 
@@ -101,4 +102,4 @@ expect 'version for pkg-config' "$version" "$(ask --modversion)"
     root/usr/share/doc/libimgfile-dev/examples/smallest_host.c -o host $(ask --libs)
 LD_LIBRARY_PATH=root/$libraries ./host >output
 diff -u "$source/examples/smallest_host.expected" output || failed=1
-exit "$failed"
+exit "${failed:?}"
