@@ -57,3 +57,30 @@ TEST_F(Chain, EndsTheLoadAtALinkThatFailsOrDoesNotFit)
     EXPECT_EQ(printed_by([this] { EXPECT_EQ(prepare(), nullptr); }),
               preparing + " output bits of image chain dont match output buffer!\n");
 }
+
+TEST_F(Chain, StaysInBoundsForAnyDefinition)
+{
+    img_buffer_def wide{3, 6, 0, 0, 7, 2, 12, 9}, negative{3, 5, 0, 0, 5, 2, -1, 9};
+    img_buffer_def as_stored{3, 5, 0, 0, 5, 2, 12, 9};
+    img_chain_add_remap_link(image, 2, 0, &as_stored, do_nothing, ask);
+    add_lut(3, 12, 12, false);
+    img_chain_add_remap_link(image, 5, 8, &negative, do_nothing, ask);
+    EXPECT_EQ(refusal([this] { return load(); }), "");  // no table can be brought to that width
+    img_chain_add_lut_create_link(image, 4, nullptr, fail_to_create, 9, 12, 8, 0, nullptr, 0);
+    EXPECT_EQ(refusal([this] { return load(); }), "");
+    img_chain_init(image);
+
+    add_lut(3, 12, 12, false);
+    img_chain_add_remap_link(image, 5, 31, nullptr, do_nothing, nullptr);
+    def.nbits = 31;
+    EXPECT_NE(prepare(), nullptr);
+    EXPECT_EQ(refusal(img_apply_img_chain, image),
+              perror_line("img_apply_img_chain:malloc LUT", ENOMEM));
+    img_chain_remove_link(image, 3);
+    img_chain_remove_link(image, 5);
+    img_chain_add_remap_link(image, 5, 12, &wide, do_nothing, ask);
+    def.nbits = 12;
+    def.nbytes = 2;
+    EXPECT_NE(prepare(), buffer.data());
+    EXPECT_EQ(img_chain_prepare_operations(59, buffer.data(), &def, &work_def), nullptr);
+}

@@ -121,18 +121,21 @@ TEST_F(Memory, ShortageFailsTheCallThatNeedsIt)
     const test_geometry lines{.nlines = 2, .nsamps = 8, .nbands = 2},
         deep{.nlines = 2, .nsamps = 8, .nbytes = 2};
     const test_geometry mixed{2, 8, 2, 1, 4, 2, IMG_LAYOUT_TILED_BIP};
+    const test_geometry pixels{2, 8, 2, 1, 0, 0, IMG_LAYOUT_BIP};
     const std::string other = m_file + "2@fault";
     const auto creates = [&] { return create(other, IMG_TYPE_VITEC, deep); };
-    const std::string read_run = no_memory("img_read_tiled:malloc");
-    const std::string write_run = no_memory("img_std_write_tiled:malloc");
+    const auto creates_helava = [&] { return create(other, IMG_TYPE_HELAVA, lines); };
     const std::string pre_read = no_memory("img_std_read_tiles:read");
     const std::set<std::string> creating{OUT_OF_MEMORY, could_not_create(other), NO_STRETCH,
                                          NO_TABLE + NO_STRETCH};
     const std::set<std::string> opening{OUT_OF_MEMORY, "", NO_STRETCH, NO_TABLE + NO_STRETCH};
     const std::vector<memory_case> cases = {
         {creates, creating},
+        {creates_helava, creating},
+        {opens, opening, lines, IMG_TYPE_HELAVA, 0, true},  // as another type sees it
+        {loads, {no_memory("img_std_read_nontiled_interleaved:malloc")}, pixels},
         {opens, opening, deep, IMG_TYPE_VITEC},
-        {loads, {read_run, ""}, mixed, TEST_TYPE, 1, true},
+        {loads, {no_memory("img_read_tiled:malloc"), ""}, mixed, TEST_TYPE, 1, true},
         {loads, {"", NO_HISTOGRAM}, deep, IMG_TYPE_VITEC},
         {loads_merged, {no_memory("img_load_buffer:malloc failed for merge buffer")}, lines},
         {loads_linked,
@@ -147,7 +150,12 @@ TEST_F(Memory, ShortageFailsTheCallThatNeedsIt)
          IMG_TYPE_VITEC,
          0,
          !IMG_WRITES_SWAPPED},
-        {dumps, {write_run, pre_read, OUT_OF_CACHE}, mixed, TEST_TYPE, 1, true},
+        {dumps,
+         {no_memory("img_std_write_tiled:malloc"), pre_read, OUT_OF_CACHE},
+         mixed,
+         TEST_TYPE,
+         1,
+         true},
         {dumps_tile, {"", pre_read}, mixed},
         {dumps_tile, {OUT_OF_CACHE}, mixed, TEST_TYPE, 1}};
     check_all(cases);
