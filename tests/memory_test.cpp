@@ -108,16 +108,6 @@ TEST_F(Memory, ShortageFailsTheCallThatNeedsIt)
         img_find_image(m_image)->merge_fn = [](auto...) { return 0; };
         return loads();
     };
-    std::vector<std::uint16_t> table(1 << 14);
-    const auto loads_linked = [&] {
-        img_chain_init(m_image);
-        const bool added =
-            img_chain_add_lut_create_link(m_image, 1, nullptr, img_chain_create_16to8_lut, 2, 13, 8,
-                                          0, nullptr, 0) == 0 &&
-            img_chain_add_lut_link(m_image, 4, 14, 13, 1, table.data(), 0) == 0 &&
-            img_chain_add_lut_link(m_image, 6, 13, 12, 1, table.data(), 0) == 0;
-        return added ? loads() : -1;
-    };
     const test_geometry lines{.nlines = 2, .nsamps = 8, .nbands = 2},
         deep{.nlines = 2, .nsamps = 8, .nbytes = 2};
     const test_geometry mixed{2, 8, 2, 1, 4, 2, IMG_LAYOUT_TILED_BIP};
@@ -138,11 +128,6 @@ TEST_F(Memory, ShortageFailsTheCallThatNeedsIt)
         {loads, {no_memory("img_read_tiled:malloc"), ""}, mixed, TEST_TYPE, 1, true},
         {loads, {"", NO_HISTOGRAM}, deep, IMG_TYPE_VITEC},
         {loads_merged, {no_memory("img_load_buffer:malloc failed for merge buffer")}, lines},
-        {loads_linked,
-         {"", NO_TABLE, NO_HISTOGRAM, no_memory("img_apply_img_chain:malloc LUT"),
-          "img_apply_img_chain: Error in IMG_CHAIN_REMAP_FCN\n"},
-         deep,
-         IMG_TYPE_VITEC},
         {loads_tile, {""}, mixed, TEST_TYPE, 1, true},
         {dumps,
          {no_memory("img_std_write_nontiled:malloc")},
@@ -159,6 +144,25 @@ TEST_F(Memory, ShortageFailsTheCallThatNeedsIt)
         {dumps_tile, {"", pre_read}, mixed},
         {dumps_tile, {OUT_OF_CACHE}, mixed, TEST_TYPE, 1}};
     check_all(cases);
+}
+
+TEST_F(Memory, ShortageFailsALoadThroughLinks)
+{
+    std::vector<std::uint16_t> table(1 << 14);
+    const auto loads_linked = [&] {
+        img_chain_init(m_image);
+        const bool added =
+            img_chain_add_lut_create_link(m_image, 1, nullptr, img_chain_create_16to8_lut, 2, 13, 8,
+                                          0, nullptr, 0) == 0 &&
+            img_chain_add_lut_link(m_image, 4, 14, 13, 1, table.data(), 0) == 0 &&
+            img_chain_add_lut_link(m_image, 6, 13, 12, 1, table.data(), 0) == 0;
+        return added ? load(m_image, {.samp = 4, .nlines = 2, .nsamps = 4}, m_buffer.data()) : -1;
+    };
+    check_all({{loads_linked,
+                {"", NO_TABLE, NO_HISTOGRAM, no_memory("img_apply_img_chain:malloc LUT"),
+                 "img_apply_img_chain: Error in IMG_CHAIN_REMAP_FCN\n"},
+                {.nlines = 2, .nsamps = 8, .nbytes = 2},
+                IMG_TYPE_VITEC}});
 }
 
 TEST_F(Memory, ShortageFailsWhatNeedsNoFile)
