@@ -4,7 +4,7 @@
 
 #include "input.h"
 #include "memory_disk.h"
-#include "support/layout_rules.h"
+#include "support/format_rules.h"
 
 // Ends the process after a message, so that the fuzzer keeps the input, unless `holds`.
 void require(bool holds, const char *what);
@@ -20,7 +20,7 @@ struct open_image {
     img_handle handle = -1;
     std::int32_t oflags = 0;
     std::string file{};  // on the disk, where a copy lies of one that is elsewhere; empty: not open
-    file_image in_file{};
+    file_model in_file{};
 };
 
 // In all that follows `next` is the handle that is to be given out, and `faulty` says that the

@@ -2,14 +2,10 @@
 # exports.sh LIBRARY HEADER NM READELF: holds the symbol table of the shared library against the
 # public header, and the libraries it needs against the runtimes.
 set -eu
+# shellcheck source=/dev/null
+. "$(dirname "$0")/expect.sh"
 library=$1 header=$2 nm=$3 readelf=$4
 
-failed=0
-expect() {  # WHAT EXPECTED FOUND
-    [ "$2" = "$3" ] && return
-    printf '%s\n  expected: %s\n  found:    %s\n' "$1" "$2" "$3"
-    failed=1
-}
 joined() { sort | tr '\n' ' '; }
 
 declared=$(sed -n 's/^IMG_EXPORT .*[ *]\(img_[a-z_]*\)(.*/\1/p' "$header" | joined)
@@ -25,4 +21,4 @@ expect 'needed beyond the runtimes' '' "$(echo "$dynamic" | sed -n 's/.*(NEEDED)
 # The library is built without exceptions: what throws when memory is short must not be called.
 expect 'calls that throw' '' "$("$nm" -D --undefined-only "$library" | awk '{ print $2 }' |
     grep -E '^(_Zn[wa][jm]|_ZSt[0-9]+__throw_.*|__cxa_throw)(@|$)' | joined)"
-exit "$failed"
+exit "${failed:?}"

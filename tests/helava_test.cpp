@@ -1,11 +1,6 @@
-#include "base/image_table.h"
-#include "base/img_desc.h"
-#include "imgfile/img.h"
+// Tests of helava.cpp: trailers to the byte.
 #include "std/std.h"
-
 #include "support/file_test.h"
-
-namespace {
 
 using Helava = FileTest;
 
@@ -21,10 +16,10 @@ TEST_F(Helava, FilesAreSamplesAndATrailer)
     EXPECT_EQ((std::array{desc.tile_nsamps, desc.layout, desc.swap, desc.std_file->data_offset}),
               (std::array{8, 0, 0, 0}));  // the tiles last until the file is closed
     const bytes line(100, 6);
-    EXPECT_EQ(img_dump_buffer(handle, 49, 0, 1, 100, 2, line.data(), 100, nullptr), 0);
+    EXPECT_EQ(dump(handle, {.band = 2, .line = 49, .nsamps = 100}, line.data()), 0);
     std::copy(line.begin(), line.end(), expected.end() - 116);
     img_closefile(handle);
     EXPECT_EQ(read_file(m_file), expected);
+    EXPECT_EQ(creating(m_name, IMG_TYPE_HELAVA, {.nbytes = 2}).result, -1);
+    EXPECT_EQ(read_file(m_file), bytes{});  // of what is refused nothing is left
 }
-
-}  // namespace

@@ -1,3 +1,4 @@
+// Tests of io_method.cpp: the table of access methods, and the names that choose one.
 #include "base/img_desc.h"
 #include "io/io_default.h"
 #include "io/io_method.h"

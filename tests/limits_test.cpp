@@ -2,53 +2,52 @@
 // images of one file.
 #include "base/scratch.h"
 #include "chain/chain.h"
-#include "imgfile/img.h"
-#include "support/fault_memory.h"
 #include "support/file_test.h"
-
-#include <bit>
-
-namespace {
 
 using Limits = FileTest;
 
-TEST_F(Limits, MemoryOfACall)
+TEST_F(Limits, HoldForTheMemoryOfACall)
 {
     // Working memory comes in powers of two and whole pages.
     const auto block = [](std::size_t size) { return std::bit_ceil(size | 4095U); };
     constexpr std::size_t kib = 1024;
+    const test_geometry one{.nlines = 400, .nsamps = 500},
+        two{.nlines = 400, .nsamps = 500, .nbytes = 2};
+    test_geometry tiled = one, deep_tiled = two;
+    tiled.tile_nsamps = tiled.tile_nlines = deep_tiled.tile_nsamps = deep_tiled.tile_nlines = 64;
+    deep_tiled.nbands = 3;
+    const transfer window{.line = 60, .samp = 60, .nlines = 30, .nsamps = 100};
     const struct {
         test_geometry image;
-        std::size_t open, load, dump;  // bytes at most; the window has 30 lines x 100 samples
+        std::size_t to_open, to_load,
+            to_dump;  // bytes at most; the window has 30 lines x 100 samples
     } cases[] = {
-        {{400, 500, 1, 1, 0, 0}, 2 * kib, 0, 0},
-        {{400, 500, 1, 2, 0, 0}, 12 * kib, block(30 * 100 * 2) + block(16 * kib), block(100 * 2)},
-        {{400, 500, 1, 1, 64, 64}, 2 * kib, block(3 * 64 * 64), block(3 * 64 * 64)},
-        {{400, 500, 3, 2, 64, 64},
-         12 * kib,
-         block(3 * 64 * 64 * 2) + block(30 * 100 * 2) + block(16 * kib),
+        {one, 2 * kib, 0, 0},
+        {two, 12 * kib, block(30 * 100 * 2) + block(16 * kib), block(100 * 2)},
+        {tiled, 2 * kib, block(3 * 64 * 64), block(3 * 64 * 64)},
+        {deep_tiled, 12 * kib, block(3 * 64 * 64 * 2) + block(30 * 100 * 2) + block(16 * kib),
          block(3 * 64 * 64 * 2)},
     };
     bytes buffer(64 * 64 * 2);  // a tile, or the window
-    for (const auto &[image, open, load, dump] : cases) {
+    for (const auto &[image, to_open, to_load, to_dump] : cases) {
         img_closefile(creating(m_name, IMG_TYPE_VITEC, image).result);
         img_free_scratch();
         memory_arm(0);
         const img_handle handle = opening(m_name).result;
-        EXPECT_LE(memory_requested(), open);
+        EXPECT_LE(memory_requested(), to_open);
         memory_arm(0);
-        EXPECT_EQ(img_load_buffer(handle, 60, 60, 30, 100, 0, buffer.data(), 100, nullptr), 0);
-        EXPECT_LE(memory_requested(), load);
+        EXPECT_EQ(load(handle, window, buffer.data()), 0);
+        EXPECT_LE(memory_requested(), to_load);
         img_free_scratch();
         memory_arm(0);
-        EXPECT_EQ(img_dump_buffer(handle, 60, 60, 30, 100, 0, buffer.data(), 100, nullptr), 0);
-        EXPECT_LE(memory_requested(), dump);
+        EXPECT_EQ(dump(handle, window, buffer.data()), 0);
+        EXPECT_LE(memory_requested(), to_dump);
         memory_arm(0);
-        EXPECT_EQ(img_load_tiles(handle, 0, 1, 0, buffer.data()), 0);
+        EXPECT_EQ(load(handle, {.tiles = true}, buffer.data()), 0);
         EXPECT_EQ(memory_requested(), 0U);
-        std::filesystem::resize_file(m_file, 244);
+        std::filesystem::resize_file(m_file, VITEC_HEADER);
         const stderr_capture quiet;
-        EXPECT_EQ(img_load_buffer(handle, 60, 60, 30, 100, 0, buffer.data(), 100, nullptr), -1);
+        EXPECT_EQ(load(handle, window, buffer.data()), -1);
         EXPECT_EQ(img_chain_of(handle).work_memory, nullptr);
         memory_arm(0);
         EXPECT_EQ(img_closefile(handle), 0);
@@ -56,25 +55,25 @@ TEST_F(Limits, MemoryOfACall)
     }
 }
 
-TEST_F(Limits, AnImageGoesOnWithTheFileThatWasOpened)
+TEST_F(Limits, KeepAnImageToTheFileThatWasOpened)
 {
     std::uint8_t sample = 1;
     const img_handle handle = creating(m_name, IMG_TYPE_VITEC, {}).result;
-    EXPECT_EQ(img_dump_buffer(handle, 0, 0, 1, 1, 0, &sample, 1, nullptr), 0);
-    const bytes other = vitec_file({}, 245);
+    EXPECT_EQ(dump(handle, {}, &sample), 0);
+    const bytes other = vitec_file({}, VITEC_HEADER + 1);
     write_file(m_folder / "other", other);
     std::filesystem::rename(m_folder / "other", m_file);
     for (const bool removed : {false, true}) {
         if (removed) std::filesystem::remove(m_file);
-        EXPECT_EQ(img_load_buffer(handle, 0, 0, 1, 1, 0, &sample, 1, nullptr), 0);
+        EXPECT_EQ(load(handle, {}, &sample), 0);
         EXPECT_EQ(sample, removed ? 2 : 1);
-        EXPECT_EQ(img_dump_buffer(handle, 0, 0, 1, 1, 0, &++sample, 1, nullptr), 0);
+        EXPECT_EQ(dump(handle, {}, &++sample), 0);
         EXPECT_TRUE(removed || read_file(m_file) == other);
     }
     EXPECT_EQ(img_closefile(handle), 0);
 }
 
-TEST_F(Limits, TwoImagesOfOneFileSeeAndKeepWhatTheOtherWroteElsewhere)
+TEST_F(Limits, LetTwoImagesOfOneFileSeeAndKeepWhatTheOtherWrote)
 {
     for (const std::int32_t tile : {0, 8}) {
         const img_handle first = creating(m_name, IMG_TYPE_VITEC, {48, 8, 1, 1, tile, tile}).result;
@@ -83,17 +82,15 @@ TEST_F(Limits, TwoImagesOfOneFileSeeAndKeepWhatTheOtherWroteElsewhere)
         for (const std::int32_t line : {16, 8, 40, 0}) {  // beyond the end of the file and within
             const img_handle writer = line % 16 == 0 ? first : second;
             bytes rows(8 * 8, static_cast<std::uint8_t>(line + 1)), seen(8 * 8);
-            EXPECT_EQ(img_dump_buffer(writer, line, 0, 8, 8, 0, rows.data(), 8, nullptr), 0);
+            EXPECT_EQ(dump(writer, {.line = line, .nlines = 8, .nsamps = 8}, rows.data()), 0);
             std::ranges::copy(rows, &expected[static_cast<std::size_t>(line * 8)]);
             for (const img_handle reader : {first, second})
-                EXPECT_EQ(img_load_buffer(reader, line, 0, 8, 8, 0, seen.data(), 8, nullptr), 0);
+                EXPECT_EQ(load(reader, {.line = line, .nlines = 8, .nsamps = 8}, seen.data()), 0);
             EXPECT_EQ(seen, rows);
         }
         img_closefile(first);
         img_closefile(second);
         const bytes file = read_file(m_file);
-        EXPECT_EQ(bytes(file.begin() + 244, file.end()), expected);
+        EXPECT_EQ(bytes(file.begin() + VITEC_HEADER, file.end()), expected);
     }
 }
-
-}  // namespace

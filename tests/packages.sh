@@ -4,6 +4,8 @@
 # host and the program of the unpacked tree at work.
 # shellcheck disable=SC2016 # dpkg-deb puts the fields in
 set -eu
+# shellcheck source=/dev/null
+. "$(dirname "$0")/expect.sh"
 cpack=$1 build=$2 source=$3 cc=$4
 
 scratch=$(mktemp -d)
@@ -11,12 +13,6 @@ trap 'rm -rf "$scratch"' EXIT
 cd "$scratch"
 export LC_ALL=C.UTF-8 SOURCE_DATE_EPOCH=1700000000
 
-failed=0
-expect() {  # WHAT EXPECTED FOUND
-    [ "$2" = "$3" ] && return
-    printf '%s\n  expected: %s\n  found:    %s\n' "$1" "$2" "$3"
-    failed=1
-}
 
 for folder in once again; do
     "$cpack" --config "$build/CPackConfig.cmake" -B "$scratch/$folder" >log 2>&1 || { cat log; exit 1; }
@@ -106,4 +102,4 @@ expect 'version for pkg-config' "$version" "$(ask --modversion)"
     root/usr/share/doc/libimgfile-dev/examples/smallest_host.c -o host $(ask --libs)
 LD_LIBRARY_PATH=root/$libraries ./host >output
 diff -u "$source/examples/smallest_host.expected" output || failed=1
-exit "$failed"
+exit "${failed:?}"

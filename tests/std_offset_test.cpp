@@ -1,3 +1,4 @@
+// Tests of std_offset.cpp: where samples lie.
 #include "base/image_table.h"
 #include "base/img_desc.h"
 #include "imgfile/img.h"
@@ -8,8 +9,6 @@
 #include "support/random.h"
 
 #include <gtest/gtest.h>
-
-namespace {
 
 TEST(SampleOffset, FollowsTheLayoutRulesOrIsRefused)
 {
@@ -60,5 +59,3 @@ TEST(SampleOffset, FollowsTheLayoutRulesOrIsRefused)
         img_closefile(desc->handle);
     }
 }
-
-}  // namespace

@@ -1,4 +1,4 @@
-// The contrast stretch against a second, plain computation.
+// Tests of stretch.cpp: the contrast stretch against a second, plain computation.
 #include "chain/chain.h"
 #include "chain/stretch.h"
 #include "support/effort.h"

@@ -109,12 +109,31 @@ std::int32_t fault_unlink(const char *filename)
     return goes_wrong(io_call::unlink) ? -1 : img_platform_unlink(filename);
 }
 
+std::int32_t refuse(std::int32_t, std::int32_t, std::int32_t count, img_io_use_fn use, void *arg)
+{
+    ++refused_loans();
+    if (count > 0)
+        use(arg, std::vector<std::uint8_t>(static_cast<std::size_t>(count), 0xEE).data());
+    return -1;
+}
+
 }  // namespace
 
 void fault_register()
 {
     img_register_io_method("fault", nullptr, fault_open, fault_close, fault_read, fault_write,
                            fault_seek, fault_unlink, nullptr);
+    img_register_io_method("refusing", nullptr, img_platform_open, img_platform_close,
+                           img_platform_read, img_platform_write, img_platform_seek,
+                           img_platform_unlink, nullptr);
+    img_allow_merging("refusing");
+    img_offer_lending("refusing", refuse);
+}
+
+int &refused_loans()
+{
+    static int count = 0;
+    return count;
 }
 
 void fault_arm(io_call call, int nth, fault what, bool lasting)

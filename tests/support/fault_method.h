@@ -1,4 +1,5 @@
-// The access method "fault": ordinary files whose nth call goes wrong.
+// The access method "fault": ordinary files whose nth call goes wrong; and "refusing", which lends
+// nothing.
 #ifndef IMG_TEST_FAULT_METHOD_H
 #define IMG_TEST_FAULT_METHOD_H
 
@@ -27,7 +28,7 @@ struct bad_call {
     bool grows = false;      // the write of one zero byte
 };
 
-// Registers the method; once per process, later calls do nothing.
+// Registers both; once per process, later calls do nothing.
 void fault_register();
 // Lets the `nth` call of that kind from now on go wrong, and every later one if `lasting`.
 // Counters start anew. nth 0: nothing goes wrong.
@@ -40,5 +41,9 @@ std::vector<bad_call> take_bad_calls();
 int calls_of(io_call call);
 // Descriptors that were opened and not closed since the process began.
 int open_descriptors();
+
+// Bytes on loan that the access method "refusing" was asked for; it has the ordinary files, hands
+// out wrong bytes, and says afterwards that they cannot be lent.
+int &refused_loans();
 
 #endif

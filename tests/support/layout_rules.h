@@ -1,15 +1,11 @@
-// Where samples lie behind the header and what reads of them deliver, said once more and without
-// the library.
+// Where samples lie behind the header, told once more and without the library.
 #ifndef IMG_TEST_LAYOUT_RULES_H
 #define IMG_TEST_LAYOUT_RULES_H
 
-#include "support/files.h"
 #include "support/test_image.h"
+#include "support/transfer.h"
 
 #include <algorithm>
-#include <bit>
-#include <cstddef>
-#include <utility>
 
 inline bool has_tiles(const test_geometry &image)
 {
@@ -30,8 +26,8 @@ inline std::int64_t stored_extent(std::int64_t extent, std::int64_t tile_extent)
 }
 
 // Bytes between the first pixel and a sample.
-inline std::size_t stored_at(const test_geometry &image, std::int64_t band, std::int64_t line,
-                             std::int64_t samp)
+inline std::int64_t stored_at(const test_geometry &image, std::int64_t band, std::int64_t line,
+                              std::int64_t samp)
 {
     const std::int64_t width = stored_extent(image.nsamps, image.tile_nsamps);
     const std::int64_t height = stored_extent(image.nlines, image.tile_nlines);
@@ -42,11 +38,13 @@ inline std::size_t stored_at(const test_geometry &image, std::int64_t band, std:
         pixel = line % image.tile_nlines * image.tile_nsamps + samp % image.tile_nsamps;
     }
     std::int64_t sample = band * width * height + tile * tile_plane + pixel;
+    if (image.layout == IMG_LAYOUT_TILED_BIP && image.nbands > 0)
+        band = (band + image.nbands - image.band_shift) % image.nbands;
     if (image.layout == IMG_LAYOUT_BIP || image.layout == IMG_LAYOUT_TILED_BIP)
         sample = (tile * tile_plane + pixel) * image.nbands + band;
     else if (image.layout == IMG_LAYOUT_TILED)
         sample = (tile * image.nbands + band) * tile_plane + pixel;
-    return static_cast<std::size_t>(sample * image.nbytes);
+    return sample * image.nbytes;
 }
 
 // Bytes of all pixels.
@@ -57,157 +55,64 @@ inline std::size_t stored_bytes(const test_geometry &image)
                                     image.nbytes);
 }
 
-// True when an image of that geometry, any numbers, may be opened and created: no size is
-// negative, samples have one byte or two, and every size and the end of the data fit 31 bits.
-inline bool is_within_limits(const test_geometry &image, std::int64_t data_offset)
+// The tiles that transfers count: those stored, or those that the cache gives to an untiled image.
+struct tile_grid {
+    std::int64_t height, width, across, down;
+};
+inline tile_grid tiles_of(const test_geometry &image)
 {
-    if (std::min({image.nlines, image.nsamps, image.nbands, image.tile_nsamps, image.tile_nlines}) <
-            0 ||
-        image.nbytes < 1 || image.nbytes > 2 || data_offset < 0)
-        return false;
-    // As floating-point numbers, products are exact or far too large, but never wrap.
-    const auto width = static_cast<double>(stored_extent(image.nsamps, image.tile_nsamps));
-    const auto height = static_cast<double>(stored_extent(image.nlines, image.tile_nlines));
-    const double plane = width * height * image.nbytes;
-    const double tile = static_cast<double>(image.tile_nsamps) * image.tile_nlines * image.nbytes;
-    const double end = static_cast<double>(data_offset) + plane * image.nbands;
-    return std::max({width, height, plane, tile, end}) <= INT32_MAX;
+    const std::int64_t height = has_tiles(image) ? image.tile_nlines : image.virtual_nlines;
+    const std::int64_t width = has_tiles(image) ? image.tile_nsamps : image.virtual_nsamps;
+    if (height == 0 || width == 0) return {};
+    return {height, width, (image.nsamps + width - 1) / width,
+            (image.nlines + height - 1) / height};
 }
 
-// A file byte by byte, and the image in it.
-struct file_image {
-    test_geometry image;
-    std::int64_t data_offset;
-    bytes content;
-};
-
-inline constexpr std::uint8_t UNTOUCHED = 0xEE, FILL = 0x55;
-
-// Works out what reads of a file leave in a buffer of UNTOUCHED bytes, windows beyond the image
-// with FILL around it, and what they say.
-class reader {
-public:
-    explicit reader(const file_image &file) : m_file(file) {}
-
-    // What a load of a window leaves; its rows come without gaps.
-    bytes window(std::int64_t band, std::int64_t line, std::int64_t samp, std::int64_t nlines,
-                 std::int64_t nsamps)
-    {
-        const auto nbytes = static_cast<std::size_t>(m_image.nbytes);
-        bytes buffer(static_cast<std::size_t>(nlines * nsamps) * nbytes, UNTOUCHED);
-        const std::int64_t right = std::min<std::int64_t>(samp + nsamps, m_image.nsamps);
-        const std::int64_t bottom = std::min<std::int64_t>(line + nlines, m_image.nlines);
-        m_fell_short = false;
-        if (line < 0 || samp < 0 || bottom < line + nlines || right < samp + nsamps)
-            for (std::size_t i = 0; i < buffer.size(); ++i)
-                buffer[i] =
-                    i % nbytes == (std::endian::native == std::endian::little ? 0 : nbytes - 1)
-                        ? FILL
-                        : 0;
-        const std::int64_t left = std::max<std::int64_t>(samp, 0);
-        std::int64_t at = std::max<std::int64_t>(line, 0);
-        auto to = buffer.begin() + ((at - line) * nsamps + left - samp) * m_image.nbytes;
-        while (at < bottom && left < right && reads(band, at, left, right - left, to)) {
-            const std::int64_t end = stored_extent(at + 1, has_tiles(m_image) ? height() : 1);
-            for (; at < std::min(end, bottom); ++at, to += nsamps * m_image.nbytes)
-                for (std::int64_t i = left; i < right; ++i)
-                    deliver(place(band, at, i), to + (i - left) * m_image.nbytes);
-        }
-        return buffer;
-    }
-    // What a load of one whole tile leaves.
-    bytes tile(std::int64_t band, std::int64_t tile)
-    {
-        bytes plane(static_cast<std::size_t>(height() * width() * m_image.nbytes), UNTOUCHED);
-        const std::int64_t line = tile / tiles_across() * height();
-        const std::int64_t samp = tile % tiles_across() * width();
-        m_fell_short = false;
-        reads(band, line, samp, width(), plane.begin());
-        for (std::size_t i = 0; i < plane.size(); ++i) {  // of interleaved pixels, whole samples
-            const auto nbytes = static_cast<std::size_t>(m_image.nbytes), byte = i % nbytes;
-            const auto pixel = static_cast<std::int64_t>(i / nbytes);
-            const std::size_t at = place(band, line + pixel / width(), samp + pixel % width());
-            if (available(at) > (is_interleaved(m_image) ? nbytes - 1 : byte))
-                plane[i] = m_file.content[at + byte];
-        }
-        return plane;
-    }
-    // Tiles of a band; 0: none, or such as are too large to be read one by one.
-    std::int32_t ntiles() const
-    {
-        if (!has_tiles(m_image) || height() * width() > 1 << 16) return 0;
-        const std::int64_t tiles_down = stored_extent(m_image.nlines, height()) / height();
-        return static_cast<std::int32_t>(tiles_across() * tiles_down);
-    }
-    bool fell_short() const { return m_fell_short; }
-    const std::string &text() const { return m_text; }
-
-private:
-    std::int64_t height() const { return m_image.tile_nlines; }
-    std::int64_t width() const { return m_image.tile_nsamps; }
-    std::int64_t tiles_across() const { return stored_extent(m_image.nsamps, width()) / width(); }
-    std::size_t place(std::int64_t band, std::int64_t line, std::int64_t samp) const
-    {
-        return static_cast<std::size_t>(m_file.data_offset) + stored_at(m_image, band, line, samp);
-    }
-    std::size_t available(std::size_t at) const
-    {
-        return m_file.content.size() - std::min(at, m_file.content.size());
-    }
-    void deliver(std::size_t at, bytes::iterator to) const
-    {
-        std::copy_n(&m_file.content[at], m_image.nbytes, to);
-        if (m_image.nbytes == 2 && m_image.swap != 0) std::swap(to[0], to[1]);
-    }
-    // Reads the samples of a line that begin at `samp`, or the tiles that hold them. False: the
-    // file ends before; what there is of an untiled line is at `to`.
-    bool reads(std::int64_t band, std::int64_t line, std::int64_t samp, std::int64_t nsamps,
-               bytes::iterator to)
-    {
-        const bool tiled = has_tiles(m_image), interleaved = is_interleaved(m_image);
-        std::int64_t pieces = 1, length = nsamps * m_image.nbytes;
-        if (tiled) {
-            nsamps += samp % width();
-            samp -= samp % width();
-            line -= line % height();
-            pieces = (nsamps + width() - 1) / width();
-            length = height() * width() * m_image.nbytes;
-        }
-        if (interleaved) length *= m_image.nbands;
-        if (m_image.layout != IMG_LAYOUT_TILED || m_image.nbands == 1)
-            length *= std::exchange(pieces, 1);
-        for (std::int64_t i = 0; i < pieces; ++i) {
-            const std::size_t at =
-                place(interleaved ? 0 : band, line, samp + (tiled ? i * width() : 0));
-            const auto got = static_cast<std::int64_t>(available(at));
-            if (got >= length) continue;
-            m_fell_short = true;
-            m_text += tiled         ? "img_std_read_tiles: "
-                      : interleaved ? "img_std_read_nontiled_interleaved: "
-                                    : "img_read_nontiled: ";
-            m_text += std::to_string(got) + " of " + std::to_string(length) + " bytes read!!\n";
-            if (!tiled && !interleaved) std::copy_n(m_file.content.end() - got, got, to);
-            return false;
-        }
-        return true;
-    }
-
-    const file_image &m_file;
-    const test_geometry &m_image = m_file.image;
-    bool m_fell_short = false;
-    std::string m_text;
-};
-
-// Why a VITec header cannot store an image, however small it may be.
-inline std::string vitec_objection(const test_geometry &image)
+// Returns -1 when a transfer is to be refused, 0 when it is to move nothing, and 1 else.
+inline std::int32_t verdict_on(const transfer &at, const test_geometry &image)
 {
-    if (image.nbands > 3) return "Unsupported number of bands, must be less than 4!!\n";
-    for (const std::int32_t size : {image.tile_nsamps, image.tile_nlines})
-        if (size != 0 && (size < 8 || !std::has_single_bit(static_cast<std::uint16_t>(size))))
-            return "Unsupported tile size, must be power of 2 >= 8!!\n";
-    return image.nbytes < 3
-               ? ""
-               : "Unsupported # bits per pixel (" + std::to_string(image.nbytes) + ")!!\n";
+    const tile_grid grid = tiles_of(image);
+    if (at.tiles && (grid.height == 0 || at.nlines < 1)) return 0;
+    if (at.band < 0 || at.band >= image.nbands) return -1;
+    if (at.tiles)
+        return at.line >= 0 && std::int64_t{at.line} + at.nlines <= grid.across * grid.down ? 1
+                                                                                            : -1;
+    // Rows of a dump that lie partly over each other are taken while the bytes of a stride suffice.
+    if (at.nsamps > std::int64_t{at.pitch()} * (at.writes ? image.nbytes : 1)) return -1;
+    return at.nlines > 0 && at.nsamps > 0 ? 1 : 0;
+}
+
+// Calls `visit(in_buffer, stored)` with the offsets of every byte that a transfer moves, in the
+// buffer and behind the header, in the order of the buffer.
+template <typename Visit>
+void for_each_byte(const test_geometry &image, const transfer &at, Visit visit)
+{
+    const auto visit_sample = [&](std::int64_t i, std::int64_t line, std::int64_t samp) {
+        const std::int64_t stored = stored_at(image, at.band, line, samp);
+        const std::int64_t exchange = !at.tiles && image.swap != 0 ? image.nbytes - 1 : 0;
+        for (std::int64_t k = 0; k < image.nbytes; ++k)
+            visit(static_cast<std::size_t>(i) * static_cast<std::size_t>(image.nbytes) +
+                      static_cast<std::size_t>(k),
+                  static_cast<std::size_t>(stored + (k ^ exchange)));
+    };
+    if (at.tiles) {
+        const auto [height, width, across, down] = tiles_of(image);
+        for (std::int64_t i = 0; i < at.nlines * height * width; ++i) {
+            const std::int64_t tile = at.line + i / (height * width);
+            const std::int64_t line = tile / across * height + i / width % height;
+            const std::int64_t samp = tile % across * width + i % width;
+            if (has_tiles(image) || (line < image.nlines && samp < image.nsamps))
+                visit_sample(i, line, samp);
+        }
+        return;
+    }
+    const std::int64_t bottom =
+        std::min<std::int64_t>(std::int64_t{at.line} + at.nlines, image.nlines);
+    const std::int64_t right =
+        std::min<std::int64_t>(std::int64_t{at.samp} + at.nsamps, image.nsamps);
+    for (std::int64_t line = std::max(at.line, 0); line < bottom; ++line)
+        for (std::int64_t samp = std::max(at.samp, 0); samp < right; ++samp)
+            visit_sample((line - at.line) * at.pitch() + samp - at.samp, line, samp);
 }
 
 #endif

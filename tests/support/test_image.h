@@ -1,4 +1,4 @@
-// Images in any layout, in files and in memory, and the plain model that they are held against.
+// Images in any layout, in files and in memory.
 #ifndef IMG_TEST_IMAGE_H
 #define IMG_TEST_IMAGE_H
 
@@ -7,7 +7,6 @@
 
 #include <cstdint>
 #include <string>
-#include <vector>
 
 // Slot of a type that exists in tests alone: a header of TEST_HEADER_LENGTH bytes that can state
 // any geometry, layout and byte order, then pixels that the standard driver lays out. Whole tiles
@@ -20,6 +19,9 @@ struct test_geometry {
     std::int32_t tile_nsamps = 0, tile_nlines = 0;
     std::int32_t layout = IMG_LAYOUT_BSQ;
     std::int32_t swap = 0;
+    std::int32_t band_shift = 0;  // by which the bands of a pixel-interleaved tile are rotated
+    std::int32_t virtual_nsamps = 0,
+                 virtual_nlines = 0;  // tiles that a cache gives an untiled image
 };
 
 // Registers the type; later calls do nothing.
@@ -32,30 +34,5 @@ img_handle create_test_file(const std::string &name, const test_geometry &geomet
 img_handle open_test_file(const std::string &name, std::int32_t flags);
 // Makes an in-memory image, released with img_closefile.
 img_handle create_test_memory(const test_geometry &geometry);
-
-// An image as a plain table of samples; outside of it lies the fill.
-class model_image {
-public:
-    explicit model_image(const test_geometry &geometry)
-        : m_geometry(geometry), m_samples(static_cast<std::size_t>(geometry.nbands) *
-                                          static_cast<std::size_t>(geometry.nlines) *
-                                          static_cast<std::size_t>(geometry.nsamps))
-    {
-    }
-    const test_geometry &geometry() const { return m_geometry; }
-    bool has(std::int64_t line, std::int64_t samp) const
-    {
-        return line >= 0 && line < m_geometry.nlines && samp >= 0 && samp < m_geometry.nsamps;
-    }
-    std::uint16_t &at(std::int64_t band, std::int64_t line, std::int64_t samp)
-    {
-        const auto index = (band * m_geometry.nlines + line) * m_geometry.nsamps + samp;
-        return m_samples[static_cast<std::size_t>(index)];
-    }
-
-private:
-    test_geometry m_geometry;
-    std::vector<std::uint16_t> m_samples;
-};
 
 #endif

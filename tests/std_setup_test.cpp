@@ -1,19 +1,15 @@
-#include "base/image_table.h"
-#include "base/img_desc.h"
+// Tests of std_setup.cpp: opening, creating, closing and deleting by the standard driver, and the
+// layouts that it supports.
 #include "base/settings.h"
 #include "base/type_hooks.h"
 #include "base/types.h"
-#include "imgfile/img.h"
+#include "io/io_method.h"
 #include "std/std.h"
-#include "std/std_bytes.h"
 #include "std/std_setup.h"
-#include "std/std_tiles.h"
 #include "std/std_virtual_tiles.h"
-
 #include "support/file_test.h"
-#include "support/refusal.h"
 
-#include <fstream>
+#include <sys/stat.h>
 
 namespace {
 
@@ -29,20 +25,30 @@ constexpr std::int32_t HEADER = TEST_HEADER_LENGTH;
 
 TEST_F(StdFile, RefusesLayoutsThatCannotHoldTheImage)
 {
-    const test_geometry cases[] = {{1, 1, 4, 1, 8, 8, 4},
-                                   {1, 1, 1, 1, 8, 0, 2},
-                                   {1, 1, 1, 1, 0, 0, 3},
-                                   {1, 1, 1, 1, 0, 8, 4},
-                                   {1, 1, 3, 1, 1 << 15, 1 << 15, 4},
-                                   {0, 0, 1, 1, INT32_MAX, INT32_MAX, 2},
-                                   {1 << 16, 1 << 16, 1, 1, 0, 0, 0}};
+    constexpr std::int32_t large = 1 << 15, max = INT32_MAX;
+    const test_geometry cases[] = {
+        {.nbands = 4, .tile_nsamps = 8, .tile_nlines = 8, .layout = IMG_LAYOUT_TILED_BIP},
+        {.tile_nsamps = 8, .layout = IMG_LAYOUT_TILED},
+        {.layout = IMG_LAYOUT_BAND_TILED},
+        {.tile_nlines = 8, .layout = IMG_LAYOUT_TILED_BIP},
+        {.nbands = 3, .tile_nsamps = large, .tile_nlines = large, .layout = IMG_LAYOUT_TILED_BIP},
+        {.nlines = 0,
+         .nsamps = 0,
+         .tile_nsamps = max,
+         .tile_nlines = max,
+         .layout = IMG_LAYOUT_TILED},
+        {.nlines = 2 * large, .nsamps = 2 * large}};
     for (const test_geometry &image : cases) {
         printed_by([&] { EXPECT_EQ(create(image), nullptr); });
         EXPECT_EQ(create_test_memory(image), -1);
         EXPECT_EQ(opening(m_name), REFUSED_QUIETLY);
         EXPECT_EQ(read_file(m_file).size(), HEADER);
     }
-    EXPECT_EQ(create_test_memory({1, 1, 3, 1, 1 << 14, 1 << 15, 4}), -1);  // three times as large
+    EXPECT_EQ(create_test_memory({.nbands = 3,
+                                  .tile_nsamps = large / 2,
+                                  .tile_nlines = large,
+                                  .layout = IMG_LAYOUT_TILED_BIP}),
+              -1);  // three times as large
     for (const auto &[nbytes, nbits] : {std::array{1, 0}, {1, 9}, {2, 8}, {2, 17}}) {
         img_desc *const desc = create({.nbytes = nbytes});
         desc->nbits = nbits;
@@ -50,15 +56,13 @@ TEST_F(StdFile, RefusesLayoutsThatCannotHoldTheImage)
         img_closefile(desc->handle);
     }
     // Of a type that stores no whole tiles, the last one may reach too far.
-    img_type_hooks &hooks = img_type_hooks_table[IMG_TYPE_HELAVA];
-    const auto saved = std::exchange(hooks.padded_nsamps_fn, nullptr);
+    const setting padding(img_type_hooks_table[IMG_TYPE_HELAVA].padded_nsamps_fn, nullptr);
     for (const std::int32_t tile : {1 << 19, 1 << 20}) {
         const outcome seen =
             creating(m_name, IMG_TYPE_HELAVA, {1, INT32_MAX - (1 << 19) - 16, 1, 1, tile, 1});
         EXPECT_EQ(seen.result, tile == 1 << 19 ? 0 : -1);
         img_closefile(seen.result);
     }
-    hooks.padded_nsamps_fn = saved;
 }
 
 TEST_F(StdFile, GivesVirtualTilesToUntiledImagesIfTilesAreCached)
@@ -66,11 +70,12 @@ TEST_F(StdFile, GivesVirtualTilesToUntiledImagesIfTilesAreCached)
     // Megabytes, default tile width and height, whether the type reads tiles in its own way.
     constexpr std::array<std::int32_t, 4> cases[] = {
         {1, 128, 64, 0}, {0, 128, 64, 0}, {1, 0, 64, 0}, {1, 128, 0, 0}, {1, 128, 64, 1}};
-    img_closefile(create({70, 300, 2, 2})->handle);
+    img_closefile(create({.nlines = 70, .nsamps = 300, .nbands = 2, .nbytes = 2})->handle);
     for (const auto &each : cases) {
-        img_cache_mb = each[0];
-        img_default_tile_nsamps = each[1];
-        img_default_tile_nlines = each[2];
+        const setting cache_mb(img_cache_mb, each[0]);
+        const setting width(img_default_tile_nsamps, each[1]),
+            height(img_default_tile_nlines, each[2]);
+        const setting type(img_type_table[TEST_TYPE], img_type_table[TEST_TYPE]);
         if (each[3] != 0) img_type_table[TEST_TYPE].read_tiles = img_std_read_virtual_tiles;
         const img_desc &desc = *img_find_image(opening(m_name).result);
         const img_std_file &file = *desc.std_file;
@@ -80,8 +85,34 @@ TEST_F(StdFile, GivesVirtualTilesToUntiledImagesIfTilesAreCached)
                                  : (std::array{0, 0, 0, 0, 0, 0, 0, 42'000}));
         img_closefile(desc.handle);
     }
-    img_cache_mb = 0;
-    img_default_tile_nsamps = img_default_tile_nlines = 128;
+}
+
+TEST_F(StdFile, StandsAtItsStartOnceItIsOpenAndIsSharedByItsMode)
+{
+    ::umask(0);
+    img_closefile(creating(m_file, IMG_TYPE_HELAVA, {.nlines = 100}).result);
+    EXPECT_EQ(static_cast<unsigned>(std::filesystem::status(m_file).permissions()), 0666U);
+    for (const std::int32_t type : {IMG_TYPE_HELAVA, IMG_TYPE_VITEC}) {
+        const img_handle handles[] = {creating(m_name, type, {.nlines = 100}).result,
+                                      opening(m_name).result};
+        for (const img_handle handle : handles) {
+            const img_desc &desc = *img_find_image(handle);
+            EXPECT_EQ(desc.io_method->seek(desc.std_file->data_fd, 0, IMG_SEEK_CURRENT), 0);
+            img_closefile(handle);
+        }
+    }
+}
+
+TEST_F(StdFile, InMemoryHasThePaddedWidth)
+{
+    const img_handle handle =
+        create_test_memory({.nlines = 4, .nsamps = 5, .nbands = 2, .tile_nsamps = 8});
+    const img_desc &desc = *img_find_image(handle);
+    EXPECT_EQ(desc.std_file->veof_max, 4 * 8 * 2 - 1);
+    const std::uint8_t last = 9;
+    EXPECT_EQ(dump(handle, {.line = 3, .samp = 4}, &last), 0);
+    EXPECT_EQ(desc.mem_image[3 * 8 + 4], last);
+    img_closefile(handle);
 }
 
 TEST_F(StdFile, ClosesBothDescriptorsAndDeletesBothFiles)
@@ -110,71 +141,11 @@ TEST_F(StdFile, ClosesBothDescriptorsAndDeletesBothFiles)
     }
 }
 
-TEST_F(StdFile, GrowsByZeroBytesUpToAWriteAndToItsFullSize)
-{
-    img_desc *const desc = create({1, 100});
-    bytes expected = read_file(m_file);
-    expected.resize(90);
-    expected[HEADER + 3] = '+';
-    expected.insert(expected.end(), {'n', 'e', 'w'});
-    EXPECT_EQ(img_std_extend(desc, 3), 0);
-    EXPECT_EQ(desc->io_method->seek(desc->std_file->data_fd, 0, 1), HEADER + 3);
-    std::ofstream(m_file, std::ios::app) << "+";  // grown by someone else meanwhile
-    EXPECT_EQ(img_std_write_at(desc, 90, "new", 3), 3);
-    EXPECT_EQ((std::array{desc->std_file->veof, desc->std_file->veof_max}),
-              (std::array{93, HEADER}));
-    EXPECT_EQ(read_file(m_file), expected);
-    img_closefile(desc->handle);
-    expected.resize(HEADER + 100);
-    EXPECT_EQ(read_file(m_file), expected);
-    expected.push_back('+');  // what is longer stays so
-    write_file(m_file, expected);
-    img_closefile(opening(m_name).result);
-    EXPECT_EQ(read_file(m_file), expected);
-}
-
-TEST_F(StdFile, TransfersThatCannotBeFailWithAReason)
-{
-    img_desc *const desc = create({});
-    std::uint8_t sample = 0;
-    for (const std::int64_t offset : {std::int64_t{INT32_MAX} + 1, INT64_MAX}) {
-        EXPECT_EQ(img_std_read_at(desc, offset, &sample, 1), -1);
-        EXPECT_EQ(std::exchange(errno, 0), EOVERFLOW);
-        EXPECT_EQ(img_std_write_at(desc, offset, &sample, 1), -1);
-        EXPECT_EQ(std::exchange(errno, 0), EOVERFLOW);
-    }
-    fault_arm(io_call::seek, 1);
-    EXPECT_EQ(img_std_extend(desc, 3), -1);
-    EXPECT_EQ(std::exchange(errno, 0), EIO);
-    img_io_method silent = *desc->io_method;
-    silent.read = [](auto...) { return errno = 0, -1; };
-    desc->io_method = &silent;
-    const std::int32_t got = img_std_read_at(desc, HEADER, &sample, 1);
-    int missed = 0;
-    img_std_note_missed(desc, HEADER, got, 1, &missed);
-    EXPECT_EQ(missed, EIO);  // a method that gives no reason still fails for one
-    desc->std_file->hdr_fd = -1;
-    img_std_fail_close(desc);
-    img_std_fail_close(desc);  // there is nothing left to close
-    img_closefile(desc->handle);
-}
-
-TEST_F(StdFile, AnImageInMemoryHasNoFileToExtendOrDelete)
+TEST_F(StdFile, InMemoryCannotBeDeleted)
 {
     img_desc *const desc = img_find_image(create_test_memory({}));
-    EXPECT_EQ(img_std_extend(desc, 5), 0);
     desc->io_method = nullptr;  // a name may ask for one that does not exist
     EXPECT_EQ(img_std_delete(desc), -1);
-    img_closefile(desc->handle);
-}
-
-TEST_F(StdFile, HeadersMayBeginAnywhereInAVitecFile)  // the first one here in its first block
-{
-    constexpr std::int32_t magic = 0x005B0720;
-    write_file(m_file, vitec_file({2, 3}, 244, {.link = -4, .header_length = magic}));
-    const img_desc *const desc = img_find_image(opening(m_name, 0).result);
-    ASSERT_NE(desc, nullptr);
-    EXPECT_EQ(desc->std_file->data_offset, magic);
     img_closefile(desc->handle);
 }
 

@@ -1,16 +1,14 @@
-// Between file images and images in memory.
-#include "base/image_table.h"
-#include "base/img_desc.h"
+// Tests of std_memory.cpp, and of regions and tiles of images in memory.
 #include "base/types.h"
-#include "imgfile/img.h"
 #include "std/std.h"
 #include "std/std_memory.h"
 
+#include "std/std_interleaved_lines.h"
+#include "std/std_lines.h"
+#include "std/std_region.h"
+#include "std/std_tiles.h"
 #include "support/file_test.h"
-#include "support/layout_rules.h"
-#include "support/refusal.h"
 
-#include <algorithm>
 #include <numeric>
 #include <span>
 
@@ -21,14 +19,20 @@ protected:
     // Opens a file of 20 lines and an image in memory, whose bytes are 1, 2, 3, ...
     void open(std::int32_t nbands, const test_geometry &memory)
     {
-        const std::int32_t tile = memory.layout < IMG_LAYOUT_TILED ? 0 : 4;
-        m_image = {20, 6, nbands, memory.nbytes, tile, 2 * tile, memory.layout};
+        m_image = geometry(20, nbands, memory.nbytes, memory.layout);
         img_closefile(create_test_file(m_name, m_image));
         m_desc = img_find_image(open_test_file(m_name, IMG_OPEN_READ_WRITE));
         m_memory = img_find_image(create_test_memory(memory));
         m_pixels = {m_memory->mem_image.get(), stored_bytes(memory)};
         std::iota(m_pixels.begin(), m_pixels.end(), std::uint8_t{1});
         fault_arm(io_call::open, 0);
+    }
+    // An image of some lines, with tiles of 8 lines and 4 samples if the layout has any.
+    static test_geometry geometry(std::int32_t nlines, std::int32_t nbands, std::int32_t nbytes,
+                                  std::int32_t layout)
+    {
+        const std::int32_t tile = layout < IMG_LAYOUT_TILED ? 0 : 4;
+        return {nlines, 6, nbands, nbytes, tile, 2 * tile, layout};
     }
     void close()
     {
@@ -58,14 +62,13 @@ TEST_F(VirtualIo, MovesAllAtOnceOrBandByBand)
         {4, 1, 1, "img_std_io_virtual:Only 64 of 128 bytes ioed!!\n"},
     };
     for (const auto &[layout, nbands, transfers, cut_short] : cases) {
-        const std::int32_t tile = layout < IMG_LAYOUT_TILED ? 0 : 4;
-        open(nbands, {7, 6, nbands, 2, tile, 2 * tile, layout});
+        open(nbands, geometry(7, nbands, 2, layout));
         const std::size_t size = m_pixels.size() / static_cast<std::size_t>(transfers);
         const bytes pixels(m_pixels.begin(), m_pixels.end());
         bytes file = read_file(m_file);
         for (std::int32_t band = 0; band < transfers; ++band)
             std::copy_n(&pixels[static_cast<std::size_t>(band) * size], size,
-                        &file[TEST_HEADER_LENGTH + stored_at(m_image, band, 8, 0)]);
+                        file.begin() + TEST_HEADER_LENGTH + stored_at(m_image, band, 8, 0));
         EXPECT_EQ(transfer(true), 0);
         EXPECT_EQ(read_file(m_file), file) << "layout " << layout;
         std::ranges::fill(m_pixels, std::uint8_t{0});
@@ -81,6 +84,13 @@ TEST_F(VirtualIo, MovesAllAtOnceOrBandByBand)
                                                : cut_short);
             }
         close();
+        open(nbands, geometry(0, nbands, 2, layout));  // an image without lines adds none to a file
+        const std::size_t length = read_file(m_file).size();
+        std::filesystem::resize_file(m_file, TEST_HEADER_LENGTH);
+        EXPECT_EQ(transfer(true) + transfer(false), 0);
+        EXPECT_EQ(read_file(m_file).size(), 0U + TEST_HEADER_LENGTH);
+        close();
+        EXPECT_EQ(read_file(m_file).size(), length);
     }
 }
 
@@ -145,6 +155,53 @@ TEST_F(VirtualIo, ReachesThePixelsInMemoryAndNoneBeyond)
         std::swap(m_desc, m_memory);
         EXPECT_EQ(refused(0, 0, 0), "");  // in a file
         close();
+    }
+}
+
+TEST(MemoryImages, AreMovedWithinTheirBytesAlone)
+{
+    const std::pair lines{"img_read_nontiled: read", "img_write_nontiled: Write"};
+    const std::pair tiles{"img_std_read_tiles: read", "img_std_write_tiles: write"};
+    const std::pair pixels{"img_std_read_nontiled_interleaved: read",
+                           "img_std_write_nontiled_interleaved: Write"};
+    const std::pair<std::string, std::string> texts[] = {lines, pixels, tiles, tiles, tiles, lines};
+    constexpr std::int32_t max = INT32_MAX;
+    constexpr std::array<std::int32_t, 5> not_inside[] = {
+        {-1, 0, 1, 1, 0}, {3, 0, 2, 1, 0},     {max, 0, max, 1, 0}, {0, -1, 1, 1, 0},
+        {0, 9, 1, 2, 0},  {0, max, 1, max, 0}, {0, 0, 1, 1, -1},    {0, 0, 1, 1, 2}};
+    for (std::int32_t layout = IMG_LAYOUT_BSQ; layout <= 5; ++layout) {
+        test_geometry image{.nlines = 4, .nsamps = 10, .nbands = 2, .nbytes = 2, .layout = layout};
+        if (layout >= IMG_LAYOUT_TILED && layout <= IMG_LAYOUT_TILED_BIP) {
+            image.tile_nsamps = 5;
+            image.tile_nlines = 4;
+        }
+        img_desc *const desc = img_find_image(create_test_memory(image));
+        img_std_file *const file = desc->std_file;
+        const auto last = static_cast<std::int32_t>(stored_bytes(image)) - 1;
+        bytes buffer(80, 9);
+        const auto load = [&] {
+            return img_is_tiled(desc) ? img_std_read_tiles(desc, 0, 2, 1, buffer.data())
+                                      : img_std_read(desc, 0, 0, 4, 10, 1, buffer.data(), 10);
+        };
+        const auto dump = [&](std::int32_t line, std::int32_t samp) {
+            return img_std_write(desc, line, samp, 1, 1, 1, buffer.data(), 1, nullptr);
+        };
+        file->veof = file->veof_max = last - 1;
+        EXPECT_EQ(refusal(load), texts[layout].first + " beyond virtual eof!!\n");
+        EXPECT_EQ(refusal([&] { return dump(3, 9); }),
+                  texts[layout].second + " past virtual eof!!\n");
+        EXPECT_EQ(desc->mem_image[static_cast<std::size_t>(last)], 0);
+        file->veof_max = last;
+        EXPECT_EQ(dump(3, 9) + dump(0, 0) + load(), 0);
+        EXPECT_EQ(file->veof, last);
+        EXPECT_EQ(img_std_read(desc, -1, 0, 1, 0, 9, nullptr, 1), 0);
+        EXPECT_EQ(img_std_write(desc, 0, 0, 0, 1, 0, nullptr, 1, nullptr), 0);
+        for (const auto &[line, samp, nlines, nsamps, band] : not_inside) {
+            EXPECT_EQ(img_std_read(desc, line, samp, nlines, nsamps, band, nullptr, 1), -1);
+            EXPECT_EQ(img_std_write(desc, line, samp, nlines, nsamps, band, nullptr, 1, nullptr),
+                      -1);
+        }
+        img_closefile(desc->handle);
     }
 }
 

@@ -1,11 +1,10 @@
-#include "imgfile/img.h"
+// Tests of platform_posix.cpp and io_default.cpp: ordinary files.
 #include "io/io_method.h"
 #include "io/platform.h"
-
-#include "support/fault_system.h"
 #include "support/file_test.h"
 
 #include <fcntl.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 namespace {
@@ -41,8 +40,9 @@ TEST_F(Platform, TranslatesOpenFlags)
     for (const std::int32_t unknown : {3, 0x303, 0x306, 0x10302, -1, INT32_MIN})
         EXPECT_EQ(open_and_ask(unknown), -1) << unknown;
     EXPECT_EQ(read_file(m_file), content);
-    for (const auto &[name, error] : {std::pair{"/dev/null", EINVAL}, {"/dev/missing", ENOENT}}) {
-        EXPECT_EQ(img_platform_open(name, 0, 0), -1);
+    ASSERT_EQ(::mkfifo((m_folder / "pipe").c_str(), 0600), 0);
+    for (const auto &[name, error] : {std::pair{"pipe", EINVAL}, {"missing", ENOENT}}) {
+        EXPECT_EQ(img_platform_open((m_folder / name).c_str(), 0, 0), -1);
         EXPECT_EQ(errno, error);
     }
     EXPECT_EQ(open_and_ask(0x201), O_WRONLY);
@@ -59,7 +59,7 @@ TEST_F(Platform, KeepsFilesApartFromStandardStreamsAndOtherPrograms)
         }
         const img_handle handle =
             img_createfile(m_file.c_str(), 4, 50, 1, IMG_TYPE_HELAVA, 0, 0, 1);
-        img_load_buffer(handle, 0, 0, 1, 1, 99, nullptr, 1, nullptr);  // no such band: prints
+        load(handle, {.band = 99}, nullptr);  // no such band: prints
         img_closefile(handle);
         const int flags = open_and_ask(0, F_GETFD);
         for (int fd = first; fd < 3; ++fd) {
@@ -67,7 +67,7 @@ TEST_F(Platform, KeepsFilesApartFromStandardStreamsAndOtherPrograms)
             ::dup2(saved[fd], fd);
             ::close(saved[fd]);
         }
-        EXPECT_EQ(read_file(m_file), helava_file({4, 50}, 200));
+        EXPECT_EQ(read_file(m_file), helava_file({.nlines = 4, .nsamps = 50}, 200));
         EXPECT_EQ(taken, 0);
         EXPECT_EQ(flags, FD_CLOEXEC);
     }

@@ -1,0 +1,53 @@
+// Tests of chain_prepare.cpp: what definitions, buffers and widths the links of a chain get.
+#include "support/chain_fixture.h"
+
+#include <numeric>
+
+TEST_F(Chain, GivesBuffersToLinksThatChangeTheDefinition)
+{
+    enum { ALLOC, FINAL, PLACE, KEEP = 4, FREE };
+    const std::array<std::int32_t, 3> luts[] = {
+        {1, 12, 12}, {2, 12, 10}, {4, 10, 10}, {5, 10, 9}, {7, 9, 8}};
+    for (const auto &[link, bits_in, bits_out] : luts) add_lut(link, bits_in, bits_out, link > 1);
+    EXPECT_NE(prepare(), buffer.data());
+    EXPECT_EQ(of_links(&img_chain_link::placement),
+              (codes{PLACE, PLACE, ALLOC, PLACE, PLACE, ALLOC, PLACE, FINAL, FINAL, FINAL}));
+    EXPECT_EQ(of_links(&img_chain_link::release_input),
+              (codes{KEEP, KEEP, FREE, KEEP, KEEP, FREE, KEEP, FREE, KEEP, KEEP}));
+}
+
+TEST_F(Chain, GivesALinkWhatItAsksForOrWhatTheImageHas)
+{
+    samples pixels(15);
+    std::iota(pixels.begin(), pixels.end(), std::uint16_t{1000});
+    dump(image, {.nlines = 3, .nsamps = 5}, pixels.data());
+    pixels.resize(20, 9);  // the fill
+    for (auto [lines_more, stride, bits] : {std::array{1, 7, 0}, {0, 5, 12}, {0, 0, 8}}) {
+        img_buffer_def asked{3 + lines_more, 5, 0, 0, stride, 2, 12, 9};
+        img_chain_add_remap_link(image, 4, bits, &asked, shift_down, stride == 0 ? nullptr : ask);
+        // Computing a table on the way leaves the data where it is.
+        img_chain_add_lut_create_link(image, 2, nullptr, img_chain_create_16to8_lut, 3, 12, 8, 0,
+                                      nullptr, 0);
+        EXPECT_EQ(load(), 0);
+        if (bits == 0) bits = 12;  // unstated: as the image has them
+        def.nbytes = img_chain_nbytes(bits);
+        for (std::int32_t i = 0; i < 15; ++i)
+            EXPECT_EQ(get(buffer.data(), def, i),
+                      pixels[static_cast<std::size_t>(i + 5 * lines_more)] >> (12 - bits));
+        img_chain_init(image);
+    }
+}
+
+// An in-place remap keeps the width that it states, though the samples after it are brought to
+// another.
+TEST_F(Chain, KeepsTheStatedWidthOfALinkInPlace)
+{
+    samples table(1 << 10), pixels(15, 1000);
+    for (std::size_t i = 0; i < table.size(); ++i) table[i] = static_cast<std::uint16_t>(i >> 2U);
+    pixels[1] = 24;
+    dump(image, {.nlines = 3, .nsamps = 5}, pixels.data());
+    img_chain_add_remap_link(image, 3, 10, nullptr, do_nothing, nullptr);
+    img_chain_add_lut_link(image, 5, 10, 8, 1, table.data(), 0);
+    EXPECT_EQ(load(), 0);
+    EXPECT_EQ((std::pair{buffer[0], buffer[1]}), (std::pair<std::uint8_t, std::uint8_t>{250, 6}));
+}

@@ -1,0 +1,42 @@
+// Transfers of windows and whole tiles, as records with named parts.
+#ifndef IMG_TEST_TRANSFER_H
+#define IMG_TEST_TRANSFER_H
+
+#include "imgfile/img.h"
+
+#include <optional>
+
+// A window of one band, or with `tiles` the run of `nlines` whole tiles from tile `line` on.
+struct transfer {
+    std::int32_t band = 0, line = 0, samp = 0, nlines = 1, nsamps = 1;
+    std::optional<std::int32_t> stride{};  // none: `nsamps`
+    bool tiles = false, writes = false;
+
+    std::int32_t pitch() const { return stride.value_or(nsamps); }
+};
+
+inline constexpr std::uint8_t UNTOUCHED = 0xEE, FILL = 0x55;
+
+inline std::int32_t load(img_handle image, const transfer &at, void *buffer,
+                         const std::uint8_t *fill = nullptr)
+{
+    if (at.tiles) return img_load_tiles(image, at.line, at.nlines, at.band, buffer);
+    return img_load_buffer(image, at.line, at.samp, at.nlines, at.nsamps, at.band, buffer,
+                           at.pitch(), fill);
+}
+
+inline std::int32_t dump(img_handle image, const transfer &at, const void *buffer,
+                         const std::uint8_t *fill = nullptr)
+{
+    if (at.tiles) return img_dump_tiles(image, at.line, at.nlines, at.band, buffer);
+    return img_dump_buffer(image, at.line, at.samp, at.nlines, at.nsamps, at.band, buffer,
+                           at.pitch(), fill);
+}
+
+inline std::int32_t carry_out(img_handle image, const transfer &at, void *buffer,
+                              const std::uint8_t *fill = nullptr)
+{
+    return at.writes ? dump(image, at, buffer, fill) : load(image, at, buffer, fill);
+}
+
+#endif

@@ -1,0 +1,81 @@
+// Tests of window.cpp: which part of a window lies in the image, in windows of any numbers, most of
+// them absurd, held against the same done sample by sample.
+#include "access/window.h"
+#include "support/effort.h"
+#include "support/file_test.h"
+#include "support/guarded_buffer.h"
+#include "support/random.h"
+
+namespace {
+
+// The caller's memory ends with the last sample that is to be moved, and what lies behind it cannot
+// be accessed.
+class ExtremeWindows : public FileTest {
+protected:
+    enum { MEMORY = 10, EMPTY = 12 };  // kinds of images; before them files in each layout
+
+    void open(bool in_memory, const test_geometry &image)
+    {
+        if (!in_memory) img_closefile(create_test_file(m_file, image));
+        m_image =
+            in_memory ? create_test_memory(image) : open_test_file(m_name, IMG_OPEN_READ_WRITE);
+        m_model = {image, 0, bytes(stored_bytes(image))};
+    }
+    void check(const transfer &at)
+    {
+        std::uint64_t end = 0;  // bytes of the buffer up to the last sample that is moved
+        std::int32_t verdict = verdict_on(at, m_model.image);
+        if (verdict == 1 && at.writes)
+            for_each_byte(m_model.image, at,
+                          [&](std::size_t i, auto) { end = std::max(end, i + 1); });
+        if (verdict == 1 && !at.writes)
+            end = (static_cast<std::uint64_t>(at.nlines - 1) *
+                       static_cast<std::uint64_t>(at.pitch()) +
+                   static_cast<std::uint64_t>(at.nsamps)) *
+                  static_cast<std::uint64_t>(m_model.image.nbytes);
+        if (end > INT32_MAX) verdict = -1;
+        if (verdict == -1) end = 0;
+        if (end > 112) return;  // the library would move all of it
+        for (std::uint8_t &byte : m_room) byte = static_cast<std::uint8_t>(m_random.below(256));
+        bytes expected(m_room.begin(), m_room.end());
+        const std::size_t first = m_room.size() - end;
+        if (verdict == 1 && at.writes) m_model.dump(at, &m_room[0] + first, {0, 0});
+        if (verdict == 1 && !at.writes)
+            m_model.load(at, expected.begin() + static_cast<std::ptrdiff_t>(first));
+        EXPECT_EQ(carry_out(m_image, at, m_room.data() + first, at.writes ? nullptr : &FILL),
+                  std::min(verdict, 0));
+        EXPECT_TRUE(std::ranges::equal(m_room, expected));
+    }
+
+    const guarded_buffer m_memory;
+    const std::span<std::uint8_t> m_room = m_memory.bytes().last(128);
+    random_numbers m_random{6};
+    img_handle m_image = -1;
+    file_model m_model{};
+};
+
+TEST_F(ExtremeWindows, AreTransferredOrRefused)
+{
+    constexpr int windows = 7 * 7 * 7 * 7 * 7;
+    const stderr_capture quiet;
+    for (int kind = 0; kind <= EMPTY; ++kind) {
+        test_geometry image{.nlines = 2, .nsamps = 4, .nbands = 2, .nbytes = 1 + kind % 2};
+        image.layout = kind / 2 % 5;
+        if (image.layout >= IMG_LAYOUT_TILED) image.tile_nsamps = image.tile_nlines = 3;
+        if (kind == EMPTY) image.nsamps = 0;
+        open(kind / 2 * 2 == MEMORY, image);
+        for (int i = 0; i < rounds(windows); ++i) {
+            extreme_arguments any(i, windows);
+            transfer at{1, any.next(2), any.next(4), any.next(2), any.next(4), any.next(4)};
+            check(at);
+            at.writes = true;
+            check(at);
+            check({.band = 1, .nlines = 2, .nsamps = 4});
+            ASSERT_FALSE(HasFailure()) << "kind " << kind << ", window " << i;
+        }
+        img_closefile(m_image);
+    }
+    EXPECT_EQ(img_window_test(m_image, 0, 0, 1, 1), IMG_WINDOW_OUTSIDE);
+}
+
+}  // namespace
