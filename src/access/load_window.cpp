@@ -53,6 +53,7 @@ std::int32_t fill_and_read(img_desc *desc, const img_buffer_def &def, std::int32
     if (window_class == IMG_WINDOW_OUTSIDE) return 0;
     if (window_class == IMG_WINDOW_PARTIAL && desc->unclipped == 0)
         buffer += img_clip_window(desc, &window, def.stride) * img_count(def.nbytes);
+    if (window.nlines < 1 || window.nsamps < 1) return 0;  // an empty image has nothing to read
     return read_window(desc, window, band, buffer, def.stride);
 }
 

@@ -77,6 +77,7 @@ entry *allocate_entry(img_tile_cache *cache, std::int32_t col, std::int32_t row)
 entry *reassign_entry(img_tile_cache *cache, std::int32_t col, std::int32_t row)
 {
     entry *const tile = cache->lru;
+    // unreachable: a cache has room for one entry at least, and it is on the list by now
     if (tile == nullptr) {
         img_fail("Internal cache failure 1!\n");
         return nullptr;

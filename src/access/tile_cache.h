@@ -33,8 +33,8 @@ struct img_tile_cache {
     void *write_back_arg;
 };
 
-// All operations accept a null cache, and a column or row outside the grid: they then do nothing
-// and return the second of the two results given below.
+// All operations accept a null cache, and a column or row outside the grid: they then do nothing.
+// Results are written "success; otherwise".
 
 // Returns a cache for as many tiles of `tile_bytes` as fit into `budget_mb` megabytes, at most one
 // per cell. Null when no tile fits, when memory is short, and when the grid alone would take more

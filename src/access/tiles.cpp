@@ -24,10 +24,10 @@ bool is_a_run_of_tiles(const img_desc *desc, std::int32_t first_tile, std::int32
 }
 
 // The cache's write-back operation. The band comes before the tile here, after it in write_tiles.
-std::int32_t img_std_write_tile(void *desc, std::int32_t band, std::int32_t tile,
+std::int32_t img_std_write_tile(void *arg, std::int32_t band, std::int32_t tile,
                                 const std::uint8_t *buffer)
 {
-    auto *const image = static_cast<img_desc *>(desc);
+    auto *const image = static_cast<img_desc *>(arg);
     return img_type_of(image).write_tiles(image, tile, 1, band, buffer);
 }
 

@@ -22,7 +22,7 @@ struct img_window {
 
 // Returns the class of a window, an IMG_WINDOW_ code.
 std::int32_t img_window_class(const img_desc *desc, const img_window &window);
-// The same for a handle, which lies within 0..59.
+// The same for a handle; IMG_WINDOW_OUTSIDE if it names no image.
 std::int32_t img_window_test(img_handle handle, std::int32_t line, std::int32_t samp,
                              std::int32_t nlines, std::int32_t nsamps);
 

@@ -1,5 +1,5 @@
 // The life of an image: opening, creating, closing, and the record that lives in between. A record
-// is in the table of images from its allocation on, also while the types are asked for it. Read
+// is in the table of images from its allocation on, also while types probe the file. Read
 // open.h first, then base/types.h for the order in which a type's operations are called.
 #include "api/open.h"
 
@@ -79,10 +79,25 @@ img_handle release_without_memory(img_desc *desc)
     return -1;
 }
 
-// Takes a handle and makes its record; `give_name(record)` names it and returns -1 when memory is
-// short. Returns null after a message.
-template <typename GiveName>
-img_desc *allocate_image(std::int32_t flags, GiveName give_name)
+// The name of an image, as a caller states it.
+struct image_name {
+    const char *text;
+    bool is_plain;                // false: an "@" in the text begins the name of the access method
+    const img_io_method *method;  // of a plain name; null: the default one
+};
+
+// Stores the name in the record. Returns -1 when memory is short.
+std::int32_t give_name(img_desc *desc, const image_name &name)
+{
+    const char *const text = name.text != nullptr ? name.text : "";
+    if (!name.is_plain) return img_split_name(text, &desc->filename, &desc->io_method);
+    desc->io_method = name.method != nullptr ? name.method : img_lookup_io_method("");
+    desc->filename = img_copy_name(text);
+    return desc->filename ? 0 : -1;
+}
+
+// Takes a handle and makes its record. Returns null after a message.
+img_desc *allocate_image(const image_name &name, std::int32_t flags)
 {
     img_library_init();
     const img_handle handle = img_pool_take(img_handle_pool);
@@ -98,27 +113,11 @@ img_desc *allocate_image(std::int32_t flags, GiveName give_name)
         img_release_image(handle, 0);
         return nullptr;
     }
-    if (give_name(desc) == -1) {
+    if (give_name(desc, name) == -1) {
         release_without_memory(desc);
         return nullptr;
     }
     return desc;
-}
-
-img_desc *allocate_named(const char *name, std::int32_t flags)
-{
-    return allocate_image(flags, [name](img_desc *desc) {
-        return img_split_name(name != nullptr ? name : "", &desc->filename, &desc->io_method);
-    });
-}
-
-img_desc *allocate_plain(const char *filename, const img_io_method *method, std::int32_t flags)
-{
-    return allocate_image(flags, [=](img_desc *desc) {
-        desc->io_method = method != nullptr ? method : img_lookup_io_method("");
-        desc->filename = img_copy_name(filename);
-        return desc->filename ? 0 : -1;
-    });
 }
 
 // Makes the three identity LUTs of an image with one-byte samples, unless it has LUTs already.
@@ -154,8 +153,8 @@ std::int32_t img_set_auto_16to8bit_mapdown(img_handle handle)
     return 0;
 }
 
-// Gives an image whose storage stands its chain. Returns the handle, or -1 after a message and
-// with the image released.
+// Makes the chain of an image whose storage is set up. Returns the handle, or -1 after a message
+// and with the image released.
 img_handle finish_opening(img_desc *desc)
 {
     img_chain_init(desc->handle);
@@ -180,9 +179,9 @@ bool open_as_some_type(img_desc *desc)
     return false;
 }
 
-// `desc` null: the allocation failed.
-img_handle open_image(img_desc *desc)
+img_handle open_image(const image_name &name, std::int32_t flags)
 {
+    img_desc *const desc = allocate_image(name, flags);
     if (desc == nullptr) return -1;
     if (!open_as_some_type(desc)) {
         release_image(desc, 0);
@@ -198,18 +197,17 @@ struct new_geometry {
     std::int32_t nlines, nsamps, nbands, type, tile_nsamps, tile_nlines, nbytes;
 };
 
-// Creates an image; `allocate()` makes its record. `name` is for messages.
-template <typename Allocate>
-img_handle create_image(const char *name, new_geometry geometry, Allocate allocate)
+img_handle create_image(const image_name &name, new_geometry geometry)
 {
     img_library_init();
-    if (name == nullptr || *name == '\0') return img_fail("No image file name specified!!\n");
+    if (name.text == nullptr || *name.text == '\0')
+        return img_fail("No image file name specified!!\n");
     if (geometry.type < 0 || geometry.type > IMG_NO_TYPE) geometry.type = IMG_NO_TYPE;
     const img_type_desc &type = img_type_slot(geometry.type);
     if (type.write == nullptr) return img_fail("Unwritable image type specified as output!!\n");
     if (type.enabled == 0) return img_fail("Unsupported image file type!!\n");
 
-    img_desc *const desc = allocate();
+    img_desc *const desc = allocate_image(name, CREATE_FLAGS);
     if (desc == nullptr) return -1;
     desc->type = geometry.type;
     img_set_image_params(desc, geometry.nlines, geometry.nsamps, geometry.tile_nsamps,
@@ -218,7 +216,7 @@ img_handle create_image(const char *name, new_geometry geometry, Allocate alloca
     if (img_init_luts(desc) == -1) return release_without_memory(desc);
     if (type.create == nullptr || type.create(desc) == -1) {
         release_image(desc, 0);
-        return img_fail("img_createfile: could not create %s!\n", name);
+        return img_fail("img_createfile: could not create %s!\n", name.text);
     }
     return finish_opening(desc);
 }
@@ -227,7 +225,8 @@ img_handle create_image(const char *name, new_geometry geometry, Allocate alloca
 
 img_handle img_alloc_image(const char *name, std::int32_t flags)
 {
-    const img_desc *const desc = allocate_named(name, flags);
+    const img_desc *const desc =
+        allocate_image({.text = name, .is_plain = false, .method = nullptr}, flags);
     return desc != nullptr ? desc->handle : -1;
 }
 
@@ -241,21 +240,21 @@ void img_release_image(img_handle handle, std::int32_t flush)
 
 img_handle img_openfile(const char *name, std::int32_t flags)
 {
-    return open_image(allocate_named(name, flags));
+    return open_image({.text = name, .is_plain = false, .method = nullptr}, flags);
 }
 
 img_handle img_open_plain_file(const char *filename, const img_io_method *method,
                                std::int32_t flags)
 {
-    return open_image(allocate_plain(filename, method, flags));
+    return open_image({.text = filename, .is_plain = true, .method = method}, flags);
 }
 
 img_handle img_createfile(const char *name, std::int32_t nlines, std::int32_t nsamps,
                           std::int32_t nbands, std::int32_t type, std::int32_t tile_nsamps,
                           std::int32_t tile_nlines, std::int32_t nbytes)
 {
-    return create_image(name, {nlines, nsamps, nbands, type, tile_nsamps, tile_nlines, nbytes},
-                        [name] { return allocate_named(name, CREATE_FLAGS); });
+    return create_image({.text = name, .is_plain = false, .method = nullptr},
+                        {nlines, nsamps, nbands, type, tile_nsamps, tile_nlines, nbytes});
 }
 
 img_handle img_create_plain_file(const char *filename, const img_io_method *method,
@@ -263,8 +262,8 @@ img_handle img_create_plain_file(const char *filename, const img_io_method *meth
                                  std::int32_t type, std::int32_t tile_nsamps,
                                  std::int32_t tile_nlines, std::int32_t nbytes)
 {
-    return create_image(filename, {nlines, nsamps, nbands, type, tile_nsamps, tile_nlines, nbytes},
-                        [=] { return allocate_plain(filename, method, CREATE_FLAGS); });
+    return create_image({.text = filename, .is_plain = true, .method = method},
+                        {nlines, nsamps, nbands, type, tile_nsamps, tile_nlines, nbytes});
 }
 
 std::int32_t img_closefile(img_handle handle)

@@ -19,7 +19,7 @@ img_handle img_alloc_image(const char *name, std::int32_t flags);
 void img_release_image(img_handle handle, std::int32_t flush);
 
 // As img_openfile and img_createfile, for a file name that is not split: an "@" in it means
-// nothing. `method` null: the default one.
+// nothing. `filename` null counts as empty; `method` null: the default one.
 img_handle img_open_plain_file(const char *filename, const img_io_method *method,
                                std::int32_t flags);
 img_handle img_create_plain_file(const char *filename, const img_io_method *method,

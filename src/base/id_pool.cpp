@@ -19,12 +19,14 @@ img_id_pool *img_pool_create(std::int32_t low, std::int32_t high)
 
 std::int32_t img_pool_take(img_id_pool *pool)
 {
+    // unreachable: a pool without its array; img_pool_create makes none
     if (pool == nullptr || !pool->ids || pool->next >= pool->count) return -1;
     return pool->ids[img_count(pool->next++)];
 }
 
 void img_pool_give_back(img_id_pool *pool, std::int32_t id)
 {
+    // unreachable: the same
     if (pool == nullptr || !pool->ids || pool->next <= 0) return;
     pool->ids[img_count(--pool->next)] = id;
 }

@@ -24,8 +24,9 @@ enum : std::int32_t {
     IMG_LAYOUT_DEFAULT = 6      // to be replaced by the type's default at the set-up
 };
 
-inline constexpr std::int32_t IMG_ACCESS_MODE = 3;     // the bits of open flags that hold the mode
-inline constexpr std::int32_t IMG_TWO_BYTE_BITS = 12;  // significant bits of two-byte samples
+inline constexpr std::int32_t IMG_ACCESS_MODE = 3;  // the bits of open flags that hold the mode
+inline constexpr std::size_t IMG_MAX_INTERLEAVED_BANDS = 3;  // of tiles that are pixel interleaved
+inline constexpr std::int32_t IMG_TWO_BYTE_BITS = 12;        // significant bits of two-byte samples
 
 // Combines the bands of a window into one buffer. Row i of every buffer starts at sample
 // i * `stride`; `bands` holds `nbands` of them. The result is ignored.
@@ -45,11 +46,12 @@ struct img_desc {
     std::int32_t nsamps, nlines;            // width and height of the image
     std::int32_t tile_nsamps, tile_nlines;  // width and height of a tile; a 0 in either: untiled
     std::int32_t nbands;
-    std::int32_t nbytes;                   // bytes per sample, 1 or 2
-    std::int32_t nbits;                    // significant bits per sample
-    std::int32_t swap;                     // not 0: the file's byte order is not the host's
-    std::int32_t layout;                   // an IMG_LAYOUT_ code
-    std::array<std::int32_t, 3> band_map;  // band at each position of a tiled, interleaved pixel
+    std::int32_t nbytes;  // bytes per sample, 1 or 2
+    std::int32_t nbits;   // significant bits per sample
+    std::int32_t swap;    // not 0: the file's byte order is not the host's
+    std::int32_t layout;  // an IMG_LAYOUT_ code
+    std::array<std::int32_t, IMG_MAX_INTERLEAVED_BANDS>
+        band_map;  // band at each position of a tiled, interleaved pixel
     std::unique_ptr<std::uint8_t[]> mem_image;  // the whole image; null: it lives in a file
     std::int32_t lut_size;                      // entries of each LUT; 0: none
     // Identity tables of one-byte images. The record keeps them for types that state tables of

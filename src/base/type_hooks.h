@@ -1,10 +1,12 @@
 // The table of header hooks: what a format adds to the standard driver. A format that is built on
 // the driver (img_std_fill_type) fills the slot of its own number; the driver alone calls it.
 //
-// All hooks take a record whose file is open on the header descriptor of its `std_file`. Order:
+// probe, read_header and write_header take a record whose file is open on the header descriptor of
+// its `std_file`. Order:
 //
-//   open     probe, read_header, then padded_nsamps_fn and padded_nlines_fn
-//   create   write_header, then padded_nsamps_fn and padded_nlines_fn
+//   open         probe, read_header, then padded_nsamps_fn and padded_nlines_fn
+//   create       write_header, then padded_nsamps_fn and padded_nlines_fn
+//   create_mem   padded_nsamps_fn and padded_nlines_fn; there is no file
 //
 // A hook that fails leaves the record to the driver, which closes the file and frees the state;
 // what a hook stored in the record's `header` goes with the record.

@@ -3,13 +3,14 @@
 //
 // Who calls what, in the life of one image:
 //
-//   open | create | create_mem      once, first; on failure nothing of the image is left
+//   open | create | create_mem      first; on failure nothing is left open and no state is left
 //   read, write, read_tiles,        any number of times, in any order
 //   write_tiles, io_virtual,
 //   pix_io_virtual
 //   close | delete_image            once, last; nothing is called afterwards
 //
-// An operation that is null is not offered; callers test for it. Which may be null stands at each.
+// `open` is tried for each type until one accepts the file. An operation that is null is not
+// offered; callers test for it. Each comment says whether null is allowed.
 #ifndef IMG_TYPES_H
 #define IMG_TYPES_H
 
@@ -32,12 +33,13 @@ using img_image_fn = std::int32_t (*)(img_desc *desc);
 // and one sample, all inside the image. Row i of `buffer` starts at sample i * `stride`; `stride`
 // is at least `nsamps` for a read. A write may have rows that overlap in `buffer`, which it must
 // not modify. Samples are `nbytes` wide and in the host's byte order. `fill` points to one sample
-// in the file's byte order for those parts of stored tiles that hold nothing yet; null counts as 0.
+// in the file's byte order, for samples of a tile that neither the region nor the file has; null
+// counts as 0.
 //
-// Returns 0, or another value after a message. Rows finished before a failure stay moved; the row
-// that failed may be moved in part; the image stays usable. A read that meets the end of the file
-// fails: samples that were never stored do not read as 0. A write beyond the end first fills the
-// gap with zero bytes.
+// Returns 0, or -1 after a message; quietly for a region outside the image. Rows finished before a
+// failure stay moved; the row that failed may be moved in part; the image stays usable. A read that
+// meets the end of the file fails: samples that were never stored do not read as 0. A write beyond
+// the end first fills the gap with zero bytes.
 using img_read_fn = std::int32_t (*)(img_desc *desc, std::int32_t line, std::int32_t samp,
                                      std::int32_t nlines, std::int32_t nsamps, std::int32_t band,
                                      std::uint8_t *buffer, std::int32_t stride);
@@ -53,7 +55,8 @@ using img_write_fn = std::int32_t (*)(img_desc *desc, std::int32_t line, std::in
 // are those of the file: no byte order is exchanged. Samples of an edge tile that lie outside the
 // image are moved like the others; virtual tiles leave them alone.
 //
-// Returns 0, or another value after a message. Planes finished before a failure stay moved. A read
+// Returns 0, or -1 after a message; quietly when memory is short. Planes finished before a failure
+// stay moved. A read
 // that meets the end of the file puts what the file holds into `buffer`, leaves the rest as it was
 // and fails. A write beyond the end first fills the gap with zero bytes.
 using img_read_tiles_fn = std::int32_t (*)(img_desc *desc, std::int32_t first_tile,
@@ -94,8 +97,8 @@ struct img_type_desc {
     // Makes an image in memory of the geometry in the record, all samples 0. -1 as for `open`. Null
     // is allowed; no function that a host calls asks for it.
     img_image_fn create_mem;
-    // Completes the file and closes it; frees what the type made. Called also after a failed open
-    // or create, when there may be nothing to close. The result is ignored. Null: nothing to do.
+    // Completes the file and closes it; frees what the type made. Called also after a failed
+    // create, when there may be nothing to close. The result is ignored. Null: nothing to do.
     img_image_fn close;
 
     img_read_fn read;    // null: loads fail

@@ -6,13 +6,13 @@
 
 namespace {
 
-std::array<img_chain, IMG_MAX_HANDLES> img_chains{};
+std::array<img_chain, IMG_MAX_HANDLES> chains{};
 
 }  // namespace
 
 img_chain &img_chain_of(img_handle handle)
 {
-    return img_chains[img_count(handle)];
+    return chains[img_count(handle)];
 }
 
 void img_chain_release(img_chain &chain)

@@ -50,7 +50,8 @@ using img_chain_process_fn = std::int32_t (*)(void *arg, const std::uint8_t *in_
                                               const img_buffer_def *out_def, std::int32_t pending,
                                               const std::uint16_t *lut);
 // Fills in the definition of the input that a link needs for the output `out_def`. Negative:
-// failure; 0: the two agree; positive: they differ.
+// failure; 0: the two agree in lines, samples, stride and bytes; positive: they differ. A link that
+// says 0 wrongly overruns the caller's buffer.
 using img_chain_input_def_fn = std::int32_t (*)(void *arg, const img_buffer_def *out_def,
                                                 img_buffer_def *in_def);
 

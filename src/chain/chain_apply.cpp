@@ -93,9 +93,9 @@ private:
 };
 
 // One passage of the samples through the links.
-class application {
+class passage {
 public:
-    explicit application(img_chain &chain)
+    explicit passage(img_chain &chain)
         : m_chain(chain), m_current(chain.work_buffer), m_def(chain.work_def)
     {
     }
@@ -113,7 +113,7 @@ public:
             if (!fresh) return -1;
             output = fresh.get();
         }
-        if (run(link, output) == -1) return -1;
+        if (apply(link, output) == -1) return -1;
         if (link.kind != IMG_CHAIN_REMAP_FCN) return 0;  // the samples stay where they are
         if (link.release_input == IMG_CHAIN_FREE_INPUT) {
             if (m_current == m_chain.work_buffer) {
@@ -135,7 +135,7 @@ public:
     }
 
 private:
-    std::int32_t run(const img_chain_link &link, std::uint8_t *output)
+    std::int32_t apply(const img_chain_link &link, std::uint8_t *output)
     {
         switch (link.kind) {
         case IMG_CHAIN_LUT_FCN:
@@ -187,6 +187,7 @@ std::int32_t fail_application(img_chain &chain)
 
 bool is_known(std::int32_t kind)
 {
+    // unreachable: no other kind is ever added
     return kind == IMG_CHAIN_LUT_FCN || kind == IMG_CHAIN_LUT || kind == IMG_CHAIN_REMAP_FCN;
 }
 
@@ -201,20 +202,20 @@ std::int32_t img_chain_apply(img_chain &chain)
 {
     if (chain.identity != 0) return 0;
     if (chain.prepared == 0 || chain.work_buffer == nullptr) return -1;
-    application passage(chain);
-    if (!passage.allocate()) {
+    passage through(chain);
+    if (!through.allocate()) {
         img_fail_errno("img_apply_img_chain:malloc LUT");
         return fail_application(chain);
     }
     for (const img_chain_link &link : chain.links) {
         if (link.kind == IMG_CHAIN_EMPTY) continue;
-        if (!is_known(link.kind)) {
+        if (!is_known(link.kind)) {  // unreachable: as said there
             img_fail("img_apply_img_chain: Invalid Image Chain Process type\n");
             return fail_application(chain);
         }
-        if (passage.pass(link) == -1) return fail_application(chain);
+        if (through.pass(link) == -1) return fail_application(chain);
     }
-    passage.finish();
+    through.finish();
     img_chain_release(chain);
     chain.prepared = 0;
     return 0;

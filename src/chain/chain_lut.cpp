@@ -89,6 +89,7 @@ std::int32_t img_chain_lut_input_definition(void *record, const img_buffer_def *
                                             img_buffer_def *in_def)
 {
     const auto &lut = *static_cast<const img_chain_lut *>(record);
+    // unreachable: preparation refuses such an output before
     if (out_def->nbits != lut.bits_out) return -1;
     *in_def = *out_def;
     in_def->nbits = lut.bits_in;
@@ -102,6 +103,7 @@ std::int32_t img_chain_lut_remap(void *record, const std::uint8_t *in_buffer,
                                  const std::uint16_t *lut)
 {
     const auto &own = *static_cast<const img_chain_lut *>(record);
+    // unreachable: preparation gives the width of the table or of the image
     if (in_def->nbits < 0 || in_def->nbits > IMG_CHAIN_MAX_BITS) return -1;
     const std::int32_t size = std::int32_t{1} << in_def->nbits;
     const std::uint16_t *table = own.lut;

@@ -20,8 +20,8 @@ std::int32_t img_chain_create_stretch_lut_from_buffer(const std::uint8_t *buffer
 // outside 1..16 or that disagree, and for a null histogram.
 std::int32_t img_chain_compute_stretch_lut(const std::uint32_t *histogram, std::int32_t bits_in,
                                            const img_chain_lut *descriptor, std::uint16_t *lut);
-// The kernel of the above for outputs no wider than the input: entry i becomes (i - low) * gain,
-// truncated, shifted right by `shift` and clamped to 0..top.
+// Fills the table for img_chain_compute_stretch_lut, for outputs no wider than the input: entry i
+// becomes (i - low) * gain, truncated, shifted right by `shift` and clamped to 0..top.
 void img_chain_fill_stretch(std::uint16_t *lut, std::int32_t size, double low, double gain,
                             std::int32_t shift, std::int32_t top);
 

@@ -13,7 +13,7 @@
 //
 //   A program may send SIGBUS with kill at any time. If the reading thread gets it while the host
 //   blocks SIGBUS, or before the host's handler is known, the signal is recorded (`must_raise`) and
-//   raised again after the guard has ended, where the host finds it pending as it would have.
+//   raised again when the guard ends, where the host finds it pending as it would have.
 //
 // The handler only uses functions that are safe in signal handlers, and variables of types that are
 // read and written in one step.

@@ -30,7 +30,7 @@ img_file_time time_of(const std::timespec &time)
 constexpr std::uint32_t TMPFS = 0x01021994;
 
 // Returns the magic number of a local file system, 0 for any other. Local: timestamps are of this
-// machine's clock, and a descriptor and its mapping are of the same file for good. An overlay is
+// machine's clock, and a descriptor and its mapping always show the same file. An overlay is
 // not local: a descriptor follows its file into the upper layer, the mapping does not.
 std::uint32_t local_file_system(int fd)
 {
@@ -76,8 +76,8 @@ bool img_file_mapping::update_status(int fd)
     return true;
 }
 
-// True when a change from now on gets another timestamp than the last one. A coarse clock ticks
-// every 10 milliseconds at the least, or counts whole seconds: it must have ticked since.
+// True when a later change would get a later timestamp. A coarse clock ticks at least every 10
+// milliseconds, or counts whole seconds: it must have ticked since the last change.
 bool img_file_mapping::would_show_changes() const
 {
     if (m_has_fine_timestamps) return true;

@@ -38,7 +38,7 @@ private:
 
     status m_last = {};                  // as last asked for
     bool m_has_fine_timestamps = false;  // each change after the last status shows
-    bool m_cannot_map = false;           // mapping was refused, once for all
+    bool m_cannot_map = false;           // a mapping was refused; do not try again
 
     std::uint8_t *m_bytes = nullptr;  // null: not mapped
     std::int64_t m_size = 0;          // the mapping may reach beyond the end of the file

@@ -40,8 +40,9 @@ using img_io_use_fn = void (*)(void *arg, const std::uint8_t *bytes);
 using img_io_lend_fn = std::int32_t (*)(std::int32_t fd, std::int32_t offset, std::int32_t count,
                                         img_io_use_fn use, void *arg);
 
-// One access method. Operations that fail return -1 and leave the reason in errno; a failed close
-// or unlink is passed on, every other failure fails the call of the host.
+// One access method. Operations that fail return -1 and leave the reason in errno. A transfer that
+// fails fails the host's call. While a file is probed a failure means "not of this type"; while it
+// is closed a failure is ignored.
 //
 // A registration replaces a null operation by one that fails with ENOSYS, so that callers need not
 // test for it; `lend` alone may be null here.
@@ -49,20 +50,22 @@ struct img_io_method {
     const char *name;      // referenced: the registrant keeps it valid for the life of the process
     std::int32_t enabled;  // 1: it can be found; 0: its initialisation failed
 
-    // Opens the file, or creates it. `filename` is never null; it may be empty. `oflags`: the flags
-    // of img_openfile as the host gave them, or read-write | create | truncate for a create, each
-    // with IMG_OPEN_BINARY; a host may state any bits. `mode`: 0666. Returns a descriptor >= 0. A
-    // file that an open created stays also where the library then refuses it.
+    // Opens the file, or creates it. Called once for each type that is tried, with the same flags.
+    // `filename` is never null; it may be empty. `oflags`: the flags of img_openfile as the host
+    // gave them, or read-write | create | truncate for a create, each with IMG_OPEN_BINARY; a host
+    // may state any bits. `mode`: 0666. Returns a descriptor >= 0. A file that an open created
+    // stays also where the library then refuses it.
     img_io_open_fn open;
     // Called once per descriptor. The descriptor counts as closed whatever the result.
     img_io_close_fn close;
     // Reads up to `count` bytes, 1 to 2^31 - 1, into `buffer`. Returns the bytes read: fewer than
     // `count` where the file ends or an error stops the read, 0 at the end and beyond it. The
-    // library takes fewer bytes for a truncated file and does not ask for the rest.
+    // library treats fewer bytes as the end of the file and does not ask for the rest.
     img_io_read_fn read;
     // Writes `count` bytes, 1 to 2^31 - 1. Returns the bytes written; fewer than `count` is a
-    // failure to the library, which does not ask for the rest. A write beyond the end of the file
-    // fills the gap with zero bytes: the library grows a file by writing its last byte.
+    // failure to the library, which does not ask for the rest; only a merged write is repeated line
+    // by line. A write beyond the end of the file fills the gap with zero bytes: the library grows
+    // a file by writing its last byte.
     img_io_write_fn write;
     // Moves the position to `offset` from one of the three IMG_SEEK_ places. Offsets may come from
     // a header and be any number. A position beyond the end is valid and does not change the file;
@@ -74,15 +77,16 @@ struct img_io_method {
     img_io_value_fn get_value;  // never called
 
     // Calls `use` at most once with the bytes [offset, offset + count) of the file where they lie
-    // in memory: in a mapping, or in a buffer of the method's own. Both numbers come unchecked;
-    // offsets below 0 and counts below 1 are refused. Returns 0 when `use` was called and the file
-    // had all of these bytes from before the call until `use` returned. Else -1, quietly: a refusal
-    // is no failure. The library then makes the ordinary calls, and their results count. Null:
-    // nothing is lent.
+    // in memory: in a mapping, or in a buffer of the method's own. The library does not compare
+    // them with the file's length; an offset below 0 or a count below 1 is refused. Returns 0 when
+    // `use` was called and the file had all of these bytes from before the call until `use`
+    // returned. Else -1, quietly: a refusal is no failure. The library then makes the ordinary
+    // calls, and their results count. Null: nothing is lent.
     img_io_lend_fn lend;
     // 1: the library may merge the transfers of several lines or tiles into one call and split one
-    // into several, and leaves out writes to a file opened read-only. 0: it makes one seek and one
-    // transfer for each line, or for each run of tiles.
+    // into several, and leaves out writes to a file opened read-only. 0: it makes one call per
+    // line, per contiguous run of tiles, or per sample of an interleaved write, each after a seek;
+    // a write is followed by a seek to the end.
     std::int32_t may_merge_transfers;
 };
 

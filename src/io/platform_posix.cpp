@@ -22,7 +22,7 @@ namespace {
 // The length and the first bytes of a file that was just opened. Each type that probes the file
 // reads its header in several small pieces: they come from here, with one system call.
 struct file_head {
-    std::int64_t length;       // of the file; -1: `file_head` no longer holds
+    std::int64_t length;       // of the file; -1: this record is out of date
     std::int32_t head_length;  // bytes in `bytes`; -1: not read yet
     std::array<std::byte, 512> bytes;
 };
@@ -31,11 +31,11 @@ struct open_file {
     std::int32_t fd;
     std::int32_t position;  // where the next read or write starts
     img_file_mapping mapping;
-    file_head head;  // holds until the length is asked for or a byte is written
+    file_head head;  // until the length is asked for or a byte is written
 };
 
 constexpr std::int32_t NO_DESCRIPTOR = 0;  // a standard stream's: never that of a file here
-std::array<std::int32_t, 64> descriptors{};
+std::array<std::int32_t, IMG_MAX_PLATFORM_FILES> descriptors{};
 std::array<open_file, descriptors.size()> open_files{};  // entry i belongs to descriptors[i]
 
 // Returns the index of a descriptor; the number of entries if it has none.

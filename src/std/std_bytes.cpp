@@ -1,5 +1,5 @@
 // Bytes of an image's data. An access method is a host's code: each position that it returns is
-// checked, and no count beyond the one that was asked is believed. Read std_bytes.h and
+// checked, and a count above the requested one is an error. Read std_bytes.h and
 // io/io_method.h first.
 #include "std/std_bytes.h"
 
@@ -11,7 +11,7 @@
 
 namespace {
 
-std::int32_t seek(img_desc *desc, std::int64_t offset, std::int32_t whence)
+std::int32_t seek(const img_desc *desc, std::int64_t offset, std::int32_t whence)
 {
     if (img_std_fit31(offset) == -1) {
         errno = EOVERFLOW;
@@ -30,7 +30,7 @@ std::int32_t img_std_check_position(std::int32_t position, std::int64_t expected
     return -1;
 }
 
-std::int32_t img_std_seek_to(img_desc *desc, std::int64_t offset)
+std::int32_t img_std_seek_to(const img_desc *desc, std::int64_t offset)
 {
     return img_std_check_position(seek(desc, offset, IMG_SEEK_START), offset);
 }
@@ -48,7 +48,7 @@ std::int32_t img_std_seek_to_write(img_desc *desc, std::int64_t offset)
     return 0;
 }
 
-std::int32_t img_std_length(img_desc *desc)
+std::int32_t img_std_length(const img_desc *desc)
 {
     return seek(desc, 0, IMG_SEEK_END);
 }
@@ -61,7 +61,7 @@ std::int32_t img_std_update_veof(img_desc *desc)
     return 0;
 }
 
-std::int32_t img_std_append_zeros(img_desc *desc, std::int32_t end, std::int64_t count)
+std::int32_t img_std_append_zeros(const img_desc *desc, std::int32_t end, std::int64_t count)
 {
     const std::int32_t position = seek(desc, count - 1, IMG_SEEK_CURRENT);
     if (img_std_check_position(position, end + count - 1) == -1) return -1;
@@ -78,7 +78,8 @@ std::int32_t img_std_extend(img_desc *desc, std::int32_t count)
     return end != -1 ? img_std_append_zeros(desc, end, count) : -1;
 }
 
-std::int32_t img_std_read_at(img_desc *desc, std::int64_t offset, void *buffer, std::int32_t count)
+std::int32_t img_std_read_at(const img_desc *desc, std::int64_t offset, void *buffer,
+                             std::int32_t count)
 {
     if (img_std_seek_to(desc, offset) == -1) return -1;
     return desc->io_method->read(desc->std_file->data_fd, buffer,
@@ -98,8 +99,8 @@ std::int32_t img_std_write_at(img_desc *desc, std::int64_t offset, const void *b
     return written;
 }
 
-void img_std_note_missed(img_desc *desc, std::int64_t offset, std::int32_t got, std::int32_t count,
-                         int *missed)
+void img_std_note_missed(const img_desc *desc, std::int64_t offset, std::int32_t got,
+                         std::int32_t count, int *missed)
 {
     if (got == -1) {
         *missed = errno != 0 ? errno : EIO;

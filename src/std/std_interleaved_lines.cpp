@@ -38,6 +38,7 @@ std::int32_t read_in_memory(const img_desc *desc, std::int32_t line, std::int32_
                             std::uint8_t *buffer, std::int32_t stride)
 {
     const std::int32_t row_length = pixel_length(desc) * nsamps;
+    // unreachable: the end of the loop; memory that holds all of the region is lent
     for (std::int32_t i = 0; i < nlines; ++i) {
         const std::int64_t offset = img_std_pixel_offset(desc, std::int64_t{line} + i, samp);
         if (offset + row_length - 1 > desc->std_file->veof_max)

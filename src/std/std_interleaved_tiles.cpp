@@ -6,8 +6,8 @@
 #include "std/std_samples.h"
 
 void img_std_split_bytes(const std::uint8_t *tile, std::size_t length, std::int32_t nbytes,
-                         std::int32_t nbands, const std::array<std::int32_t, 3> &band_map,
-                         const std::array<std::uint8_t *, 3> &planes)
+                         std::int32_t nbands, const img_std_band_map &band_map,
+                         const img_std_planes &planes)
 {
     const std::size_t width = img_count(nbytes);
     const std::size_t pixel = img_count(nbands) * width;
@@ -22,16 +22,15 @@ void img_std_split_bytes(const std::uint8_t *tile, std::size_t length, std::int3
 
 void img_std_split_tile(const std::uint8_t *tile, std::int32_t tile_nsamps,
                         std::int32_t tile_nlines, std::int32_t nbytes, std::int32_t nbands,
-                        const std::array<std::int32_t, 3> &band_map,
-                        const std::array<std::uint8_t *, 3> &planes)
+                        const img_std_band_map &band_map, const img_std_planes &planes)
 {
     const std::size_t pixels = img_count(tile_nsamps) * img_count(tile_nlines);
     img_std_split_bytes(tile, pixels * img_count(nbands) * img_count(nbytes), nbytes, nbands,
                         band_map, planes);
 }
 
-void img_std_merge_tile(std::int32_t nbands, const std::array<std::int32_t, 3> &band_map,
-                        const std::array<const std::uint8_t *, 3> &planes, std::int32_t tile_nsamps,
+void img_std_merge_tile(std::int32_t nbands, const img_std_band_map &band_map,
+                        const img_std_const_planes &planes, std::int32_t tile_nsamps,
                         std::int32_t tile_nlines, std::int32_t nbytes, std::uint8_t *tile)
 {
     const std::size_t width = img_count(nbytes);

@@ -28,6 +28,7 @@ std::int32_t read_lines_in_memory(const img_desc *desc, std::int32_t line, std::
                                   std::uint8_t *buffer, std::int32_t stride, bool exchange)
 {
     const std::int32_t row_length = desc->nbytes * nsamps;
+    // unreachable: the end of the loop; memory that holds all of the region is lent
     for (std::int32_t i = 0; i < nlines; ++i) {
         const std::int64_t offset = img_std_line_offset(desc, std::int64_t{line} + i, samp, band);
         if (offset + row_length - 1 > desc->std_file->veof)

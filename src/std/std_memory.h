@@ -11,8 +11,8 @@ struct img_desc;
 // (`writing` 0); its first sample lies at (`line0`, `samp0`) of the file image. Both must agree in
 // width and bands. Tiled file images must agree in tile sizes, and meet the other image at a tile
 // corner. Bytes are not exchanged.
-// Returns 0, or -1 after a message; quietly for an image that has no such storage and a place that
-// its file cannot hold.
+// Returns 0, or -1 after a message; quietly if an image lacks its file or memory, or if the place
+// lies beyond 31 bits.
 std::int32_t img_std_io_virtual(std::int32_t writing, img_desc *desc, img_desc *mem_desc,
                                 std::int32_t line0, std::int32_t samp0);
 // Copies one sample, `nbytes` bytes, between an in-memory image and `value` (`writing` 0: out of

@@ -36,12 +36,23 @@ bool spans(std::int32_t first, std::int32_t count, std::int32_t extent)
     return first >= 0 && std::int64_t{first} + count <= extent;
 }
 
-// False only for images whose `unclipped` is set: other windows are clipped before.
-bool is_inside(const img_desc *desc, std::int32_t line, std::int32_t samp, std::int32_t nlines,
-               std::int32_t nsamps, std::int32_t band)
+enum class verdict { move, move_nothing, refuse };
+
+// Refuses regions outside the image, which only images whose `unclipped` is set are asked for:
+// other windows are clipped before.
+verdict judge(const img_desc *desc, std::int32_t line, std::int32_t samp, std::int32_t nlines,
+              std::int32_t nsamps, std::int32_t band)
 {
-    return spans(line, nlines, desc->nlines) && spans(samp, nsamps, desc->nsamps) &&
-           spans(band, 1, desc->nbands);
+    if (nlines < 1 || nsamps < 1) return verdict::move_nothing;
+    const bool is_inside = spans(line, nlines, desc->nlines) && spans(samp, nsamps, desc->nsamps) &&
+                           spans(band, 1, desc->nbands);
+    return is_inside ? verdict::move : verdict::refuse;
+}
+
+// The result of a region that is not moved.
+std::int32_t result_of(verdict answer)
+{
+    return answer == verdict::refuse ? -1 : 0;
 }
 
 }  // namespace
@@ -50,8 +61,8 @@ std::int32_t img_std_read(img_desc *desc, std::int32_t line, std::int32_t samp, 
                           std::int32_t nsamps, std::int32_t band, std::uint8_t *buffer,
                           std::int32_t stride)
 {
-    if (nlines < 1 || nsamps < 1) return 0;
-    if (!is_inside(desc, line, samp, nlines, nsamps, band)) return -1;
+    const verdict answer = judge(desc, line, samp, nlines, nsamps, band);
+    if (answer != verdict::move) return result_of(answer);
     return transfer_of(desc).read(desc, line, samp, nlines, nsamps, band, buffer, stride);
 }
 
@@ -60,7 +71,7 @@ std::int32_t img_std_write(img_desc *desc, std::int32_t line, std::int32_t samp,
                            const std::uint8_t *buffer, std::int32_t stride,
                            const std::uint8_t *fill)
 {
-    if (nlines < 1 || nsamps < 1) return 0;
-    if (!is_inside(desc, line, samp, nlines, nsamps, band)) return -1;
+    const verdict answer = judge(desc, line, samp, nlines, nsamps, band);
+    if (answer != verdict::move) return result_of(answer);
     return transfer_of(desc).write(desc, line, samp, nlines, nsamps, band, buffer, stride, fill);
 }

@@ -165,9 +165,9 @@ bool open_file(img_desc *desc)
     return false;
 }
 
-// Grows a file that is shorter than its data to its full size, with zero bytes. A failure is not
-// reported: a close has no way to. A file opened read-only stays as it is; a method that sees each
-// transfer is asked all the same and refuses the write.
+// Grows a file that is shorter than its data to its full size, with zero bytes. A failure is
+// ignored: img_closefile has no failure result. A file opened read-only stays as it is. A method
+// whose transfers may not be merged still gets the write, and refuses it.
 void complete(img_desc *desc)
 {
     if (img_access_mode(desc) == IMG_OPEN_READ_ONLY && img_std_may_merge(desc)) return;

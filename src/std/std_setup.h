@@ -24,7 +24,7 @@ std::int32_t img_std_close(img_desc *desc);
 std::int32_t img_std_delete(img_desc *desc);
 
 // Computes the file organisation from the geometry and the type's hooks. -1: an image outside the
-// driver's limits, or a file whose length cannot be had.
+// driver's limits, or a file whose length cannot be determined.
 std::int32_t img_std_setup(img_desc *desc);
 // Closes the descriptors without completing the file and frees the state.
 void img_std_fail_close(img_desc *desc);

@@ -123,8 +123,8 @@ private:
 };
 
 // True when regions may be moved past `read_tiles`: the type has the driver's own operation, no
-// cache holds newer tiles (virtual tiles always have one), and the access method may be asked for
-// any pieces.
+// cache holds newer tiles (virtual tiles exist only with one), and the access method may be asked
+// for any pieces.
 bool reads_stored_tiles(const img_desc *desc)
 {
     return !desc->mem_image && desc->tile_cache == nullptr && desc->cache_mb == 0 &&
@@ -242,30 +242,39 @@ stored store_touched_lines(const row_write &write)
     return stored::yes;
 }
 
-// True unless the file is known to end within the run.
-bool may_hold_run(img_desc *desc, std::int32_t first_tile, std::int32_t ntiles, std::int32_t band)
+// True unless the file is known to end before the end of the tile.
+bool may_hold_tile(const img_desc *desc, std::int32_t tile, std::int32_t band)
 {
-    const std::int64_t end =
-        img_std_tile_offset(desc, std::int64_t{first_tile} + ntiles - 1, band) +
-        desc->std_file->tile_size;
+    const std::int64_t end = img_std_tile_offset(desc, tile, band) + desc->std_file->tile_size;
     const std::int32_t length = img_std_length(desc);
     return length == -1 || length >= end;
 }
 
-// A pre-read through an operation that the type has of its own, or does not have. Such an operation
-// cannot say why it failed: it must not fail where the file holds all of the run.
+// Calls the type's own read_tiles, which may be null, without its messages.
+std::int32_t read_quietly(img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,
+                          std::int32_t band, std::uint8_t *buffer)
+{
+    const img_read_tiles_fn read_tiles = img_type_of(desc).read_tiles;
+    if (read_tiles == nullptr) return -1;
+    const std::int32_t reports = std::exchange(img_std_report_errors, 0);
+    const std::int32_t result = read_tiles(desc, first_tile, ntiles, band, buffer);
+    img_std_report_errors = reports;
+    return result;
+}
+
+// A pre-read through a type's own read_tiles. Such an operation does not say why it failed. After a
+// failure each tile is asked for alone: one that the file holds whole must be read. Whether the
+// tile in which the file ends was read as far as it goes remains unknown.
 std::int32_t pre_read_by_type(img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,
                               std::int32_t band, std::uint8_t *buffer, int *missed)
 {
-    const img_read_tiles_fn read_tiles = img_type_of(desc).read_tiles;
-    std::int32_t result = -1;
-    if (read_tiles != nullptr) {
-        const std::int32_t reports = std::exchange(img_std_report_errors, 0);
-        result = read_tiles(desc, first_tile, ntiles, band, buffer);
-        img_std_report_errors = reports;
+    if (read_quietly(desc, first_tile, ntiles, band, buffer) == 0) return 0;
+    for (std::int32_t tile = first_tile; tile < first_tile + ntiles; ++tile) {
+        if (may_hold_tile(desc, tile, band) && read_quietly(desc, tile, 1, band, buffer) != 0)
+            *missed = EIO;
+        buffer += img_plane_size(desc);
     }
-    if (result != 0 && may_hold_run(desc, first_tile, ntiles, band)) *missed = EIO;
-    return result;
+    return -1;
 }
 
 // Reads tiles that are stored again; `arg` is the `missed` of img_std_pre_read_tiles.
@@ -290,8 +299,8 @@ std::int32_t read_stored_run(const row_write &write)
         img_std_pre_read_tiles(desc, write.first_tile(), write.ntiles(), write.band, write.run,
                                &missed);
     } else {
-        // With a cache each tile is asked for by itself: behind one that cannot be read may lie one
-        // that waits in the cache, or lines of a virtual tile that the file holds.
+        // With a cache, tiles are loaded one by one: after a tile that cannot be read, the next one
+        // may be in the cache, or be a virtual tile of which the file holds some lines.
         const std::int32_t step = desc->cache_mb != 0 ? 1 : write.ntiles();
         for (std::int32_t i = 0; i < write.ntiles(); i += step)
             img_load_tile_run_by(desc, write.first_tile() + i, step, write.band,

@@ -108,8 +108,8 @@ std::int32_t write_bytes(img_desc *desc, std::int64_t offset, const std::uint8_t
 void split_tile_into_cache(const img_desc *desc, const std::uint8_t *pixels, std::int32_t tile,
                            std::int32_t band, std::uint8_t *plane, img_tile_cache *cache)
 {
-    std::array<img_scratch, 3> others;
-    std::array<std::uint8_t *, 3> planes{};
+    std::array<img_scratch, IMG_MAX_INTERLEAVED_BANDS> others;
+    img_std_planes planes{};
     for (std::int32_t each = 0; each < desc->nbands; ++each) {
         const std::size_t index = img_count(each);
         if (each != band && cache != nullptr && img_tile_cache_has(cache, tile, each) == 0)
@@ -146,7 +146,7 @@ std::int32_t read_interleaved(img_desc *desc, std::int32_t first_tile, std::int3
         buffer += img_plane_size(desc);
     }
     if (got == length) return 0;
-    std::array<std::uint8_t *, 3> planes{};  // of the tile in which the file ends
+    img_std_planes planes{};  // of the tile in which the file ends
     planes[img_count(band)] = buffer;
     img_std_split_bytes(pixels, left, desc->nbytes, desc->nbands, desc->band_map, planes);
     return -1;
@@ -185,8 +185,8 @@ bool moves_nothing(const img_desc *desc, std::int32_t ntiles)
 std::int32_t merge_with_other_bands(img_desc *desc, std::int32_t tile, std::int32_t band,
                                     const std::uint8_t *plane, std::uint8_t *pixels)
 {
-    std::array<img_scratch, 3> others;
-    std::array<const std::uint8_t *, 3> planes{};
+    std::array<img_scratch, IMG_MAX_INTERLEAVED_BANDS> others;
+    img_std_const_planes planes{};
     int missed = 0;
     for (std::int32_t each = 0; each < desc->nbands; ++each) {
         if (each == band) continue;

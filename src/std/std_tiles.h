@@ -12,11 +12,13 @@
 
 struct img_desc;
 
-// 0: img_std_read_tiles fails without a message. 1 at start. A pre-read through an operation that a
-// type has of its own sets it to 0 meanwhile.
+// 0: img_std_read_tiles fails without a message. 1 at start. A pre-read through a type's own
+// read_tiles sets it to 0 meanwhile: such an operation may call img_std_read_tiles, and has no
+// argument that says so. The driver's own pre-reads do not need it.
 extern std::int32_t img_std_report_errors;
 
-// Return 0, or -1 after a message. A failed read leaves in `buffer` the bytes that it got.
+// Return 0, or -1 after a message; quietly when memory is short. A failed read leaves in `buffer`
+// the bytes that it got.
 std::int32_t img_std_read_tiles(img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,
                                 std::int32_t band, std::uint8_t *buffer);
 std::int32_t img_std_write_tiles(img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,
@@ -27,9 +29,9 @@ std::int32_t img_std_read_refused_tiles(img_desc *desc, std::int32_t first_tile,
                                         std::int32_t ntiles, std::int32_t band,
                                         std::uint8_t *buffer);
 
-// Reads a run that is overlaid and stored again: quietly, but for virtual tiles, and never from
-// bytes on loan. Returns 0, or -1 when the file does not hold all of the run or not all was read;
-// for the latter `*missed` becomes the errno value that says why.
+// Reads a run that is overlaid and stored again, never from bytes that an access method lends.
+// Prints nothing, except for virtual tiles. Returns 0, or -1 when the file does not hold all of the
+// run or not all was read; for the latter `*missed` becomes the errno value that says why.
 std::int32_t img_std_pre_read_tiles(img_desc *desc, std::int32_t first_tile, std::int32_t ntiles,
                                     std::int32_t band, std::uint8_t *buffer, int *missed);
 // Fails a write whose pre-read missed bytes: prints the reason and returns -1.
