@@ -1,0 +1,91 @@
+// Tests of std_tiled.cpp: which samples a write keeps where tiles are not read by the driver's own
+// operation, or not on loan. Regions themselves are tested in transfers_test.
+#include "base/types.h"
+#include "std/std_tiles.h"
+#include "support/file_test.h"
+
+namespace {
+
+class TiledWrites : public FileTest {
+protected:
+    // Opens an image of two tiles, of which the file holds the first: all 9.
+    img_handle open_half(const std::string &name)
+    {
+        const img_handle handle = create_test_file(name, {.nlines = 8,
+                                                          .nsamps = 16,
+                                                          .tile_nsamps = 8,
+                                                          .tile_nlines = 8,
+                                                          .layout = IMG_LAYOUT_TILED});
+        EXPECT_EQ(dump(handle, {.tiles = true}, bytes(64, 9).data()), 0);
+        return handle;
+    }
+    static bytes first_tile(img_handle handle)
+    {
+        bytes plane(64);
+        EXPECT_EQ(load(handle, {.tiles = true}, plane.data()), 0);
+        return plane;
+    }
+
+    const transfer m_window{.line = 1, .samp = 6, .nlines = 2, .nsamps = 4};
+    const bytes m_samples = bytes(8, 1);
+};
+
+TEST_F(TiledWrites, KeepATileThatATypesOwnOperationCannotRead)
+{
+    const img_handle handle = open_half(m_name);
+    const std::string reason = perror_line("img_std_read_tiles:read", EIO);
+    const setting type(img_type_table[TEST_TYPE], img_type_table[TEST_TYPE]);
+    img_type_table[TEST_TYPE].read_tiles = [](auto... arguments) {
+        return img_std_read_tiles(arguments...);
+    };
+    const auto write = [&] { return dump(handle, m_window, m_samples.data(), &FILL); };
+    for (const io_call call : {io_call::read, io_call::seek}) {
+        fault_arm(call, 1, fault::fails, true);
+        EXPECT_EQ(refusal(write), reason);
+        fault_arm(call, 0);
+        EXPECT_EQ(first_tile(handle), bytes(64, 9));
+    }
+    const img_read_tiles_fn own = std::exchange(img_type_table[TEST_TYPE].read_tiles, nullptr);
+    EXPECT_EQ(refusal(write), reason);
+    img_type_table[TEST_TYPE].read_tiles = own;
+
+    // Without a failure the second tile, which the file does not hold, gets the fill.
+    EXPECT_EQ(printed_by([&] { EXPECT_EQ(write(), 0); }), "");
+    bytes samples(16);
+    EXPECT_EQ(load(handle, {.line = 1, .nsamps = 16}, samples.data()), 0);
+    bytes expected(16, FILL);
+    std::fill_n(expected.begin(), 6, std::uint8_t{9});
+    std::fill_n(expected.begin() + 6, 4, std::uint8_t{1});
+    EXPECT_EQ(samples, expected);
+    img_closefile(handle);
+}
+
+TEST_F(TiledWrites, GoThroughATypesOwnOperationAndAskOnceForALoan)
+{
+    const img_handle handle = open_half(m_file);
+    {
+        const setting type(img_type_table[TEST_TYPE], img_type_table[TEST_TYPE]);
+        img_type_table[TEST_TYPE].write_tiles = [](auto...) { return -1; };
+        EXPECT_EQ(dump(handle, m_window, m_samples.data()), -1);
+        EXPECT_EQ(first_tile(handle), bytes(64, 9));
+    }
+    img_closefile(handle);
+
+    // Most of each tile is replaced, so the rest is asked for on loan.
+    img_closefile(create_test_file(m_file, {.nlines = 256,
+                                            .nsamps = 128,
+                                            .tile_nsamps = 128,
+                                            .tile_nlines = 128,
+                                            .layout = IMG_LAYOUT_TILED}));
+    const img_handle large = open_test_file(m_file + "@refusing", IMG_OPEN_READ_WRITE);
+    refused_loans() = 0;
+    const bytes samples(256 * 127, 1);
+    EXPECT_EQ(dump(large, {.nlines = 256, .nsamps = 127}, samples.data()), 0);
+    EXPECT_EQ(refused_loans(), 1);
+    bytes column(256);
+    EXPECT_EQ(load(large, {.samp = 127, .nlines = 256}, column.data()), 0);
+    EXPECT_EQ(column, bytes(256));
+    img_closefile(large);
+}
+
+}  // namespace
