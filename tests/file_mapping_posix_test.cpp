@@ -45,18 +45,16 @@ TEST_F(Lending, RefusesFilesThatCannotBeMappedOrWatched)
     open(2);
     host.has_no_status = true;
     EXPECT_EQ(lend_and_compare(0, 1), 1);
-    struct kind_of_file {
-        fault_host host;
-        std::int32_t result;
-    };
-    for (const auto &[kind, result] : {kind_of_file{{.block_devices = true}, 1},
-                                       {{.file_system = 0x6969}, 1},
-                                       {{.file_system = 0x01021994, .holes = true}, 1},
-                                       {{.file_system = 0x01021994}, 0},
-                                       {{.holes = true}, 0}}) {
+    constexpr int ram_disk = 0x01021994, network = 0x6969;
+    for (const fault_host &kind : {fault_host{.block_devices = true},
+                                   {.file_system = network},
+                                   {.file_system = ram_disk, .holes = true},
+                                   {.file_system = ram_disk},
+                                   {.holes = true}}) {
         host = kind;
-        EXPECT_EQ(lend_and_compare(0, 1), result);
-        EXPECT_EQ(lend_and_compare(0, 1), result);
+        const bool lends = !kind.block_devices && kind.file_system != network &&
+                           (kind.file_system != ram_disk || !kind.holes);
+        for (int i = 0; i < 2; ++i) EXPECT_EQ(lend_and_compare(0, 1), lends ? 0 : 1);
         img_platform_close(m_fd);
         open(2);
     }
@@ -141,22 +139,16 @@ TEST_F(Lending, SurvivesTruncation)
 TEST_F(Lending, DeliversExactWindowsOrFailsWhileAFileIsTruncated)
 {
     for (const std::int32_t tile : {0, 64}) {
-        test_geometry image{.nlines = 500, .nsamps = 500, .tile_nsamps = tile, .tile_nlines = tile};
-        if (tile != 0) image.layout = IMG_LAYOUT_TILED;
+        const test_geometry image{500, 500, 1, 1, tile, tile, tile != 0 ? IMG_LAYOUT_TILED : 0};
         img_handle handle = create_test_file(m_file, image);
-        bytes all(500 * 500), window(100 * 100);
-        for (std::size_t i = 0; i < all.size(); ++i)
-            all[i] = static_cast<std::uint8_t>(i % 251 + 1);
+        const bytes all = numbered(bytes(500 * 500), 0, 500 * 500);
+        bytes window(100 * 100);
         ASSERT_EQ(dump(handle, {.nlines = 500, .nsamps = 500}, &all[0]), 0);
         m_content = read_file(m_file);
         const pid_t child = ::fork();
         if (child == 0) ::prctl(PR_SET_PDEATHSIG, SIGKILL);
-        std::size_t length = 0;
-        while (child == 0) {
-            length = (length + 7919) % m_content.size();
-            cut(length);
-            restore();
-        }
+        for (std::size_t length = 0; child == 0; restore())
+            cut(length = (length + 7919) % m_content.size());
         const stderr_capture quiet;
         random_numbers random(1);
         host.seconds_later = 0;

@@ -26,29 +26,19 @@ constexpr std::int32_t HEADER = TEST_HEADER_LENGTH;
 TEST_F(StdFile, RefusesLayoutsThatCannotHoldTheImage)
 {
     constexpr std::int32_t large = 1 << 15, max = INT32_MAX;
-    const test_geometry cases[] = {
-        {.nbands = 4, .tile_nsamps = 8, .tile_nlines = 8, .layout = IMG_LAYOUT_TILED_BIP},
-        {.tile_nsamps = 8, .layout = IMG_LAYOUT_TILED},
-        {.layout = IMG_LAYOUT_BAND_TILED},
-        {.tile_nlines = 8, .layout = IMG_LAYOUT_TILED_BIP},
-        {.nbands = 3, .tile_nsamps = large, .tile_nlines = large, .layout = IMG_LAYOUT_TILED_BIP},
-        {.nlines = 0,
-         .nsamps = 0,
-         .tile_nsamps = max,
-         .tile_nlines = max,
-         .layout = IMG_LAYOUT_TILED},
-        {.nlines = 2 * large, .nsamps = 2 * large}};
+    const test_geometry cases[] = {{1, 1, 4, 1, 8, 8, IMG_LAYOUT_TILED_BIP},
+                                   {1, 1, 1, 1, 8, 0, IMG_LAYOUT_TILED},
+                                   {1, 1, 1, 1, 0, 0, IMG_LAYOUT_BAND_TILED},
+                                   {1, 1, 1, 1, 0, 8, IMG_LAYOUT_TILED_BIP},
+                                   {1, 1, 3, 1, large / 2, large, IMG_LAYOUT_TILED_BIP},
+                                   {0, 0, 1, 1, max, max, IMG_LAYOUT_TILED},
+                                   {2 * large, 2 * large}};
     for (const test_geometry &image : cases) {
         printed_by([&] { EXPECT_EQ(create(image), nullptr); });
         EXPECT_EQ(create_test_memory(image), -1);
         EXPECT_EQ(opening(m_name), REFUSED_QUIETLY);
         EXPECT_EQ(read_file(m_file).size(), HEADER);
     }
-    EXPECT_EQ(create_test_memory({.nbands = 3,
-                                  .tile_nsamps = large / 2,
-                                  .tile_nlines = large,
-                                  .layout = IMG_LAYOUT_TILED_BIP}),
-              -1);  // three times as large
     for (const auto &[nbytes, nbits] : {std::array{1, 0}, {1, 9}, {2, 8}, {2, 17}}) {
         img_desc *const desc = create({.nbytes = nbytes});
         desc->nbits = nbits;
@@ -71,18 +61,19 @@ TEST_F(StdFile, GivesVirtualTilesToUntiledImagesIfTilesAreCached)
     constexpr std::array<std::int32_t, 4> cases[] = {
         {1, 128, 64, 0}, {0, 128, 64, 0}, {1, 0, 64, 0}, {1, 128, 0, 0}, {1, 128, 64, 1}};
     img_closefile(create({.nlines = 70, .nsamps = 300, .nbands = 2, .nbytes = 2})->handle);
-    for (const auto &each : cases) {
-        const setting cache_mb(img_cache_mb, each[0]);
-        const setting width(img_default_tile_nsamps, each[1]),
-            height(img_default_tile_nlines, each[2]);
-        const setting type(img_type_table[TEST_TYPE], img_type_table[TEST_TYPE]);
-        if (each[3] != 0) img_type_table[TEST_TYPE].read_tiles = img_std_read_virtual_tiles;
+    for (const auto &[megabytes, tile_nsamps, tile_nlines, own] : cases) {
+        const setting cache_mb(img_cache_mb, megabytes);
+        const setting width(img_default_tile_nsamps, tile_nsamps),
+            height(img_default_tile_nlines, tile_nlines);
+        auto &read_tiles = img_type_table[TEST_TYPE].read_tiles;
+        const setting reads(read_tiles, own != 0 ? img_std_read_virtual_tiles : +read_tiles);
         const img_desc &desc = *img_find_image(opening(m_name).result);
         const img_std_file &file = *desc.std_file;
         EXPECT_EQ((std::array{desc.virtual_tiled, desc.layout, desc.tile_nsamps, desc.tile_nlines,
                               file.tiles_across, file.tiles_down, file.tile_size, file.band_size}),
-                  &each == cases ? (std::array{1, 3, 128, 64, 3, 2, 16'384, 42'000})
-                                 : (std::array{0, 0, 0, 0, 0, 0, 0, 42'000}));
+                  tile_nsamps * tile_nlines * megabytes != 0 && own == 0
+                      ? (std::array{1, 3, 128, 64, 3, 2, 16'384, 42'000})
+                      : (std::array{0, 0, 0, 0, 0, 0, 0, 42'000}));
         img_closefile(desc.handle);
     }
 }
@@ -103,50 +94,50 @@ TEST_F(StdFile, StandsAtItsStartOnceItIsOpenAndIsSharedByItsMode)
     }
 }
 
-TEST_F(StdFile, InMemoryHasThePaddedWidth)
+TEST_F(StdFile, InMemoryHasThePaddedWidthAndCannotBeDeleted)
 {
-    const img_handle handle =
-        create_test_memory({.nlines = 4, .nsamps = 5, .nbands = 2, .tile_nsamps = 8});
-    const img_desc &desc = *img_find_image(handle);
-    EXPECT_EQ(desc.std_file->veof_max, 4 * 8 * 2 - 1);
+    img_desc *const desc = img_find_image(
+        create_test_memory({.nlines = 4, .nsamps = 5, .nbands = 2, .tile_nsamps = 8}));
+    EXPECT_EQ(desc->std_file->veof_max, 4 * 8 * 2 - 1);
     const std::uint8_t last = 9;
-    EXPECT_EQ(dump(handle, {.line = 3, .samp = 4}, &last), 0);
-    EXPECT_EQ(desc.mem_image[3 * 8 + 4], last);
-    img_closefile(handle);
+    EXPECT_EQ(dump(desc->handle, {.line = 3, .samp = 4}, &last), 0);
+    EXPECT_EQ(desc->mem_image[3 * 8 + 4], last);
+    desc->io_method = nullptr;  // a name may ask for one that does not exist
+    EXPECT_EQ(img_std_delete(desc), -1);
+    img_closefile(desc->handle);
 }
 
 TEST_F(StdFile, ClosesBothDescriptorsAndDeletesBothFiles)
 {
     const std::string companion = m_folder / "companion";
-    for (const int failing :
-         {-2, -1, 0, 1, 2}) {  // of the two removals; below 0: the image is kept
+    const auto fail_close = [](img_desc *desc) {
+        img_std_fail_close(desc);
+        return -1;
+    };
+    const struct {
+        img_image_fn operation;
+        io_call call;
+        int failing;  // the nth call of that kind
+        std::int32_t result;
+        bool keeps_companion;
+        std::size_t length;  // of the file
+    } cases[] = {{img_std_close, io_call::close, 2, -1, true, HEADER + 100},
+                 {fail_close, io_call::close, 2, -1, true, HEADER},
+                 {img_std_delete, io_call::unlink, 0, 0, false, 0},
+                 {img_std_delete, io_call::unlink, 1, 0, true, 0},
+                 {img_std_delete, io_call::unlink, 2, -1, false, HEADER}};
+    for (const auto &each : cases) {
         write_file(companion, {1});
         img_desc *const desc = create({100});
         desc->std_file->hdr_fd = desc->io_method->open(m_file.c_str(), 0, 0);
         desc->std_file->companion_name = img_copy_name(companion);
-        fault_arm(failing < 0 ? io_call::close : io_call::unlink, failing < 0 ? 2 : failing);
-        std::int32_t result = -1;
-        if (failing == -1)
-            img_std_fail_close(desc);
-        else
-            result = failing == -2 ? img_std_close(desc) : img_std_delete(desc);
-        EXPECT_EQ(result, failing < 0 || failing == 2 ? -1 : 0);
+        fault_arm(each.call, each.failing);
+        EXPECT_EQ(each.operation(desc), each.result);
         EXPECT_EQ(open_descriptors(), 0);
-        EXPECT_EQ(std::filesystem::exists(companion), failing == 1 || failing < 0);
-        const std::size_t length = failing == -2                   ? HEADER + 100
-                                   : failing == -1 || failing == 2 ? HEADER
-                                                                   : 0;
-        EXPECT_EQ(read_file(m_file).size(), length);
+        EXPECT_EQ(std::filesystem::exists(companion), each.keeps_companion);
+        EXPECT_EQ(read_file(m_file).size(), each.length);
         img_closefile(desc->handle);  // there is nothing left to close
     }
-}
-
-TEST_F(StdFile, InMemoryCannotBeDeleted)
-{
-    img_desc *const desc = img_find_image(create_test_memory({}));
-    desc->io_method = nullptr;  // a name may ask for one that does not exist
-    EXPECT_EQ(img_std_delete(desc), -1);
-    img_closefile(desc->handle);
 }
 
 }  // namespace

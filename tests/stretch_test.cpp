@@ -49,23 +49,24 @@ TEST(Stretch, RefusesWidthsThatItHasNoTableFor)
     samples lut(256, UNTOUCHED);
     const std::string where = "img_chain_compute_stretch_lut: ",
                       invalid = where + "Invalid arguments\n";
-    const auto refused = [&](const std::uint32_t *histogram, std::int32_t bits,
-                             std::uint8_t bits_in, std::uint8_t bits_out) {
+    const auto expect = [&](const std::uint32_t *histogram, std::int32_t bits, std::uint8_t bits_in,
+                            std::uint8_t bits_out, const std::string &expected) {
         const img_chain_lut widths{bits_in, bits_out, 256, nullptr, 0};
-        return refusal(img_chain_compute_stretch_lut, histogram, bits, &widths, lut.data());
+        EXPECT_EQ(refusal(img_chain_compute_stretch_lut, histogram, bits, &widths, lut.data()),
+                  expected);
     };
-    EXPECT_EQ(refused(nullptr, 8, 8, 8), invalid);
-    EXPECT_EQ(refused(ones.data(), 8, 8, 17), invalid);
-    EXPECT_EQ(refused(ones.data(), 8, 9, 8), where + "histogram doesnt match lut bits_in\n");
+    expect(nullptr, 8, 8, 8, invalid);
+    expect(ones.data(), 8, 8, 17, invalid);
+    expect(ones.data(), 8, 9, 8, where + "histogram doesnt match lut bits_in\n");
+    const bytes buffer(16);
     for (const std::int32_t bits : {17, INT32_MAX, 0, -1, INT32_MIN}) {
-        EXPECT_EQ(refused(ones.data(), bits, 8, 8), invalid);
+        expect(ones.data(), bits, 8, 8, invalid);
         const img_buffer_def def{2, 4, 0, 0, 4, 2, bits, 0};
-        const bytes buffer(16);
-        EXPECT_EQ(printed_by([&] {
-                      EXPECT_EQ(
-                          img_chain_create_16to8_lut(nullptr, buffer.data(), &def, lut.data()),
-                          bits > 0 ? -1 : 0);
-                  }),
+        const auto create = [&] {
+            EXPECT_EQ(img_chain_create_16to8_lut(nullptr, buffer.data(), &def, lut.data()),
+                      bits > 0 ? -1 : 0);
+        };
+        EXPECT_EQ(printed_by(create),
                   bits > 0 ? "img_chain_create_16to8_lut:image resolution overflow\n" : invalid);
     }
     EXPECT_EQ(lut, samples(256, UNTOUCHED));

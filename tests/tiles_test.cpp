@@ -81,12 +81,6 @@ TEST_F(Tiles, NeedABufferAndAnImageThatTakesThem)
     expect(-1, 0, image, plane.data());
     EXPECT_EQ(refusal([&] { return dump(image, {}, plane.data()); }),  // the rest is unknown
               perror_line("img_std_read_tiles:read", EBADF));
-    m_desc->oflags = IMG_OPEN_READ_WRITE | IMG_OPEN_BINARY;
-    const setting type(img_type_table[TEST_TYPE], img_type_table[TEST_TYPE]);
-    img_type_table[TEST_TYPE].read_tiles = nullptr;
-    expect(-1, 0, image, plane.data());
-    img_type_table[TEST_TYPE].write_tiles = nullptr;
-    expect(-1, -1, image, plane.data());
     img_closefile(image);
 }
 
@@ -105,31 +99,31 @@ TEST_F(Tiles, AreCachedFromTheFirstLoadOn)
 // A type's own whole-tile operations serve windows, too, however old the file is.
 TEST_F(Tiles, OfATypeWithItsOwnOperationsAreMovedByThose)
 {
-    const test_geometry geometry{8, 8, 1, 1, 8, 8, IMG_LAYOUT_TILED};
-    img_closefile(create_test_file(m_file, geometry));
-    const setting type(img_type_table[TEST_TYPE], img_type_table[TEST_TYPE]);
+    img_type_desc &slot = img_type_table[TEST_TYPE];
+    const setting type(slot, slot);
     static int calls;
-    img_type_table[TEST_TYPE].read_tiles = [](auto... arguments) {
+    slot.read_tiles = [](auto... arguments) {
         ++calls;
         return img_std_read_tiles(arguments...);
     };
-    img_type_table[TEST_TYPE].write_tiles = [](auto... arguments) {
+    slot.write_tiles = [](auto... arguments) {
         ++calls;
         return img_std_write_tiles(arguments...);
     };
-    const img_handle image = opening(m_file).result;
+    const img_handle image = open({8, 8, 1, 1, 8, 8, IMG_LAYOUT_TILED})->handle;
     bytes buffer(64);
-    for (const transfer &window :
-         {transfer{.nlines = 8, .nsamps = 8}, {.nlines = 2, .nsamps = 3}}) {
+    for (const std::int32_t size : {8, 3}) {
         calls = 0;
-        EXPECT_EQ(load(image, window, buffer.data()), 0);
+        EXPECT_EQ(load(image, {.nlines = size, .nsamps = size}, buffer.data()), 0);
         EXPECT_EQ(std::exchange(calls, 0), 1);
-        EXPECT_EQ(dump(image, window, buffer.data()), 0);
+        EXPECT_EQ(dump(image, {.nlines = size, .nsamps = size}, buffer.data()), 0);
         EXPECT_GT(calls, 0);
     }
-    img_type_table[TEST_TYPE].read_tiles = nullptr;
+    slot.read_tiles = nullptr;
+    expect(-1, 0, image, buffer.data());
     EXPECT_EQ(load(image, {}, buffer.data()), -1);
-    img_type_table[TEST_TYPE].write_tiles = nullptr;
+    slot.write_tiles = nullptr;
+    expect(-1, -1, image, buffer.data());
     EXPECT_EQ(dump(image, {}, buffer.data()), -1);
     img_closefile(image);
 }

@@ -51,10 +51,6 @@ int __wrap_open(const char *name, int flags, mode_t mode)
 
 ssize_t __wrap_pread(int fd, void *buffer, std::size_t count, off_t position)
 {
-    if (host.reads_left > 0 && (host.reads_left == 1 || --host.reads_left == 1)) {
-        errno = EIO;
-        return -1;
-    }
     return interruptible(
         count, [=](std::size_t part) { return __real_pread(fd, buffer, part, position); });
 }

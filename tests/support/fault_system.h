@@ -14,7 +14,6 @@ struct fault_host {
     bool block_devices = false;  // all files are said to be such
     int file_system = 0xEF53;  // what all files are said to be on: one with a disk, of this machine
     bool holes = false;        // all files are said to have some
-    int reads_left = 0;        // from the last of them on reads fail; 0: none does
     int disk_size = -1;        // bytes that a file may have; -1: as many as it wants
     int writes_left = 0;       // the process ends at the last of them; 0: it does not
     bool half_done = false;    // that one moves half of what it should
