@@ -15,10 +15,10 @@ TEST_F(Chain, IsAppliedOncePerPreparation)
     std::memset(prepare(), 0, 30);  // the buffer of the first preparation is freed
     EXPECT_EQ(img_apply_img_chain(image), 0);
     expect_unprepared();
-    EXPECT_NE(prepare(), nullptr);
+    prepare();
     img_chain_release(image);  // as after a failed read
     expect_unprepared();
-    EXPECT_NE(prepare(), nullptr);
+    prepare();
     add_lut(4, 12, 12, false);  // this is not the chain that was prepared
     expect_unprepared();
 }

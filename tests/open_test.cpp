@@ -1,6 +1,5 @@
 // Tests of open.cpp: opening and creating images, what is refused, and what an image begins with.
 #include "base/settings.h"
-#include "base/type_hooks.h"
 #include "base/types.h"
 #include "chain/chain.h"
 #include "io/io_method.h"
@@ -67,17 +66,9 @@ TEST_F(Open, AsksTheMethodForBinaryFiles)
     EXPECT_EQ(asked, (std::vector{0x8000, 0x8000, 0x8000, 0x8302}));
 }
 
-TEST_F(Open, TypesMayBringTheirOwnTablesAndOfferLess)
+TEST_F(Open, TypesMayOfferNeitherOpenNorCreate)
 {
     img_closefile(create_test_file(m_name, {}));
-    static const img_image_fn read_header = img_type_hooks_table[TEST_TYPE].read_header;
-    const setting hook(img_type_hooks_table[TEST_TYPE].read_header, [](img_desc *desc) {
-        desc->lut_size = 3;
-        return read_header(desc);
-    });
-    const img_handle image = opening(m_name).result;
-    EXPECT_EQ(img_find_image(image)->lut_size, 3);
-    img_closefile(image);
     const setting type(img_type_table[TEST_TYPE], img_type_table[TEST_TYPE]);
     img_type_table[TEST_TYPE].open = img_type_table[TEST_TYPE].create = nullptr;
     EXPECT_EQ(opening(m_name), REFUSED_QUIETLY);
@@ -117,12 +108,4 @@ TEST_F(Open, GivesImagesOfOneByteIdentityTablesAndThoseOfTwoTheStretch)
                 EXPECT_EQ(desc.lut[i / 256][i % 256], i % 256);
             img_closefile(seen.result);
         }
-    const setting slot(img_mapdown_slot, IMG_CHAIN_LINKS);  // a stretch that cannot be installed
-    const std::string text =
-        "img_set_auto_16to8bit_mapdown: Error installing auto mapdown in image chain\n"
-        "DO_16_TO_8: Error in img_set_auto_16to8bit_mapdown()\n";
-    for (const bool create : {true, false}) {
-        const outcome seen = create ? creating(m_name, 0, {.nbytes = 2}) : opening(m_name);
-        EXPECT_EQ(std::to_string(seen.result) + seen.text, "-1" + text);
-    }
 }

