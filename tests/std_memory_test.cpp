@@ -3,6 +3,7 @@
 #include "std/std.h"
 #include "std/std_memory.h"
 
+#include "std/std_offset.h"
 #include "std/std_region.h"
 #include "std/std_tiles.h"
 #include "support/file_test.h"
@@ -82,9 +83,10 @@ TEST_F(VirtualIo, RefusesImagesAndPlacesThatDoNotFit)
     }
     EXPECT_NE(refused(4, 0), "");
     EXPECT_NE(refused(0, 3), "");
-    EXPECT_EQ(refused(-8, 0), "");
+    for (const auto &[line, samp] : {std::pair{-8, 0}, {24, 0}, {0, 8}})
+        EXPECT_EQ(refused(line, samp), "");
     m_desc->std_file->data_offset = INT32_MAX - 9;  // a place for the first samples alone
-    EXPECT_EQ(refused(0, 0), "");
+    for (const std::int32_t line : {0, 8}) EXPECT_EQ(refused(line, 0), "");
     m_desc->std_file->data_offset = TEST_HEADER_LENGTH;
     EXPECT_EQ(calls_of(io_call::write), 0);
     for (img_desc *const both : {m_desc, m_memory})
@@ -121,10 +123,8 @@ TEST_F(VirtualIo, ReachesThePixelsInMemoryAndNoneBeyond)
 
 TEST(MemoryImages, AreMovedWithinTheirBytesAlone)
 {
-    constexpr std::int32_t max = INT32_MAX;
     constexpr std::array<std::int32_t, 5> not_inside[] = {
-        {-1, 0, 1, 1, 0}, {3, 0, 2, 1, 0},     {max, 0, max, 1, 0}, {0, -1, 1, 1, 0},
-        {0, 9, 1, 2, 0},  {0, max, 1, max, 0}, {0, 0, 1, 1, -1},    {0, 0, 1, 1, 2}};
+        {3, 0, 2, 1, 0}, {0, -1, 1, 1, 0}, {0, INT32_MAX, 1, INT32_MAX, 0}, {0, 0, 1, 1, 2}};
     for (std::int32_t layout = IMG_LAYOUT_BSQ; layout <= 5; ++layout) {
         const bool tiled = layout >= IMG_LAYOUT_TILED && layout <= IMG_LAYOUT_TILED_BIP;
         const test_geometry image{4, 10, 2, 2, tiled ? 5 : 0, tiled ? 4 : 0, layout};
@@ -146,6 +146,7 @@ TEST(MemoryImages, AreMovedWithinTheirBytesAlone)
         file->veof_max = last;
         EXPECT_EQ(dump() + load(), 0);
         EXPECT_EQ(file->veof, last);
+        EXPECT_EQ(img_std_sample_offset(desc, 3, 9, 1), layout == 5 ? 0 : last - 1);
         for (const auto &[line, samp, nlines, nsamps, band] : not_inside) {
             EXPECT_EQ(img_std_read(desc, line, samp, nlines, nsamps, band, nullptr, 1), -1);
             EXPECT_EQ(img_std_write(desc, line, samp, nlines, nsamps, band, nullptr, 1, nullptr),
