@@ -62,6 +62,7 @@ TEST_F(IoMethodTable, AnswersForMissingOperations)
     EXPECT_EQ(errno, ENOSYS);
     EXPECT_EQ(bare.lend, nullptr);
     EXPECT_EQ(img_offer_lending("bar", nullptr), -1);
+    EXPECT_EQ(img_allow_merging("bar"), -1);
     EXPECT_EQ(add(nullptr), -1);
     EXPECT_EQ(img_register_default_io_method("bare"), -1);
     EXPECT_EQ(bare.lend, nullptr);

@@ -1,4 +1,5 @@
 // Tests of open.cpp: opening and creating images, what is refused, and what an image begins with.
+#include "api/open.h"
 #include "base/settings.h"
 #include "base/types.h"
 #include "chain/chain.h"
@@ -73,6 +74,29 @@ TEST_F(Open, TypesMayOfferNeitherOpenNorCreate)
     img_type_table[TEST_TYPE].open = img_type_table[TEST_TYPE].create = nullptr;
     EXPECT_EQ(opening(m_name), REFUSED_QUIETLY);
     EXPECT_EQ(creating(m_name, TEST_TYPE, {}).text, could_not_create(m_name));
+}
+
+TEST_F(Open, TakesPlainNamesAsTheyAre)
+{
+    const std::string name = m_folder / "@a@b.img";
+    const img_io_method *const method = img_lookup_io_method("fault");
+    for (const img_io_method *const chosen :
+         {method, static_cast<const img_io_method *>(nullptr)}) {
+        const img_handle made =
+            img_create_plain_file(name.c_str(), chosen, 2, 3, 1, IMG_TYPE_VITEC, 0, 0, 1);
+        ASSERT_NE(made, -1);
+        img_closefile(made);
+        EXPECT_TRUE(std::filesystem::exists(name));
+        const img_handle opened = img_open_plain_file(name.c_str(), chosen, IMG_OPEN_READ_ONLY);
+        ASSERT_NE(opened, -1);
+        EXPECT_EQ(img_find_image(opened)->filename.get(), name);
+        img_closefile(opened);
+        memory_arm(2);  // the record, then the name
+        EXPECT_EQ(refusal([&] { return img_open_plain_file(name.c_str(), chosen, 0); }),
+                  "Out of memory!!!\n");
+        memory_arm(0);
+    }
+    EXPECT_EQ(img_open_plain_file(nullptr, nullptr, IMG_OPEN_READ_ONLY), -1);
 }
 
 TEST_F(Create, ReportsWhatItRefuses)

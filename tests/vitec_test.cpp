@@ -47,3 +47,25 @@ TEST_F(Vitec, RefusedImagesLeaveWhatWasWrittenBefore)
         EXPECT_EQ(read_file(m_file).size(), length);
     }
 }
+
+TEST_F(Vitec, TotalLengthWrapsAndRaisesTheWidthAlone)
+{
+    const std::pair<test_geometry, std::uint32_t> cases[] = {
+        {{1000, 1000, 1, 2, 256, 256}, 2048132},
+        {{1000, 1000, 1, 1, 256, 0}, 1000132},
+        {{1000, 1000, 3, 1, 0, 256}, 3000132},
+        {{40000, 60000, 2, 1, 0, 0}, 505032836}};
+    for (const auto &[image, expected] : cases) {
+        img_vitec_image_block block;
+        img_vitec_build_image_block(&block, image.nlines, image.nsamps, image.tile_nsamps,
+                                    image.tile_nlines, image.nbands, image.nbytes, 64);
+        EXPECT_EQ(img_get_word(block.bytes, IMG_VITEC_AT_TOTAL_LENGTH), expected);
+    }
+}
+
+TEST(VitecTiles, ArePowersOfTwoFromEightTo32768)
+{
+    for (const std::int32_t size : {8, 16, 32768}) EXPECT_TRUE(img_vitec_is_tile_size(size));
+    for (const std::int32_t size : {-8, 0, 4, 12, 65536, 0x10008})
+        EXPECT_FALSE(img_vitec_is_tile_size(size)) << size;
+}
