@@ -1,6 +1,7 @@
 #!/bin/sh
-# names.sh SOURCE_DIR: file names are unique; every source of src/ has its test by name, or stands in
-# names.txt with the tests that test it; every test opens with a line that says what it tests.
+# names.sh SOURCE_DIR: file names are unique; every header of src/ has its source by name, or stands in
+# names.txt with the reason; every source has its test by name, or stands there with the tests that
+# test it; every test opens with a line that says what it tests.
 set -eu
 cd "$1"
 failed=0
@@ -21,6 +22,10 @@ for source in src/*/*.cpp; do
     for test in $tests; do
         [ -e "tests/$test.cpp" ] || complain "$source: no test tests/$test.cpp"
     done
+done
+for header in src/*/*.h; do
+    [ -e "${header%.h}.cpp" ] || [ -e "${header%.h}_posix.cpp" ] ||
+        grep -q "^$(basename "$header"): " tests/names.txt || complain "$header has no source of its name"
 done
 for test in tests/*_test.cpp; do
     head -n 1 "$test" | grep -q '^// ' || complain "$test does not say what it tests"

@@ -4,16 +4,12 @@
 set -eu
 program=$1 pages=$2
 # shellcheck source=/dev/null
+. "$(dirname "$0")/expect.sh"
+# shellcheck source=/dev/null
 source "$3"
 
 scratch=$(mktemp -d)
 trap 'rm -rf "$scratch"' EXIT
-failed=0
-expect() {  # WHAT EXPECTED FOUND
-    [ "$2" = "$3" ] && return
-    printf '%s\n  expected: %s\n  found:    %s\n' "$1" "$2" "$3"
-    failed=1
-}
 sorted() { sort -u | tr '\n' ' '; }
 options_of_help() { "$program" "$@" --help | sed -n 's/^  \(--[a-z-]*\).*/\1/p'; }
 options_of_page() { sed -n 's/^\.It Fl Fl \([a-z-]*\).*/--\1/p' "$1"; }
@@ -80,4 +76,4 @@ for command in info stats; do
         "$pages/imgfile-$command.1")
     expect "JSON of $command" "$(echo "$printed" | sorted)" "$(echo "$explained" | sorted)"
 done
-exit "$failed"
+exit "${failed:?}"
