@@ -205,16 +205,10 @@ TEST_F(Transfers, FollowTheAddressingRules)
 }
 
 // Two tiles side by side, if the layout has any.
-test_geometry two_tiles(std::int32_t layout, std::int32_t nbands = 3)
+test_geometry two_tiles(std::int32_t layout)
 {
-    const std::int32_t tile = layout >= IMG_LAYOUT_TILED && layout <= IMG_LAYOUT_TILED_BIP ? 1 : 0;
-    return {.nlines = 4,
-            .nsamps = 10,
-            .nbands = nbands,
-            .nbytes = 2,
-            .tile_nsamps = 5 * tile,
-            .tile_nlines = 4 * tile,
-            .layout = layout};
+    const bool tiled = layout >= IMG_LAYOUT_TILED;
+    return {4, 10, 3, 2, tiled ? 5 : 0, tiled ? 4 : 0, layout};
 }
 
 TEST_F(Transfers, TakeFewCalls)
@@ -242,6 +236,21 @@ TEST_F(Transfers, TakeFewCalls)
     }
 }
 
+TEST_F(Transfers, TellHowFarAWriteWent)
+{
+    const std::string texts[] = {"img_std_write_nontiled: 1 of 20 bytes written!!\n",
+                                 "img_std_write_nontiled_inter: 1 of 2 bytes written!!\n",
+                                 "img_std_write_tiles:1 of 40 bytes written!!\n" +
+                                     perror_line("img_std_write_tiles:partial write", EIO)};
+    for (const std::int32_t layout : {0, 1, 2}) {
+        const img_handle image = create_test_file(m_name, two_tiles(layout));
+        const bytes line(20);
+        fault_arm(io_call::write, 1, fault::moves_one);
+        EXPECT_EQ(refusal([&] { return dump(image, {.nsamps = 10}, line.data()); }), texts[layout]);
+        img_closefile(image);
+    }
+}
+
 // A method may answer anything: what was stored before stays, but for what is being written.
 TEST_F(Transfers, SurviveAnswersBeyondReason)
 {
@@ -252,7 +261,7 @@ TEST_F(Transfers, SurviveAnswersBeyondReason)
                     const test_geometry image = two_tiles(layout);
                     const img_handle created = create_test_file(m_file, image);
                     bytes rows(80, 7), one(2, 9);
-                    for (std::int32_t band = 0; band < image.nbands; ++band)
+                    for (const std::int32_t band : {0, 1, 2})
                         dump(created, {.band = band, .nlines = 4, .nsamps = 10}, &rows[0]);
                     img_closefile(created);
                     bytes before = read_file(m_file);
