@@ -199,12 +199,9 @@ TEST_F(Tool, ExtractsWindowsAndReadsStandardInput)
                 part.samples.push_back(source.sample(line + 9, samp + 17, 2));
         EXPECT_EQ(content_of("w.pgm"), part.as_pnm({0})) << name;
     }
-    const finished piped =
-        run("convert - - --format ppm", [] { ::dup2(::open("a.ppm", O_RDONLY), STDIN_FILENO); });
-    EXPECT_EQ(piped.out, content_of("a.ppm"));
-    EXPECT_EQ(piped.err, "");
     // Standard input can be read more than once, by more than one reader at a time.
     const auto from_picture = [] { ::dup2(::open("a.png", O_RDONLY), STDIN_FILENO); };
+    EXPECT_EQ(run("convert - - --format ppm", from_picture).out, content_of("a.ppm"));
     EXPECT_EQ(run("compare - -", from_picture).status, 0);
     EXPECT_EQ(run("convert - b.ppm --stretch", from_picture).status, 0);
     expect_done("convert a.ppm c.ppm --stretch");
@@ -215,14 +212,16 @@ void write_tiff(const char *name, const char *mode, const picture &source, int c
                 bool planar, int strip)
 {
     TIFF *const file = TIFFOpen(name, mode);
-    TIFFSetField(file, TIFFTAG_IMAGELENGTH, source.nlines);
-    TIFFSetField(file, TIFFTAG_IMAGEWIDTH, source.nsamps);
-    TIFFSetField(file, TIFFTAG_SAMPLESPERPIXEL, source.nbands);
-    TIFFSetField(file, TIFFTAG_BITSPERSAMPLE, 16);
-    TIFFSetField(file, TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_RGB);
-    TIFFSetField(file, TIFFTAG_PLANARCONFIG, planar ? PLANARCONFIG_SEPARATE : PLANARCONFIG_CONTIG);
-    TIFFSetField(file, TIFFTAG_COMPRESSION, compression);
-    TIFFSetField(file, TIFFTAG_ROWSPERSTRIP, strip);
+    for (const auto &[tag, value] :
+         {std::pair{TIFFTAG_IMAGELENGTH, source.nlines},
+          {TIFFTAG_IMAGEWIDTH, source.nsamps},
+          {TIFFTAG_SAMPLESPERPIXEL, source.nbands},
+          {TIFFTAG_BITSPERSAMPLE, 16},
+          {TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_RGB},
+          {TIFFTAG_COMPRESSION, compression},
+          {TIFFTAG_PLANARCONFIG, planar ? PLANARCONFIG_SEPARATE : PLANARCONFIG_CONTIG},
+          {TIFFTAG_ROWSPERSTRIP, strip}})
+        TIFFSetField(file, static_cast<std::uint32_t>(tag), value);
     const int step = planar ? 1 : source.nbands;
     for (int plane = 0; plane < source.nbands; plane += step)
         for (int line = 0; line < source.nlines; ++line) {
@@ -292,6 +291,7 @@ TEST_F(Tool, RefusesInOneLineAndKeepsTheTarget)
     write_content("vast.pgm", "P5 99999999999 5 255\n");
     fs::create_hard_link("rgb.ppm", "twin.ppm");
     fs::create_symlink("rgb.ppm", "link.ppm");
+    fs::create_symlink("loop", "loop");
     ASSERT_EQ(::mkfifo("pipe", 0600), 0);
     const std::string pixels = content_of("rgb.ppm");
     struct refusal {
@@ -306,8 +306,6 @@ TEST_F(Tool, RefusesInOneLineAndKeepsTheTarget)
         {"convert rgb.ppm pipe --format png --overwrite", 1, "pipe: exists and is not a regular"},
         {"convert rgb.ppm nowhere/new.png", 1, "nowhere/new.png: cannot be written: No such file"},
         {"convert rgb.ppm - --format png", 2, ""},
-        {"convert rgb.ppm", 2, ""},
-        {"preview junk old --overwrite", 2, ""},
         {"preview rgb.ppm old.png --band 0,1", 2, ""},
         {"stats rgb.ppm --histogram rgb.ppm --overwrite", 2, ""},
         {"create old --overwrite --type vitec --lines 50000 --samples 50000", 1,
@@ -319,6 +317,7 @@ TEST_F(Tool, RefusesInOneLineAndKeepsTheTarget)
          "--lines: Value -5 not in range 0 to 2147483647 (see imgfile create --help)\n"},
         {"check -", 2, "check cannot read standard input (see imgfile check --help)\n"},
         {"info empty", 1, "empty: is empty\n"},
+        {"check loop", 1, "loop: Too many levels of symbolic links\n"},
         {"compare rgb.ppm missing.img", 1, "missing.img: No such file or directory\n"},
         {"--quiet nonsense", 2, "unknown command: nonsense (see imgfile --help)\n"},
         {"--versio", 2, "unknown option: --versio (see imgfile --help)\n"},
@@ -338,7 +337,6 @@ TEST_F(Tool, RefusesInOneLineAndKeepsTheTarget)
               "old: VITec files hold at most 3 bands, not 7 (imgfile"},
              {"seven.d old --format png", 1,
               "old: PNG files hold 1 or 3 bands, not 7; --band chooses"},
-             {"rgb.ppm old --format pgm", 1, "old: PGM files hold 1 band, not 3\n"},
              {"rgb.ppm old --format vitec --tile 100", 1, "old: the tile sides of VITec files are"},
              {"rgb.ppm old --format tiff --tile 8", 1, "old: the tile sides of TIFF files are"},
              {"rgb.ppm old --format png --tile 16", 1, "old: PNG files have no tiles\n"},
@@ -346,9 +344,7 @@ TEST_F(Tool, RefusesInOneLineAndKeepsTheTarget)
               "rgb.ppm: has no window 0,0,21,1: it"},
              {"rgb.ppm old --format png --window 0,0,0,1", 2, "--window is empty (see imgfile"},
              {"rgb.ppm old --format png --band 3", 1, "rgb.ppm: has no band 3: it has 3, counted"},
-             {"rgb.ppm old --format png --tile 0", 2, ""},
              {"rgb.ppm old --format png --band=", 2, ""},
-             {"rgb.ppm old --format img", 2, ""},
              {"rgb.ppm old", 2, ""},
          })
         list.push_back({"convert " + arguments + " --overwrite", status, message});
@@ -501,11 +497,6 @@ TEST_F(Tool, FindsErrorsInFiles)
     expect_done("check b.pgm");
     write_content("c.pgm", content_of("b.pgm") + "more");
     EXPECT_EQ(run("check c.pgm").out, "c.pgm: 4 bytes more than the header states\n");
-    fs::create_symlink("loop", "loop");
-    const finished none = run("check missing loop b.pgm");
-    EXPECT_EQ(none.status, 1);
-    EXPECT_EQ(none.err, "imgfile: missing: No such file or directory\n"
-                        "imgfile: loop: Too many levels of symbolic links\n");
 }
 
 // data/README.md describes the files and states the formula of their samples.
@@ -585,11 +576,9 @@ TEST_F(Tool, ComparesAndMeasuresSamples)
     EXPECT_GT(fs::file_size("i.png"), fs::file_size("h.png") / 2);  // not empty
 
     expect_done("preview a.img p.png --size 16 --raw");
-    const auto reduced = nlohmann::json::parse(run("info p.png --json").out);
-    EXPECT_EQ(reduced[0]["lines"], 15);
-    EXPECT_EQ(reduced[0]["samples"], 10);
     expect_done("convert p.png p.ppm");
     const std::string pixels = content_of("p.ppm");
+    EXPECT_TRUE(pixels.starts_with("P6\n10 15\n255\n"));
     const int mean = (source.sample(8, 4, 1) + source.sample(8, 5, 1) + source.sample(9, 4, 1) +
                       source.sample(9, 5, 1)) /
                      4;
