@@ -160,7 +160,7 @@ open_image checked_create(fuzz_input &in, const std::string &name, img_handle ne
     require(handle == (possible ? next : -1) || (faulty && handle == -1),
             "images that can be stored are created, and no others");
     if (handle == -1) return {};
-    const open_image made = checked_image(handle, IMG_OPEN_READ_WRITE, disk_name(name));
+    open_image made = checked_image(handle, IMG_OPEN_READ_WRITE, disk_name(name));
     require(std::memcmp(&made.in_file.image, &image, offsetof(test_geometry, layout)) == 0,
             "an image is created as it was asked for");
     return made;

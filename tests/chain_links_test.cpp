@@ -52,3 +52,10 @@ TEST_F(Chain, RefusesLinksThatCannotWork)
     EXPECT_EQ(img_chain_add_remap_link(image, 0, 8, nullptr, nullptr, nullptr), -1);
     expect_no_links();
 }
+
+TEST_F(Chain, HasNoBuffersOfNegativeSize)
+{
+    EXPECT_EQ(img_chain_new_buffer(-1, 1, 1), nullptr);
+    EXPECT_EQ(img_chain_new_buffer(1, -1, 1), nullptr);
+    EXPECT_EQ(img_chain_new_buffer(1, 1, -1), nullptr);
+}

@@ -146,9 +146,11 @@ TEST_F(Lending, DeliversExactWindowsOrFailsWhileAFileIsTruncated)
         ASSERT_EQ(dump(handle, {.nlines = 500, .nsamps = 500}, &all[0]), 0);
         m_content = read_file(m_file);
         const pid_t child = ::fork();
-        if (child == 0) ::prctl(PR_SET_PDEATHSIG, SIGKILL);
-        for (std::size_t length = 0; child == 0; restore())
-            cut(length = (length + 7919) % m_content.size());
+        if (child == 0) {
+            ::prctl(PR_SET_PDEATHSIG, SIGKILL);
+            for (std::size_t length = 0;; restore())
+                cut(length = (length + 7919) % m_content.size());
+        }
         const stderr_capture quiet;
         random_numbers random(1);
         host.seconds_later = 0;

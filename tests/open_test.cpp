@@ -1,6 +1,7 @@
 // Tests of open.cpp: opening and creating images, what is refused, and what an image begins with.
 #include "api/open.h"
 #include "base/settings.h"
+#include "base/type_hooks.h"
 #include "base/types.h"
 #include "chain/chain.h"
 #include "io/io_method.h"
@@ -67,9 +68,20 @@ TEST_F(Open, AsksTheMethodForBinaryFiles)
     EXPECT_EQ(asked, (std::vector{0x8000, 0x8000, 0x8000, 0x8302}));
 }
 
-TEST_F(Open, TypesMayOfferNeitherOpenNorCreate)
+TEST_F(Open, TypesMayHaveTablesAndOfferNeitherOpenNorCreate)
 {
     img_closefile(create_test_file(m_name, {}));
+    {
+        static const img_image_fn read_header = img_type_hooks_table[TEST_TYPE].read_header;
+        const setting hook(img_type_hooks_table[TEST_TYPE].read_header, [](img_desc *desc) {
+            const std::int32_t result = read_header(desc);
+            desc->lut_size = 3;
+            return result;
+        });
+        const img_handle image = opening(m_name).result;
+        EXPECT_EQ(img_find_image(image)->lut_size, 3);
+        img_closefile(image);
+    }
     const setting type(img_type_table[TEST_TYPE], img_type_table[TEST_TYPE]);
     img_type_table[TEST_TYPE].open = img_type_table[TEST_TYPE].create = nullptr;
     EXPECT_EQ(opening(m_name), REFUSED_QUIETLY);

@@ -127,6 +127,7 @@ TEST_F(Platform, PositionsAndCountsFit31Bits)
         EXPECT_EQ(img_platform_write(each, &byte, 0x80000000U), -1);
         EXPECT_EQ(img_platform_close(each), each == fd ? 0 : -1);
     }
+    EXPECT_EQ(img_platform_seek(fd, 0, 0), -1);
     EXPECT_EQ(img_lookup_io_method("")->unlink(m_file.c_str()), 0);
     EXPECT_FALSE(std::filesystem::exists(m_file));
 }

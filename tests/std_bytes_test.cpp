@@ -47,7 +47,13 @@ TEST_F(Bytes, LeaveAReasonWhereTheyCannotBeMoved)
     int missed = 0;  // of a method that gives no reason, which still fails for one
     img_std_note_missed(desc, HEADER, -1, 1, &missed);
     EXPECT_EQ(missed, EIO);
+    fault_arm(io_call::seek, 1);
+    EXPECT_EQ(img_std_extend(desc, 3), -1);
+    EXPECT_EQ(std::exchange(errno, 0), EIO);
     img_closefile(desc->handle);
+    img_desc *const memory = img_find_image(create_test_memory({}));
+    EXPECT_EQ(img_std_extend(memory, 5), 0);
+    img_closefile(memory->handle);
 }
 
 }  // namespace

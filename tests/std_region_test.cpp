@@ -4,6 +4,7 @@
 
 #include "std/std_interleaved_lines.h"
 #include "std/std_lines.h"
+#include "std/std_offset.h"
 #include "support/file_test.h"
 
 namespace {
@@ -23,6 +24,9 @@ TEST_F(Regions, OfNoLinesMoveNothing)
         EXPECT_EQ(img_std_write_nontiled(desc, 0, 0, nlines, 1, 0, &sample, 1, nullptr), 0);
         EXPECT_EQ(img_std_read_nontiled_interleaved(desc, 0, 0, nlines, 1, 0, &sample, 1), 0);
     }
+    EXPECT_EQ(img_std_read(desc, 0, 0, 1, 0, 0, &sample, 1), 0);
+    for (const auto &[line, samp, band] : {std::array{-1, 0, 0}, {0, -1, 0}, {0, 0, -1}})
+        EXPECT_EQ(img_std_sample_offset(desc, line, samp, band), -1);
     EXPECT_EQ(sample, UNTOUCHED);
     EXPECT_EQ(read_file(m_file), before);
     img_closefile(desc->handle);

@@ -3,6 +3,8 @@
 #include "base/settings.h"
 #include "base/type_hooks.h"
 #include "base/types.h"
+#include "formats/header_file.h"
+#include "formats/helava.h"
 #include "io/io_method.h"
 #include "std/std.h"
 #include "std/std_setup.h"
@@ -107,6 +109,23 @@ TEST_F(StdFile, InMemoryHasThePaddedWidthAndCannotBeDeleted)
     desc->io_method = nullptr;  // a name may ask for one that does not exist
     EXPECT_EQ(img_std_delete(desc), -1);
     img_closefile(desc->handle);
+}
+
+TEST_F(StdFile, ClosesWhatIsOpenOnceAndOpensNothingTooShort)
+{
+    img_desc *const desc = create({});
+    desc->std_file->hdr_fd = -1;
+    img_std_fail_close(desc);
+    img_std_fail_close(desc);
+    img_closefile(desc->handle);
+    for (std::size_t length = 0; length < 4; ++length) {
+        write_file(m_file, bytes(length, 0x48));
+        EXPECT_EQ(opening(m_file), REFUSED_QUIETLY);
+        const img_io_method *const method = img_lookup_io_method("");
+        const std::int32_t fd = method->open(m_file.c_str(), IMG_OPEN_READ_ONLY, 0);
+        EXPECT_EQ(img_helava_find_magic({method, fd}), -1);
+        method->close(fd);
+    }
 }
 
 TEST_F(StdFile, ClosesBothDescriptorsAndDeletesBothFiles)

@@ -82,10 +82,14 @@ TEST_F(TiledWrites, GoThroughATypesOwnOperationAndAskOnceForALoan)
     const bytes samples(256 * 127, 1);
     EXPECT_EQ(dump(large, {.nlines = 256, .nsamps = 127}, samples.data()), 0);
     EXPECT_EQ(refused_loans(), 1);
-    bytes column(256);
-    EXPECT_EQ(load(large, {.samp = 127, .nlines = 256}, column.data()), 0);
-    EXPECT_EQ(column, bytes(256));
     img_closefile(large);
+    const img_handle lent = open_test_file(m_file, IMG_OPEN_READ_WRITE);
+    host.seconds_later = 1;  // the file is old enough to be lent
+    EXPECT_EQ(dump(lent, {.nlines = 256, .nsamps = 127}, samples.data()), 0);
+    bytes column(256, UNTOUCHED);
+    EXPECT_EQ(load(lent, {.samp = 127, .nlines = 256}, column.data()), 0);
+    EXPECT_EQ(column, bytes(256));
+    img_closefile(lent);
 }
 
 }  // namespace

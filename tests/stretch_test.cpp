@@ -95,6 +95,9 @@ TEST(Stretch, CountsEveryFourthSampleOfOneByteButTheFill)  // two bytes: load_wi
         ASSERT_EQ(img_chain_create_stretch_lut_from_buffer(buffer.data(), &def, lut.data(), bits),
                   0);
         EXPECT_EQ(lut, expected_stretch(window, 25, 9, bits, bits));
+        const img_buffer_def no_fill{4, 25, 0, 0, 25, 1, bits, 300};  // beyond the histogram
+        img_chain_create_stretch_lut_from_buffer(buffer.data(), &no_fill, lut.data(), bits);
+        EXPECT_EQ(lut, expected_stretch(window, 25, 300, bits, bits));
     }
 }
 

@@ -73,6 +73,8 @@ TEST_F(ExtremeWindows, AreTransferredOrRefused)
             check({.band = 1, .nlines = 2, .nsamps = 4});
             ASSERT_FALSE(HasFailure()) << "kind " << kind << ", window " << i;
         }
+        EXPECT_EQ(img_window_test(m_image, 0, 0, 1, 9),
+                  kind == EMPTY ? IMG_WINDOW_OUTSIDE : IMG_WINDOW_PARTIAL);
         img_closefile(m_image);
     }
     EXPECT_EQ(img_window_test(m_image, 0, 0, 1, 1), IMG_WINDOW_OUTSIDE);

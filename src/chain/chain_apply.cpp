@@ -51,6 +51,7 @@ public:
     // room of the tables.
     bool bring_to(std::int32_t nbits)
     {
+        // unreachable: a wider one; preparation has raised lut_bits to every width
         if (nbits < 0 || nbits > m_bits) return false;
         if (m_lut.bits_in != nbits || m_lut.bits_out != nbits) convert(nbits, nbits);
         return true;

@@ -108,10 +108,10 @@ std::int32_t close_and_fail(int fd, int error)
     return -1;
 }
 
-// Calls `transfer(done, position)` at the file's position until `count` bytes are moved, a call
-// moves none, or an error occurs.
-template <typename Transfer>
-std::int32_t transfer_whole(open_file *file, std::uint32_t count, Transfer transfer)
+// Writes from `source`, or where that is null reads into `target`, at the file's position: until
+// `count` bytes are moved, a call moves none, or an error occurs.
+std::int32_t transfer_whole(open_file *file, std::byte *target, const std::byte *source,
+                            std::uint32_t count)
 {
     if (count > static_cast<std::uint32_t>(INT32_MAX - file->position)) {
         errno = EINVAL;
@@ -119,7 +119,9 @@ std::int32_t transfer_whole(open_file *file, std::uint32_t count, Transfer trans
     }
     std::uint32_t done = 0;
     while (done < count) {
-        const ssize_t moved = transfer(done, off_t{file->position});
+        const ssize_t moved = source != nullptr
+                                  ? ::pwrite(file->fd, source + done, count - done, file->position)
+                                  : ::pread(file->fd, target + done, count - done, file->position);
         if (moved == -1 && errno == EINTR) continue;
         if (moved == -1 && done == 0) return -1;
         if (moved <= 0) break;
@@ -186,9 +188,7 @@ std::int32_t img_platform_read(std::int32_t fd, void *buffer, std::uint32_t coun
     open_file *const file = find_file(fd);
     if (file == nullptr) return -1;
     if (const std::int32_t got = read_head(file, buffer, count); got != -1) return got;
-    return transfer_whole(file, count, [=](std::uint32_t done, off_t position) {
-        return ::pread(fd, static_cast<std::byte *>(buffer) + done, count - done, position);
-    });
+    return transfer_whole(file, static_cast<std::byte *>(buffer), nullptr, count);
 }
 
 std::int32_t img_platform_write(std::int32_t fd, const void *buffer, std::uint32_t count)
@@ -196,9 +196,7 @@ std::int32_t img_platform_write(std::int32_t fd, const void *buffer, std::uint32
     open_file *const file = find_file(fd);
     if (file == nullptr) return -1;
     file->head.length = -1;
-    return transfer_whole(file, count, [=](std::uint32_t done, off_t position) {
-        return ::pwrite(fd, static_cast<const std::byte *>(buffer) + done, count - done, position);
-    });
+    return transfer_whole(file, nullptr, static_cast<const std::byte *>(buffer), count);
 }
 
 std::int32_t img_platform_seek(std::int32_t fd, std::int32_t offset, std::int32_t whence)

@@ -115,8 +115,9 @@ private:
         if (has_tiles(image)) {
             const std::size_t planes =
                 is_interleaved(image) ? static_cast<std::size_t>(image.nbands) : 1;
-            const auto size = static_cast<std::size_t>(image.tile_nlines) *
-                              static_cast<std::size_t>(image.tile_nsamps) * nbytes() * planes;
+            const auto size = static_cast<std::size_t>(std::max(image.tile_nlines, 1)) *
+                              static_cast<std::size_t>(std::max(image.tile_nsamps, 1)) * nbytes() *
+                              planes;
             end = at((stored / size + 1) * size);
         }
         content.resize(std::max(content.size(), end));
