@@ -40,36 +40,38 @@ transfer decoded(fuzz_input &in, const test_geometry &image)
 }
 
 // Samples of the caller's buffer from the first to the last.
-std::int64_t span_of(const transfer &it, const test_geometry &image)
+std::int64_t span_of(const transfer &request, const test_geometry &image)
 {
     const tile_grid grid = tiles_of(image);
-    if (it.tiles) return it.nlines * (grid.height != 0 ? grid.height * grid.width : 1);
-    return (std::int64_t{it.nlines} - 1) * it.pitch() + it.nsamps;
+    if (request.tiles) return request.nlines * (grid.height != 0 ? grid.height * grid.width : 1);
+    return (std::int64_t{request.nlines} - 1) * request.pitch() + request.nsamps;
 }
 
 // Returns -1 when the call is to be refused, 0 when it is to move nothing, and 1 else.
-std::int32_t verdict(const transfer &it, const open_image &image)
+std::int32_t verdict(const transfer &request, const open_image &image)
 {
-    if (image.file.empty() || (it.writes && (image.oflags & 3) == IMG_OPEN_READ_ONLY)) return -1;
-    const std::int32_t wanted = verdict_on(it, image.in_file.image);
-    return wanted == 1 && span_of(it, image.in_file.image) > MOST ? -1 : wanted;
+    if (image.file.empty() || (request.writes && (image.oflags & 3) == IMG_OPEN_READ_ONLY))
+        return -1;
+    const std::int32_t wanted = verdict_on(request, image.in_file.image);
+    return wanted == 1 && span_of(request, image.in_file.image) > MOST ? -1 : wanted;
 }
 
 // Requires that a load left in the buffer what the file holds, as far as it goes.
-void check_load(const transfer &it, file_model expected, const bytes &buffer, std::int32_t result)
+void check_load(const transfer &request, file_model expected, const bytes &buffer,
+                std::int32_t result)
 {
     bytes all(buffer.size(), UNTOUCHED);
-    require(result == expected.load(it, all.begin()), "what the file holds can be loaded");
+    require(result == expected.load(request, all.begin()), "what the file holds can be loaded");
     require(buffer == all, "a load delivers what the file holds");
 }
 
 // Requires that the file holds what a dump wrote and else what it held; after one that failed,
 // each byte either.
-void check_dump(const transfer &it, const file_model &old, const bytes &buffer, std::int32_t result,
-                const bytes &file)
+void check_dump(const transfer &request, const file_model &old, const bytes &buffer,
+                std::int32_t result, const bytes &file)
 {
     file_model expected = old;
-    expected.dump(it, buffer.data(), {0, 0});
+    expected.dump(request, buffer.data(), {0, 0});
     bytes before = old.content;
     require(file.size() >= before.size(), "a dump shortens no file");
     before.resize(file.size());
@@ -78,7 +80,7 @@ void check_dump(const transfer &it, const file_model &old, const bytes &buffer, 
     expected.content.resize(file.size());
     for (std::size_t at = 0; at < file.size(); ++at)
         require(file[at] == expected.content[at] || (result == -1 && file[at] == before[at]),
-                "a file holds what was written, and else what it held");
+                "a file holds what was written, and else its old bytes");
 }
 
 // Returns the model of an image that was just opened, once it has answered as its file does.

@@ -210,27 +210,28 @@ private:
         return lost;
     }
 
-    void act(const transfer &at)
+    void act(const transfer &request)
     {
         const img_desc &desc = *img_find_image(m_handle);
         m_image.swap = desc.swap;
         m_image.virtual_nlines = desc.virtual_tiled != 0 ? desc.tile_nlines : 0;
         m_image.virtual_nsamps = desc.virtual_tiled != 0 ? desc.tile_nsamps : 0;
-        if (at.tiles && !img_is_tiled(&desc)) return;
+        if (request.tiles && !img_is_tiled(&desc)) return;
         const std::int32_t plane = desc.tile_nlines * desc.tile_nsamps;
         m_plane_size = plane * m_image.nbytes;
-        bytes buffer(
-            static_cast<std::size_t>(at.nlines * (at.tiles ? plane : at.nsamps) * m_image.nbytes));
+        bytes buffer(static_cast<std::size_t>(
+            request.nlines * (request.tiles ? plane : request.nsamps) * m_image.nbytes));
         for (auto &byte : buffer)
-            if (at.writes) byte = m_last_byte = static_cast<std::uint8_t>(m_last_byte % 255 + 1);
-        const outcome seen = watch([&] { return carry_out(m_handle, at, buffer.data()); });
+            if (request.writes)
+                byte = m_last_byte = static_cast<std::uint8_t>(m_last_byte % 255 + 1);
+        const outcome seen = watch([&] { return carry_out(m_handle, request, buffer.data()); });
         const bool done = seen.result == 0;
-        expect_told(seen.text, done, at.writes,
-                    img_is_tiled(&desc) && (!at.tiles || is_interleaved(m_image)));
-        for_each_byte(m_image, at, [&](std::size_t i, std::size_t stored) {
+        expect_told(seen.text, done, request.writes,
+                    img_is_tiled(&desc) && (!request.tiles || is_interleaved(m_image)));
+        for_each_byte(m_image, request, [&](std::size_t i, std::size_t stored) {
             std::uint8_t &expected = m_expected[stored], &doubt = m_doubt[stored];
-            if (at.writes) doubt = done ? NO_DOUBT : WRITTEN_IN_PART;
-            if (at.writes && done) expected = buffer[i];
+            if (request.writes) doubt = done ? NO_DOUBT : WRITTEN_IN_PART;
+            if (request.writes && done) expected = buffer[i];
             EXPECT_TRUE(!done || doubt != NO_DOUBT || buffer[i] == expected);
             if (doubt == PERHAPS_LOST && buffer[i] != expected) ++m_lost_bytes;
         });

@@ -28,17 +28,18 @@ std::int32_t sample_of(const test_geometry &image, std::int32_t band, std::int32
 class Golden : public testing::TestWithParam<golden_file> {
 protected:
     // Expects the samples of a window in `rows`, which lie side by side.
-    void expect_samples(const transfer &at, const bytes &rows, bool exchanged = false) const
+    void expect_samples(const transfer &request, const bytes &rows, bool exchanged = false) const
     {
         const test_geometry &image = GetParam().image;
-        for (std::int32_t i = 0; i < at.nlines * at.nsamps; ++i) {
-            const std::int32_t line = at.line + i / at.nsamps, samp = at.samp + i % at.nsamps;
+        for (std::int32_t i = 0; i < request.nlines * request.nsamps; ++i) {
+            const std::int32_t line = request.line + i / request.nsamps,
+                               samp = request.samp + i % request.nsamps;
             if (line >= image.nlines || samp >= image.nsamps) continue;
             auto sample =
                 get_sample(&rows[static_cast<std::size_t>(i * image.nbytes)], image.nbytes);
             if (exchanged) sample = static_cast<std::uint16_t>(sample << 8U | sample >> 8U);
-            ASSERT_EQ(sample, sample_of(image, at.band, line, samp))
-                << at.band << ' ' << line << ' ' << samp;
+            ASSERT_EQ(sample, sample_of(image, request.band, line, samp))
+                << request.band << ' ' << line << ' ' << samp;
         }
     }
 };

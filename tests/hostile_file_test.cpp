@@ -23,25 +23,26 @@ protected:
 
     // Opens the file, which is to be taken or refused, reads of it what is where mistakes would
     // show, and closes it.
-    void check_open(const file_model &it, bool taken) const
+    void check_open(const file_model &model, bool taken) const
     {
         for (const std::int32_t flags : {IMG_OPEN_READ_ONLY, IMG_OPEN_READ_WRITE}) {
-            std::filesystem::remove(m_file);  // far quicker than emptying it
-            write_file(m_file, it.content);
+            std::filesystem::remove(m_file);  // far quicker than truncating it
+            write_file(m_file, model.content);
             const auto written = std::filesystem::last_write_time(m_file) - std::chrono::hours(1);
             std::filesystem::last_write_time(m_file, written);
             memory_arm(0);
             const outcome seen = opening(m_file, flags);
             EXPECT_LT(memory_requested(), 1U << 20U);
             EXPECT_TRUE(taken ? seen.result == 0 : seen == REFUSED_QUIETLY) << seen;
-            if (seen.result == 0) expect_reads(it, seen.result);
+            if (seen.result == 0) expect_reads(model, seen.result);
             img_closefile(seen.result);
             const bool completed = taken && flags == IMG_OPEN_READ_WRITE;
             const std::size_t end =
-                completed ? static_cast<std::size_t>(it.data_offset) + stored_bytes(it.image) : 0;
-            check_content(it.content, std::max(it.content.size(), end));
+                completed ? static_cast<std::size_t>(model.data_offset) + stored_bytes(model.image)
+                          : 0;
+            check_content(model.content, std::max(model.content.size(), end));
             EXPECT_TRUE(completed || std::filesystem::last_write_time(m_file) == written);
-            if (HasFailure()) FAIL() << flags << ' ' << testing::PrintToString(it.content);
+            if (HasFailure()) FAIL() << flags << ' ' << testing::PrintToString(model.content);
         }
     }
     // Creates an image of any geometry, and if it is possible, writes and reads its last sample.
@@ -92,11 +93,11 @@ TEST_F(HostileFile, MayHaveAnyNumbersInItsHeader)
                                                      {132, 7, 9, 3, 1, 0, 0},
                                                      {132, 7, 9, 2, 1, 4, 2},
                                                      {132, 7, 9, 0, 0, 8, 8}};
-    for_some(4 * 7 * 7 * 12 * 12, [&](std::size_t at) {
-        if (at / 4 % 7 > at / 28 % 7) return;  // each pair once
-        auto fields = bases[at % 4];
-        fields[at / 4 % 7] = NUMBERS[at / 196 % 12];
-        fields[at / 28 % 7] = NUMBERS[at / 196 / 12];
+    for_some(4 * 7 * 7 * 12 * 12, [&](std::size_t index) {
+        if (index / 4 % 7 > index / 28 % 7) return;  // each pair once
+        auto fields = bases[index % 4];
+        fields[index / 4 % 7] = NUMBERS[index / 196 % 12];
+        fields[index / 28 % 7] = NUMBERS[index / 196 / 12];
         const auto [header_length, nlines, nsamps, nbands, code, tile_nsamps, tile_nlines] = fields;
         const auto nbytes = static_cast<std::int32_t>(static_cast<std::uint32_t>(code) + 1);
         const test_geometry image{nlines, nsamps, nbands, nbytes, tile_nsamps, tile_nlines};
@@ -126,12 +127,12 @@ TEST_F(HostileFile, MayHaveItsPartsAnywhereAndInEitherByteOrder)
 
 TEST_F(HostileFile, MayHaveAnyNumbersInItsTrailer)
 {
-    for_some(12 * 12 * 12, [&](std::size_t at) {
-        test_geometry image{NUMBERS[at % 12], NUMBERS[at / 12 % 12], NUMBERS[at / 144]};
-        check_open({image, 0, numbered(helava_file(image, 40, at % 2 == 0), 0, 40)},
+    for_some(12 * 12 * 12, [&](std::size_t index) {
+        test_geometry image{NUMBERS[index % 12], NUMBERS[index / 12 % 12], NUMBERS[index / 144]};
+        check_open({image, 0, numbered(helava_file(image, 40, index % 2 == 0), 0, 40)},
                    is_within_limits(image, 0));
         check_create(IMG_TYPE_HELAVA, image, HELAVA_TRAILER);
-        image.nbytes = at % 5 == 0 ? 0 : 2;  // for which the trailer has no field
+        image.nbytes = index % 5 == 0 ? 0 : 2;  // for which the trailer has no field
         check_create(IMG_TYPE_HELAVA, image, HELAVA_TRAILER);
     });
 }
@@ -165,10 +166,10 @@ TEST_F(HostileFile, IsReadAsFarAsItGoes)
                 {image, TEST_HEADER_LENGTH, numbered(file, TEST_HEADER_LENGTH, file.size())});
         }
     }
-    for_some(files.size() * 400, [&](std::size_t at) {
-        file_model file = files[at % files.size()];
-        if (at / files.size() > file.content.size()) return;
-        file.content.resize(at / files.size());
+    for_some(files.size() * 400, [&](std::size_t index) {
+        file_model file = files[index % files.size()];
+        if (index / files.size() > file.content.size()) return;
+        file.content.resize(index / files.size());
         const std::size_t needed = file.data_offset == TEST_HEADER_LENGTH ? 36 : 180;
         check_open(file, file.content.size() >= needed);
     });

@@ -80,12 +80,12 @@ TEST_F(Platform, AsksForTheHeadOfAFileOnce)
     const bytes content = numbered(bytes(600), 0, 600);
     write_file(m_file, content);
     std::int32_t fd = img_platform_open(m_file.c_str(), 2, 0);
-    const auto expect = [&](std::int32_t at, std::uint32_t count, const bytes &expected) {
+    const auto expect = [&](std::int32_t position, std::uint32_t count, const bytes &expected) {
         bytes block(count);
-        img_platform_seek(fd, at, 0);
+        img_platform_seek(fd, position, 0);
         block.resize(static_cast<std::size_t>(img_platform_read(fd, &block[0], count)));
         EXPECT_EQ(block, expected);
-        EXPECT_EQ(img_platform_seek(fd, 0, 1), at + std::ssize(block));
+        EXPECT_EQ(img_platform_seek(fd, 0, 1), position + std::ssize(block));
     };
     for (const auto &[at, count] : {std::pair{0, 4}, {112, 68}, {0, 600}, {510, 3}, {590, 20}})
         expect(at, static_cast<std::uint32_t>(count),

@@ -110,11 +110,12 @@ private:
         for (auto &byte : some) byte = static_cast<std::uint8_t>(m_random.below(256));
         return some;
     }
-    bytes random_buffer(const transfer &at)
+    bytes random_buffer(const transfer &request)
     {
         const tile_grid grid = tiles_of(m_model.image);
-        return random_bytes(static_cast<std::size_t>(
-            m_image.nbytes * at.nlines * (at.tiles ? grid.height * grid.width : at.pitch())));
+        return random_bytes(
+            static_cast<std::size_t>(m_image.nbytes * request.nlines *
+                                     (request.tiles ? grid.height * grid.width : request.pitch())));
     }
     void expect_stored() const
     {
@@ -128,22 +129,24 @@ private:
 
     // While changed tiles wait in a cache, the file may not be as long yet as they will make it,
     // and the cache may have more than was asked to be stored.
-    void load(const transfer &at)
+    void load(const transfer &request)
     {
-        bytes buffer = random_buffer(at), expected = buffer;
+        bytes buffer = random_buffer(request), expected = buffer;
         const std::uint8_t fill = random_bytes(1)[0];
-        const std::int32_t wanted = m_model.load(at, expected.begin(), fill);
-        std::int32_t result = ::load(m_handle, at, buffer.data(), &fill);
-        bool moves = at.tiles;
-        for_each_byte(m_model.image, at, [&](auto, auto) { moves = true; });
+        const std::int32_t wanted = m_model.load(request, expected.begin(), fill);
+        std::int32_t result = ::load(m_handle, request, buffer.data(), &fill);
+        bool moves = request.tiles;
+        for_each_byte(m_model.image, request, [&](auto, auto) { moves = true; });
         if (m_where == storage::memory && img_is_tiled(m_desc) && moves) {
             EXPECT_EQ(result, -1);  // quietly
-            if (!at.tiles) return;
-            result = img_std_read_tiles(m_desc, at.line, at.nlines, at.band, buffer.data());
+            if (!request.tiles) return;
+            result = img_std_read_tiles(m_desc, request.line, request.nlines, request.band,
+                                        buffer.data());
         }
-        if (m_desc->virtual_tiled != 0 && at.tiles) {  // beyond the image they hold anything
+        if (m_desc->virtual_tiled != 0 && request.tiles) {  // beyond the image they hold anything
             bytes inside = expected;
-            for_each_byte(m_model.image, at, [&](std::size_t i, auto) { inside[i] = buffer[i]; });
+            for_each_byte(m_model.image, request,
+                          [&](std::size_t i, auto) { inside[i] = buffer[i]; });
             buffer = inside;
         }
         if (m_complete || !is_cached()) {
@@ -156,17 +159,19 @@ private:
             EXPECT_EQ(buffer, expected);
         }
     }
-    void dump(const transfer &at)
+    void dump(const transfer &request)
     {
-        const bytes given = random_buffer(at), fill = is_cached() ? bytes(2) : random_bytes(2);
+        const bytes given = random_buffer(request), fill = is_cached() ? bytes(2) : random_bytes(2);
         bytes buffer = given;
-        const auto dumps = [&] { EXPECT_EQ(::dump(m_handle, at, buffer.data(), &fill[0]), 0); };
+        const auto dumps = [&] {
+            EXPECT_EQ(::dump(m_handle, request, buffer.data(), &fill[0]), 0);
+        };
         if (m_desc->virtual_tiled != 0)  // what is not stored yet is looked for line by line
             EXPECT_EQ(printed_by(dumps).find("tiles"), std::string::npos);
         else
             dumps();
         EXPECT_EQ(buffer, given);
-        m_model.dump(at, given.data(), fill);
+        m_model.dump(request, given.data(), fill);
     }
     // Another program appends to the file, which may end within a tile then. Of interleaved tiles
     // only whole samples are ever taken back.

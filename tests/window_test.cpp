@@ -21,17 +21,17 @@ protected:
             in_memory ? create_test_memory(image) : open_test_file(m_name, IMG_OPEN_READ_WRITE);
         m_model = {image, 0, bytes(stored_bytes(image))};
     }
-    void check(const transfer &at)
+    void check(const transfer &request)
     {
         std::uint64_t end = 0;  // bytes of the buffer up to the last sample that is moved
-        std::int32_t verdict = verdict_on(at, m_model.image);
-        if (verdict == 1 && at.writes)
-            for_each_byte(m_model.image, at,
+        std::int32_t verdict = verdict_on(request, m_model.image);
+        if (verdict == 1 && request.writes)
+            for_each_byte(m_model.image, request,
                           [&](std::size_t i, auto) { end = std::max(end, i + 1); });
-        if (verdict == 1 && !at.writes)
-            end = (static_cast<std::uint64_t>(at.nlines - 1) *
-                       static_cast<std::uint64_t>(at.pitch()) +
-                   static_cast<std::uint64_t>(at.nsamps)) *
+        if (verdict == 1 && !request.writes)
+            end = (static_cast<std::uint64_t>(request.nlines - 1) *
+                       static_cast<std::uint64_t>(request.pitch()) +
+                   static_cast<std::uint64_t>(request.nsamps)) *
                   static_cast<std::uint64_t>(m_model.image.nbytes);
         if (end > INT32_MAX) verdict = -1;
         if (verdict == -1) end = 0;
@@ -39,11 +39,12 @@ protected:
         for (std::uint8_t &byte : m_room) byte = static_cast<std::uint8_t>(m_random.below(256));
         bytes expected(m_room.begin(), m_room.end());
         const std::size_t first = m_room.size() - end;
-        if (verdict == 1 && at.writes) m_model.dump(at, &m_room[0] + first, {0, 0});
-        if (verdict == 1 && !at.writes)
-            m_model.load(at, expected.begin() + static_cast<std::ptrdiff_t>(first));
-        EXPECT_EQ(carry_out(m_image, at, m_room.data() + first, at.writes ? nullptr : &FILL),
-                  std::min(verdict, 0));
+        if (verdict == 1 && request.writes) m_model.dump(request, &m_room[0] + first, {0, 0});
+        if (verdict == 1 && !request.writes)
+            m_model.load(request, expected.begin() + static_cast<std::ptrdiff_t>(first));
+        EXPECT_EQ(
+            carry_out(m_image, request, m_room.data() + first, request.writes ? nullptr : &FILL),
+            std::min(verdict, 0));
         EXPECT_TRUE(std::ranges::equal(m_room, expected));
     }
 

@@ -17,7 +17,7 @@ std::int32_t img_std_create(img_desc *desc);
 // Makes an in-memory image of the geometry in the record, all samples 0.
 std::int32_t img_std_create_mem(img_desc *desc);
 // Completes a file that is too short with zero bytes and closes it; frees the state. Returns the
-// result of closing the data descriptor, 0 when there is none.
+// result of closing the data descriptor, 0 without one.
 std::int32_t img_std_close(img_desc *desc);
 // Closes the descriptors, frees the state and removes the image's files. Returns the result of
 // removing the file that bears the image's name.

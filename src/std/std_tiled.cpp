@@ -184,7 +184,7 @@ struct row_write {
 
 // How a row of tiles keeps the samples that the region does not cover.
 enum class keeping {
-    nothing,      // there are none: the run is stored as it is
+    nothing,      // the region covers the whole run, which is stored as it is
     other_lines,  // only the lines that the region touches are read, on loan, and stored
     lent_run,     // the whole run is read on loan, overlaid and stored
     read_run      // the whole run is filled, pre-read, overlaid and stored

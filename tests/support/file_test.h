@@ -27,9 +27,9 @@ struct outcome {
     std::string text;
 
     bool operator==(const outcome &) const = default;
-    friend std::ostream &operator<<(std::ostream &out, const outcome &it)
+    friend std::ostream &operator<<(std::ostream &out, const outcome &seen)
     {
-        return out << it.result << ", errno " << it.error << ", \"" << it.text << '"';
+        return out << seen.result << ", errno " << seen.error << ", \"" << seen.text << '"';
     }
 };
 inline const outcome REFUSED_QUIETLY{-1, 22, ""};
@@ -99,9 +99,10 @@ inline void expect_reads(file_model expected, img_handle image)
     EXPECT_EQ(answers,
               (std::array{it.nlines, it.nsamps, it.tile_nsamps, it.tile_nlines, it.nbands}));
     img_chain_init(image);
-    const auto expect = [&](const transfer &at, std::int64_t samples) {
+    const auto expect = [&](const transfer &request, std::int64_t samples) {
         bytes buffer(static_cast<std::size_t>(samples * it.nbytes), UNTOUCHED), wanted = buffer;
-        EXPECT_EQ(load(image, at, buffer.data(), &FILL), expected.load(at, wanted.begin()));
+        EXPECT_EQ(load(image, request, buffer.data(), &FILL),
+                  expected.load(request, wanted.begin()));
         EXPECT_EQ(buffer, wanted);
     };
     const tile_grid grid = tiles_of(it);

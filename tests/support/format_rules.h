@@ -10,10 +10,10 @@ inline constexpr std::int32_t VITEC_MAGIC = 0x005B0720, HELAVA_MAGIC = 0x4841148
 inline constexpr bool IS_LITTLE_ENDIAN = std::endian::native == std::endian::little;
 
 // Stores a word, unless it would not lie within the file.
-inline void put_word(bytes &file, std::size_t at, std::int64_t word, bool little_endian = false)
+inline void put_word(bytes &file, std::size_t offset, std::int64_t word, bool little_endian = false)
 {
-    for (std::size_t i = 0; at <= file.size() - 4 && i < 4; ++i)
-        file[at + i] = static_cast<std::uint8_t>(word >> 8 * (little_endian ? i : 3 - i));
+    for (std::size_t i = 0; offset <= file.size() - 4 && i < 4; ++i)
+        file[offset + i] = static_cast<std::uint8_t>(word >> 8 * (little_endian ? i : 3 - i));
 }
 
 // Bytes of an image block, each the first of a word.
@@ -40,8 +40,8 @@ inline bytes vitec_file(const test_geometry &image, std::size_t length = VITEC_H
                         const vitec_variant &variant = {})
 {
     bytes file(length);
-    const auto put = [&](std::size_t at, std::int64_t word) {
-        put_word(file, at, word, variant.little_endian);
+    const auto put = [&](std::size_t offset, std::int64_t word) {
+        put_word(file, offset, word, variant.little_endian);
     };
     const auto block = static_cast<std::size_t>(std::int64_t{variant.link} + 4);
     put(0, VITEC_MAGIC);

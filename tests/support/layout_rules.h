@@ -69,36 +69,39 @@ inline tile_grid tiles_of(const test_geometry &image)
 }
 
 // Returns -1 when a transfer is to be refused, 0 when it is to move nothing, and 1 else.
-inline std::int32_t verdict_on(const transfer &at, const test_geometry &image)
+inline std::int32_t verdict_on(const transfer &request, const test_geometry &image)
 {
     const tile_grid grid = tiles_of(image);
-    if (at.tiles && (grid.height == 0 || at.nlines < 1)) return 0;
-    if (at.band < 0 || at.band >= image.nbands) return -1;
-    if (at.tiles)
-        return at.line >= 0 && std::int64_t{at.line} + at.nlines <= grid.across * grid.down ? 1
-                                                                                            : -1;
+    if (request.tiles && (grid.height == 0 || request.nlines < 1)) return 0;
+    if (request.band < 0 || request.band >= image.nbands) return -1;
+    if (request.tiles)
+        return request.line >= 0 &&
+                       std::int64_t{request.line} + request.nlines <= grid.across * grid.down
+                   ? 1
+                   : -1;
     // Rows of a dump that lie partly over each other are taken while the bytes of a stride suffice.
-    if (at.nsamps > std::int64_t{at.pitch()} * (at.writes ? image.nbytes : 1)) return -1;
-    return at.nlines > 0 && at.nsamps > 0 ? 1 : 0;
+    if (request.nsamps > std::int64_t{request.pitch()} * (request.writes ? image.nbytes : 1))
+        return -1;
+    return request.nlines > 0 && request.nsamps > 0 ? 1 : 0;
 }
 
 // Calls `visit(in_buffer, stored)` with the offsets of every byte that a transfer moves, in the
 // buffer and behind the header, in the order of the buffer.
 template <typename Visit>
-void for_each_byte(const test_geometry &image, const transfer &at, Visit visit)
+void for_each_byte(const test_geometry &image, const transfer &request, Visit visit)
 {
     const auto visit_sample = [&](std::int64_t i, std::int64_t line, std::int64_t samp) {
-        const std::int64_t stored = stored_at(image, at.band, line, samp);
-        const std::int64_t exchange = !at.tiles && image.swap != 0 ? image.nbytes - 1 : 0;
+        const std::int64_t stored = stored_at(image, request.band, line, samp);
+        const std::int64_t exchange = !request.tiles && image.swap != 0 ? image.nbytes - 1 : 0;
         for (std::int64_t k = 0; k < image.nbytes; ++k)
             visit(static_cast<std::size_t>(i) * static_cast<std::size_t>(image.nbytes) +
                       static_cast<std::size_t>(k),
                   static_cast<std::size_t>(stored + (k ^ exchange)));
     };
-    if (at.tiles) {
+    if (request.tiles) {
         const auto [height, width, across, down] = tiles_of(image);
-        for (std::int64_t i = 0; i < at.nlines * height * width; ++i) {
-            const std::int64_t tile = at.line + i / (height * width);
+        for (std::int64_t i = 0; i < request.nlines * height * width; ++i) {
+            const std::int64_t tile = request.line + i / (height * width);
             const std::int64_t line = tile / across * height + i / width % height;
             const std::int64_t samp = tile % across * width + i % width;
             if (has_tiles(image) || (line < image.nlines && samp < image.nsamps))
@@ -107,12 +110,12 @@ void for_each_byte(const test_geometry &image, const transfer &at, Visit visit)
         return;
     }
     const std::int64_t bottom =
-        std::min<std::int64_t>(std::int64_t{at.line} + at.nlines, image.nlines);
+        std::min<std::int64_t>(std::int64_t{request.line} + request.nlines, image.nlines);
     const std::int64_t right =
-        std::min<std::int64_t>(std::int64_t{at.samp} + at.nsamps, image.nsamps);
-    for (std::int64_t line = std::max(at.line, 0); line < bottom; ++line)
-        for (std::int64_t samp = std::max(at.samp, 0); samp < right; ++samp)
-            visit_sample((line - at.line) * at.pitch() + samp - at.samp, line, samp);
+        std::min<std::int64_t>(std::int64_t{request.samp} + request.nsamps, image.nsamps);
+    for (std::int64_t line = std::max(request.line, 0); line < bottom; ++line)
+        for (std::int64_t samp = std::max(request.samp, 0); samp < right; ++samp)
+            visit_sample((line - request.line) * request.pitch() + samp - request.samp, line, samp);
 }
 
 #endif

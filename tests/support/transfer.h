@@ -17,26 +17,28 @@ struct transfer {
 
 inline constexpr std::uint8_t UNTOUCHED = 0xEE, FILL = 0x55;
 
-inline std::int32_t load(img_handle image, const transfer &at, void *buffer,
+inline std::int32_t load(img_handle image, const transfer &request, void *buffer,
                          const std::uint8_t *fill = nullptr)
 {
-    if (at.tiles) return img_load_tiles(image, at.line, at.nlines, at.band, buffer);
-    return img_load_buffer(image, at.line, at.samp, at.nlines, at.nsamps, at.band, buffer,
-                           at.pitch(), fill);
+    if (request.tiles)
+        return img_load_tiles(image, request.line, request.nlines, request.band, buffer);
+    return img_load_buffer(image, request.line, request.samp, request.nlines, request.nsamps,
+                           request.band, buffer, request.pitch(), fill);
 }
 
-inline std::int32_t dump(img_handle image, const transfer &at, const void *buffer,
+inline std::int32_t dump(img_handle image, const transfer &request, const void *buffer,
                          const std::uint8_t *fill = nullptr)
 {
-    if (at.tiles) return img_dump_tiles(image, at.line, at.nlines, at.band, buffer);
-    return img_dump_buffer(image, at.line, at.samp, at.nlines, at.nsamps, at.band, buffer,
-                           at.pitch(), fill);
+    if (request.tiles)
+        return img_dump_tiles(image, request.line, request.nlines, request.band, buffer);
+    return img_dump_buffer(image, request.line, request.samp, request.nlines, request.nsamps,
+                           request.band, buffer, request.pitch(), fill);
 }
 
-inline std::int32_t carry_out(img_handle image, const transfer &at, void *buffer,
+inline std::int32_t carry_out(img_handle image, const transfer &request, void *buffer,
                               const std::uint8_t *fill = nullptr)
 {
-    return at.writes ? dump(image, at, buffer, fill) : load(image, at, buffer, fill);
+    return request.writes ? dump(image, request, buffer, fill) : load(image, request, buffer, fill);
 }
 
 #endif
