@@ -77,6 +77,11 @@ struct image_kind {
     std::int32_t type;
     test_geometry geometry;
     std::int32_t header_length;  // or that of the trailer
+
+    friend std::ostream &operator<<(std::ostream &out, const image_kind &kind)
+    {
+        return out << kind.name;
+    }
 };
 
 // The life of one file, and what it must hold by then.

@@ -16,6 +16,11 @@ struct golden_file {
     test_geometry image;
     bool little_endian = false;
     std::int32_t data_offset = 0;
+
+    friend std::ostream &operator<<(std::ostream &out, const golden_file &each)
+    {
+        return out << each.name;
+    }
 };
 
 std::int32_t sample_of(const test_geometry &image, std::int32_t band, std::int32_t line,
