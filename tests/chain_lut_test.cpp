@@ -77,7 +77,7 @@ TEST(RandomChain, DoesToTheDataWhatItsLinksDoToEachSample)
 
         const img_buffer_def in{nlines, nsamps, 0, 0, nsamps, nbytes, bits, 0};
         const img_buffer_def out{nlines, nsamps, 0, 0, stride, img_chain_out_nbytes(image), 0, 0};
-        bytes expected(static_cast<std::size_t>(nlines * stride * out.nbytes) + 8, UNTOUCHED);
+        bytes expected(img_count(nlines * stride * out.nbytes) + 8, UNTOUCHED);
         bytes buffer = expected;
         samples computed_from;
         for (std::int32_t i = 0; i < nlines * nsamps; ++i) {

@@ -19,21 +19,7 @@ TEST_F(Chain, GivesALinkWhatItAsksForOrWhatTheImageHas)
         def.nbytes = img_chain_nbytes(bits);
         for (std::int32_t i = 0; i < 15; ++i)
             EXPECT_EQ(get(buffer.data(), def, i),
-                      pixels[static_cast<std::size_t>(i + 5 * lines_more)] >> (12 - bits));
+                      pixels[img_count(i + 5 * lines_more)] >> (12 - bits));
         img_chain_init(image);
     }
-}
-
-// An in-place remap keeps the width that it states, though the samples after it are brought to
-// another.
-TEST_F(Chain, KeepsTheStatedWidthOfALinkInPlace)
-{
-    samples table(1 << 10), pixels(15, 1000);
-    for (std::size_t i = 0; i < table.size(); ++i) table[i] = static_cast<std::uint16_t>(i >> 2U);
-    pixels[1] = 24;
-    dump(image, {.nlines = 3, .nsamps = 5}, pixels.data());
-    img_chain_add_remap_link(image, 3, 10, nullptr, do_nothing, nullptr);
-    img_chain_add_lut_link(image, 5, 10, 8, 1, table.data(), 0);
-    EXPECT_EQ(load(), 0);
-    EXPECT_EQ((std::pair{buffer[0], buffer[1]}), (std::pair<std::uint8_t, std::uint8_t>{250, 6}));
 }

@@ -1,10 +1,12 @@
 // Tests of load_window.cpp, and with it of fill.cpp: what is refused, and two-byte windows as hosts
 // see them, stretched, filled and clipped.
+#include "base/count.h"
 #include "base/types.h"
 #include "support/file_test.h"
 #include "support/random.h"
-#include "support/sample.h"
 #include "support/stretch_model.h"
+
+#include <cstring>
 
 using Windows = FileTest;
 
@@ -58,9 +60,8 @@ TEST_F(Windows, OfTwoByteImagesAreStretchedInEveryPlace)
                                        {.nlines = 150, .nsamps = 170, .nbytes = 2},
                                        {150, 170, 1, 2, 64, 32}}) {
         file_model model = vitec(image, VITEC_HEADER + stored_bytes(image));
-        for (std::size_t i = VITEC_HEADER; i < model.content.size(); i += 2)  // some beyond 12 bits
-            model.content[i] =
-                static_cast<std::uint8_t>(random.below(random.below(8) == 0 ? 40 : 10));
+        for (std::size_t i = VITEC_HEADER; i < model.content.size(); i += 2)  // to beyond 12 bits
+            model.content[i] = static_cast<std::uint8_t>(random.below(1 + random.below(40)));
         write_file(m_file, model.content);
         const img_handle handle = opening(m_name).result;
         const std::int32_t nlines = image.nlines, nsamps = image.nsamps;
@@ -70,22 +71,18 @@ TEST_F(Windows, OfTwoByteImagesAreStretchedInEveryPlace)
                                    {0, -1, -1, nlines + 2, nsamps + 2, nsamps + 9},
                                    {0, nlines, 0, nlines, nsamps, nsamps + 1}}) {
             for (const auto fill : {std::uint8_t{0}, std::uint8_t{200}}) {
-                const std::int32_t count = at.nlines * at.nsamps;
+                const std::size_t width = img_count(at.nsamps), pitch = img_count(at.pitch());
                 transfer packed = at;
                 packed.stride = at.nsamps;
-                bytes raw(static_cast<std::size_t>(count * 2));
-                model.load(packed, raw.begin(), fill);
-                samples window;
-                for (std::size_t i = 0; i < raw.size(); i += 2)
-                    window.push_back(get_sample(&raw[i], 2));
-                const samples lut = expected_stretch(window, at.nsamps, fill, 12, 8);
-                bytes buffer(static_cast<std::size_t>((at.nlines - 1) * at.pitch() + at.nsamps),
-                             UNTOUCHED);
+                samples window(img_count(at.nlines) * width);
+                bytes raw(window.size() * 2), buffer(window.size() / width * pitch, UNTOUCHED);
                 bytes expected = buffer;
-                for (std::int32_t i = 0; i < count; ++i)
-                    expected[static_cast<std::size_t>(i / at.nsamps * at.pitch() + i % at.nsamps)] =
-                        static_cast<std::uint8_t>(
-                            lut[std::min<std::size_t>(window[static_cast<std::size_t>(i)], 4095)]);
+                model.load(packed, raw.begin(), fill);
+                std::memcpy(window.data(), raw.data(), raw.size());
+                const samples lut = expected_stretch(window, at.nsamps, fill, 12, 8);
+                for (std::size_t i = 0; i < window.size(); ++i)
+                    expected[i / width * pitch + i % width] =
+                        static_cast<std::uint8_t>(lut[std::min<std::size_t>(window[i], 4095)]);
                 EXPECT_EQ(load(handle, at, buffer.data(), &fill), 0);
                 ASSERT_EQ(buffer, expected) << at.line << ' ' << nlines;
                 EXPECT_TRUE(at.line < nlines || buffer[0] == (fill == 0 ? 0 : 11));

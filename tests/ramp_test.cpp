@@ -23,13 +23,12 @@ TEST(Ramps, MapAsTheTableDoes)
     int ramps = 0, tables = 0;
     for (; tables < 40 + rounds(1000); ++tables) {
         const std::int32_t bits = tables % 4 == 0 ? random.within(1, 13) : 12, size = 1 << bits;
-        counters histogram(static_cast<std::size_t>(size));
+        counters histogram(img_count(size));
         for (int k = random.within(0, 3); k > 0; --k)
             histogram[random.below(static_cast<std::uint32_t>(size))] += random.below(1000);
         samples table = expected_stretch(histogram, bits, 8);
         if (tables % 7 == 0)
-            std::ranges::fill(table,
-                              samples{0, 1, 255, 256, 300}[static_cast<std::size_t>(tables % 5)]);
+            std::ranges::fill(table, samples{0, 1, 255, 256, 300}[img_count(tables % 5)]);
         if (tables % 5 == 0) table[random.below(static_cast<std::uint32_t>(size))] ^= 1;
         img_chain_ramp ramp;
         ramps += img_chain_find_ramp(table.data(), size, &ramp) ? 1 : 0;

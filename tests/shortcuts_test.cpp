@@ -17,7 +17,6 @@ protected:
     // one whose calls are counted.
     outcome expect_same(const test_geometry &image, const transfer &window, const condition &given)
     {
-        constexpr std::size_t run = 2 * 128 * 128;
         outcome seen[2];
         bytes file[2];
         for (const bool lends : {false, true}) {
@@ -27,7 +26,7 @@ protected:
             host.seconds_later = given.seconds_later;  // 0: what was just written is not lent
             host.disk_size = given.disk_size;
             desc.oflags = given.access | IMG_OPEN_BINARY;
-            std::fill_n(img_take_scratch(run).get(), run, UNTOUCHED);
+            std::fill_n(img_take_scratch(1 << 15).get(), 1 << 15, UNTOUCHED);
             seen[lends] = outcome_of([&] { return dump(handle, window, &m_content[0]); });
             host = {};
             file[lends] = read_file(m_file);

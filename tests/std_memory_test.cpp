@@ -1,13 +1,13 @@
 // Tests of std_memory.cpp, and of regions and tiles of images in memory.
 #include "base/types.h"
 #include "std/std.h"
+#include "std/std_interleaved_lines.h"
+#include "std/std_lines.h"
 #include "std/std_memory.h"
-
 #include "std/std_offset.h"
 #include "std/std_region.h"
 #include "std/std_tiles.h"
 #include "support/file_test.h"
-#include "support/sample.h"
 
 #include <numeric>
 #include <span>
@@ -49,11 +49,11 @@ TEST_F(VirtualIo, MovesAllAtOnceOrBandByBand)
         const std::int32_t transfers = layout % 3 == 0 ? 3 : 1;
         const test_geometry image{20, 6, nbands, 2, tile, 2 * tile, layout};
         open(image, 7);
-        const std::size_t size = m_pixels.size() / static_cast<std::size_t>(transfers);
+        const std::size_t size = m_pixels.size() / img_count(transfers);
         const bytes pixels(m_pixels.begin(), m_pixels.end());
         bytes file = read_file(m_file);
         for (std::int32_t band = 0; band < transfers; ++band)
-            std::copy_n(&pixels[static_cast<std::size_t>(band) * size], size,
+            std::copy_n(&pixels[img_count(band) * size], size,
                         file.begin() + TEST_HEADER_LENGTH + stored_at(image, band, 8, 0));
         EXPECT_EQ(transfer(true), 0);
         EXPECT_EQ(read_file(m_file), file) << "layout " << layout;
@@ -123,8 +123,11 @@ TEST_F(VirtualIo, ReachesThePixelsInMemoryAndNoneBeyond)
 
 TEST(MemoryImages, AreMovedWithinTheirBytesAlone)
 {
-    constexpr std::array<std::int32_t, 5> not_inside[] = {
-        {3, 0, 2, 1, 0}, {0, -1, 1, 1, 0}, {0, INT32_MAX, 1, INT32_MAX, 0}, {0, 0, 1, 1, 2}};
+    constexpr transfer cases[] = {{.nsamps = 0},
+                                  {.line = 3, .nlines = 2},
+                                  {.samp = -1},
+                                  {.samp = INT32_MAX, .nsamps = INT32_MAX},
+                                  {.band = 2}};
     for (std::int32_t layout = IMG_LAYOUT_BSQ; layout <= 5; ++layout) {
         const bool tiled = layout >= IMG_LAYOUT_TILED && layout <= IMG_LAYOUT_TILED_BIP;
         const test_geometry image{4, 10, 2, 2, tiled ? 5 : 0, tiled ? 4 : 0, layout};
@@ -142,16 +145,20 @@ TEST(MemoryImages, AreMovedWithinTheirBytesAlone)
         file->veof = file->veof_max = last - 1;
         EXPECT_TRUE(refusal(load).ends_with(" beyond virtual eof!!\n"));
         EXPECT_TRUE(refusal(dump).ends_with(" past virtual eof!!\n"));
-        EXPECT_EQ(desc->mem_image[static_cast<std::size_t>(last)], 0);
+        EXPECT_EQ(desc->mem_image[img_count(last)], 0);
         file->veof_max = last;
         EXPECT_EQ(dump() + load(), 0);
         EXPECT_EQ(file->veof, last);
         EXPECT_EQ(img_std_sample_offset(desc, 3, 9, 1), layout == 5 ? 0 : last - 1);
-        for (const auto &[line, samp, nlines, nsamps, band] : not_inside) {
-            EXPECT_EQ(img_std_read(desc, line, samp, nlines, nsamps, band, nullptr, 1), -1);
+        for (const auto &[band, line, samp, nlines, nsamps, stride, tiles, writes] : cases) {
+            const std::int32_t result = nsamps == 0 ? 0 : -1;
+            EXPECT_EQ(img_std_read(desc, line, samp, nlines, nsamps, band, nullptr, 1), result);
             EXPECT_EQ(img_std_write(desc, line, samp, nlines, nsamps, band, nullptr, 1, nullptr),
-                      -1);
+                      result);
         }
+        EXPECT_EQ(img_read_nontiled(desc, 0, 0, -1, 1, 0, nullptr, 1), 0);
+        EXPECT_EQ(img_std_write_nontiled(desc, 0, 0, -1, 1, 0, nullptr, 1, nullptr), 0);
+        EXPECT_EQ(img_std_read_nontiled_interleaved(desc, 0, 0, -1, 1, 0, nullptr, 1), 0);
         img_closefile(desc->handle);
     }
 }

@@ -8,6 +8,7 @@
 #include "io/io_method.h"
 #include "std/std.h"
 #include "std/std_setup.h"
+#include "std/std_tiles.h"
 #include "std/std_virtual_tiles.h"
 #include "support/file_test.h"
 
@@ -15,14 +16,7 @@
 
 namespace {
 
-class StdFile : public FileTest {
-protected:
-    // Creates an image of the test type, which takes any layout; null: refused.
-    img_desc *create(const test_geometry &image) const
-    {
-        return img_find_image(create_test_file(m_name, image));
-    }
-};
+using StdFile = FileTest;
 constexpr std::int32_t HEADER = TEST_HEADER_LENGTH;
 
 TEST_F(StdFile, RefusesLayoutsThatCannotHoldTheImage)
@@ -36,7 +30,7 @@ TEST_F(StdFile, RefusesLayoutsThatCannotHoldTheImage)
                                    {0, 0, 1, 1, max, max, IMG_LAYOUT_TILED},
                                    {2 * large, 2 * large}};
     for (const test_geometry &image : cases) {
-        printed_by([&] { EXPECT_EQ(create(image), nullptr); });
+        EXPECT_EQ(outcome_of([&] { return create_test_file(m_name, image); }).result, -1);
         EXPECT_EQ(create_test_memory(image), -1);
         EXPECT_EQ(opening(m_name), REFUSED_QUIETLY);
         EXPECT_EQ(read_file(m_file).size(), HEADER);
@@ -44,7 +38,7 @@ TEST_F(StdFile, RefusesLayoutsThatCannotHoldTheImage)
     // In memory the bands count.
     EXPECT_EQ(create_test_memory({1, 1, 3, 1, large / 2, large, IMG_LAYOUT_TILED_BIP}), -1);
     for (const auto &[nbytes, nbits] : {std::array{1, 0}, {1, 9}, {2, 8}, {2, 17}}) {
-        img_desc *const desc = create({.nbytes = nbytes});
+        img_desc *const desc = img_find_image(create_test_file(m_name, {.nbytes = nbytes}));
         desc->nbits = nbits;
         EXPECT_EQ(img_std_setup(desc), -1);
         img_closefile(desc->handle);
@@ -64,13 +58,14 @@ TEST_F(StdFile, GivesVirtualTilesToUntiledImagesIfTilesAreCached)
     // Megabytes, default tile width and height, whether the type reads tiles in its own way.
     constexpr std::array<std::int32_t, 4> cases[] = {
         {1, 128, 64, 0}, {0, 128, 64, 0}, {1, 0, 64, 0}, {1, 128, 0, 0}, {1, 128, 64, 1}};
-    img_closefile(create({.nlines = 70, .nsamps = 300, .nbands = 2, .nbytes = 2})->handle);
+    img_closefile(
+        create_test_file(m_name, {.nlines = 70, .nsamps = 300, .nbands = 2, .nbytes = 2}));
     for (const auto &[megabytes, tile_nsamps, tile_nlines, own] : cases) {
         const setting cache_mb(img_cache_mb, megabytes);
         const setting width(img_default_tile_nsamps, tile_nsamps),
             height(img_default_tile_nlines, tile_nlines);
-        auto &read_tiles = img_type_table[TEST_TYPE].read_tiles;
-        const setting reads(read_tiles, own != 0 ? img_std_read_virtual_tiles : +read_tiles);
+        const setting reads(img_type_table[TEST_TYPE].read_tiles,
+                            own != 0 ? img_std_read_virtual_tiles : img_std_read_tiles);
         const img_desc &desc = *img_find_image(opening(m_name).result);
         const img_std_file &file = *desc.std_file;
         EXPECT_EQ((std::array{desc.virtual_tiled, desc.layout, desc.tile_nsamps, desc.tile_nlines,
@@ -88,12 +83,11 @@ TEST_F(StdFile, StandsAtItsStartOnceItIsOpenAndIsSharedByItsMode)
     img_closefile(creating(m_file, IMG_TYPE_HELAVA, {.nlines = 100}).result);
     EXPECT_EQ(static_cast<unsigned>(std::filesystem::status(m_file).permissions()), 0666U);
     for (const std::int32_t type : {IMG_TYPE_HELAVA, IMG_TYPE_VITEC}) {
-        const img_handle handles[] = {creating(m_name, type, {.nlines = 100}).result,
-                                      opening(m_name).result};
-        for (const img_handle handle : handles) {
-            const img_desc &desc = *img_find_image(handle);
+        for (const bool created : {true, false}) {
+            const img_desc &desc = *img_find_image(
+                (created ? creating(m_name, type, {.nlines = 100}) : opening(m_name)).result);
             EXPECT_EQ(desc.io_method->seek(desc.std_file->data_fd, 0, IMG_SEEK_CURRENT), 0);
-            img_closefile(handle);
+            img_closefile(desc.handle);
         }
     }
 }
@@ -113,7 +107,7 @@ TEST_F(StdFile, InMemoryHasThePaddedWidthAndCannotBeDeleted)
 
 TEST_F(StdFile, ClosesWhatIsOpenOnceAndOpensNothingTooShort)
 {
-    img_desc *const desc = create({});
+    img_desc *const desc = img_find_image(create_test_file(m_name, {}));
     desc->std_file->hdr_fd = -1;
     img_std_fail_close(desc);
     img_std_fail_close(desc);
@@ -149,7 +143,7 @@ TEST_F(StdFile, ClosesBothDescriptorsAndDeletesBothFiles)
                  {img_std_delete, io_call::unlink, 2, -1, false, HEADER}};
     for (const auto &each : cases) {
         write_file(companion, {1});
-        img_desc *const desc = create({100});
+        img_desc *const desc = img_find_image(create_test_file(m_name, {100}));
         desc->std_file->hdr_fd = desc->io_method->open(m_file.c_str(), 0, 0);
         desc->std_file->companion_name = img_copy_name(companion);
         fault_arm(each.call, each.failing);

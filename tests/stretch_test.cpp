@@ -4,7 +4,6 @@
 #include "support/effort.h"
 #include "support/random.h"
 #include "support/refusal.h"
-#include "support/sample.h"
 #include "support/stretch_model.h"
 
 namespace {

@@ -17,10 +17,7 @@ struct file_model {
     bytes content{};
     std::string text{};  // what the loads so far are to print
 
-    std::size_t at(std::size_t stored) const
-    {
-        return static_cast<std::size_t>(data_offset) + stored;
-    }
+    std::size_t at(std::size_t stored) const { return img_count(data_offset) + stored; }
     // Does to `buffer` what a load does that is not refused, and returns its result. Lines, or rows
     // of tiles, are delivered until one is not whole in the file.
     std::int32_t load(const transfer &window, bytes::iterator buffer, std::uint8_t fill = FILL)
@@ -28,7 +25,7 @@ struct file_model {
         if (window.tiles) {
             // What the file has of a tile is there; of interleaved pixels, whole samples are.
             bool whole = !has_tiles(image) || reads(window.band, window.line, window.nlines);
-            const std::size_t pixel = has_tiles(image) ? 1 : static_cast<std::size_t>(image.nbands);
+            const std::size_t pixel = has_tiles(image) ? 1 : img_count(image.nbands);
             const std::size_t unit = is_interleaved(image) ? nbytes() * pixel : 1;
             for_each_byte(image, window, [&](std::size_t to, std::size_t stored) {
                 if (at((stored / unit + 1) * unit) <= content.size())
@@ -81,7 +78,12 @@ struct file_model {
     void complete() { content.resize(std::max(content.size(), at(stored_bytes(image)))); }
 
 private:
-    std::size_t nbytes() const { return static_cast<std::size_t>(image.nbytes); }
+    std::size_t nbytes() const { return img_count(image.nbytes); }
+    std::int64_t tile_bytes() const
+    {
+        const tile_grid grid = tiles_of(image);
+        return grid.height * grid.width * image.nbytes * (is_interleaved(image) ? image.nbands : 1);
+    }
     // Where the part of a window that lies in the image ends.
     std::int64_t bottom_of(const transfer &window) const
     {
@@ -111,16 +113,8 @@ private:
     // The file grows by whole tiles where it has such.
     void store(std::size_t stored, std::uint8_t value)
     {
-        std::size_t end = at(stored) + 1;
-        if (has_tiles(image)) {
-            const std::size_t planes =
-                is_interleaved(image) ? static_cast<std::size_t>(image.nbands) : 1;
-            const auto size = static_cast<std::size_t>(std::max(image.tile_nlines, 1)) *
-                              static_cast<std::size_t>(std::max(image.tile_nsamps, 1)) * nbytes() *
-                              planes;
-            end = at((stored / size + 1) * size);
-        }
-        content.resize(std::max(content.size(), end));
+        const std::size_t size = has_tiles(image) ? img_count(tile_bytes()) : 1;
+        content.resize(std::max(content.size(), at((stored / size + 1) * size)));
         content[at(stored)] = value;
     }
 
@@ -148,8 +142,7 @@ private:
         const std::int64_t first =
             stored_at(image, is_interleaved(image) ? image.band_shift : band,
                       first_tile / across * height, first_tile % across * width);
-        const std::int64_t size =
-            height * width * image.nbytes * (is_interleaved(image) ? image.nbands : 1);
+        const std::int64_t size = tile_bytes();
         return separate ? reads_pieces(first, ntiles, size, size * image.nbands)
                         : reads_pieces(first, 1, size * ntiles, 0);
     }

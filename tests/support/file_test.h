@@ -100,7 +100,7 @@ inline void expect_reads(file_model expected, img_handle image)
               (std::array{it.nlines, it.nsamps, it.tile_nsamps, it.tile_nlines, it.nbands}));
     img_chain_init(image);
     const auto expect = [&](const transfer &request, std::int64_t samples) {
-        bytes buffer(static_cast<std::size_t>(samples * it.nbytes), UNTOUCHED), wanted = buffer;
+        bytes buffer(img_count(samples * it.nbytes), UNTOUCHED), wanted = buffer;
         EXPECT_EQ(load(image, request, buffer.data(), &FILL),
                   expected.load(request, wanted.begin()));
         EXPECT_EQ(buffer, wanted);

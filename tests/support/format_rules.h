@@ -17,17 +17,9 @@ inline void put_word(bytes &file, std::size_t offset, std::int64_t word, bool li
 }
 
 // Bytes of an image block, each the first of a word.
-enum vitec_word : std::int32_t {
-    VITEC_HEADER_LENGTH = 0,
-    VITEC_VERSION = 24,
-    VITEC_NSAMPS = 36,
-    VITEC_NLINES = 40,
-    VITEC_TILE_NSAMPS = 44,
-    VITEC_TILE_NLINES = 48,
-    VITEC_NBANDS = 56,
-    VITEC_NBYTES_CODE = 60,
-    VITEC_BLOCK = 68
-};
+inline constexpr std::int32_t VITEC_HEADER_LENGTH = 0, VITEC_VERSION = 24, VITEC_NSAMPS = 36,
+                              VITEC_NLINES = 40, VITEC_TILE_NSAMPS = 44, VITEC_TILE_NLINES = 48,
+                              VITEC_NBANDS = 56, VITEC_NBYTES_CODE = 60, VITEC_BLOCK = 68;
 
 struct vitec_variant {
     std::int32_t link = 108;  // the image block lies 4 bytes further
@@ -43,7 +35,7 @@ inline bytes vitec_file(const test_geometry &image, std::size_t length = VITEC_H
     const auto put = [&](std::size_t offset, std::int64_t word) {
         put_word(file, offset, word, variant.little_endian);
     };
-    const auto block = static_cast<std::size_t>(std::int64_t{variant.link} + 4);
+    const auto block = img_count(std::int64_t{variant.link} + 4);
     put(0, VITEC_MAGIC);
     put(4, variant.link);
     put(block + VITEC_HEADER_LENGTH, variant.header_length);
@@ -72,7 +64,7 @@ inline bytes helava_file(const test_geometry &image, std::size_t nsamples,
 // Gives the bytes from `first` to `end` values that show where they lie.
 inline bytes numbered(bytes content, std::int64_t first, std::size_t end)
 {
-    for (auto at = static_cast<std::size_t>(first); at < end; ++at)
+    for (auto at = img_count(first); at < end; ++at)
         content[at] = static_cast<std::uint8_t>(at * 7 + at / 256);
     return content;
 }
@@ -133,8 +125,7 @@ inline std::optional<file_model> recognised(const bytes &file)
             const auto word = [&](std::int64_t at) {
                 std::uint32_t value = 0;
                 for (std::int64_t i = 0; i < 4; ++i)
-                    value = value << 8U |
-                            file[static_cast<std::size_t>(at + (little_endian ? 3 - i : i))];
+                    value = value << 8U | file[img_count(at + (little_endian ? 3 - i : i))];
                 return static_cast<std::int32_t>(value);
             };
             const std::int64_t length = std::ssize(file), trailer = length - HELAVA_TRAILER;

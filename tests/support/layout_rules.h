@@ -50,9 +50,8 @@ inline std::int64_t stored_at(const test_geometry &image, std::int64_t band, std
 // Bytes of all pixels.
 inline std::size_t stored_bytes(const test_geometry &image)
 {
-    return static_cast<std::size_t>(stored_extent(image.nlines, image.tile_nlines) *
-                                    stored_extent(image.nsamps, image.tile_nsamps) * image.nbands *
-                                    image.nbytes);
+    return img_count(stored_extent(image.nlines, image.tile_nlines) *
+                     stored_extent(image.nsamps, image.tile_nsamps) * image.nbands * image.nbytes);
 }
 
 // The tiles that transfers count: those stored, or those that the cache gives to an untiled image.
@@ -94,9 +93,8 @@ void for_each_byte(const test_geometry &image, const transfer &request, Visit vi
         const std::int64_t stored = stored_at(image, request.band, line, samp);
         const std::int64_t exchange = !request.tiles && image.swap != 0 ? image.nbytes - 1 : 0;
         for (std::int64_t k = 0; k < image.nbytes; ++k)
-            visit(static_cast<std::size_t>(i) * static_cast<std::size_t>(image.nbytes) +
-                      static_cast<std::size_t>(k),
-                  static_cast<std::size_t>(stored + (k ^ exchange)));
+            visit(img_count(i) * img_count(image.nbytes) + img_count(k),
+                  img_count(stored + (k ^ exchange)));
     };
     if (request.tiles) {
         const auto [height, width, across, down] = tiles_of(image);

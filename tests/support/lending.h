@@ -21,16 +21,14 @@ protected:
     std::int32_t lend(std::int32_t offset, std::int32_t count,
                       std::function<void(const std::uint8_t *)> use)
     {
-        struct loan {
-            std::function<void(const std::uint8_t *)> use;
-            bool used = false;
-        } given{std::move(use)};
+        std::pair given{std::move(use), false};
         const img_io_use_fn call = [](void *arg, const std::uint8_t *lent) {
-            static_cast<loan *>(arg)->used = true;
-            static_cast<loan *>(arg)->use(lent);
+            auto &[function, used] = *static_cast<decltype(given) *>(arg);
+            used = true;
+            function(lent);
         };
         const std::int32_t result = img_platform_lend(m_fd, offset, count, call, &given);
-        return given.used ? result : result == -1 ? 1 : -2;
+        return given.second ? result : result == -1 ? 1 : -2;
     }
     std::int32_t lend_and_compare(std::int32_t offset, std::int32_t count)
     {

@@ -7,54 +7,51 @@
 #include "base/types.h"
 #include "chain/chain_links.h"
 #include "formats/header_file.h"
+#include "formats/vitec.h"
 #include "imgfile/img.h"
 #include "std/std.h"
 
-#include <array>
-
 namespace {
 
-// The words of the header, in host order.
-enum word : std::size_t {
-    MAGIC,
-    NLINES,
-    NSAMPS,
-    NBANDS,
-    NBYTES,
-    TILE_NSAMPS,
-    TILE_NLINES,
-    LAYOUT,
-    SWAP,
-    WORDS
-};
 constexpr std::int32_t TEST_MAGIC = 0x54455354;
-static_assert(WORDS * 4 == TEST_HEADER_LENGTH);
-using test_header = std::array<std::int32_t, WORDS>;
+
+// The header, in the byte order of the host.
+struct test_header {
+    std::int32_t magic = 0, nlines = 0, nsamps = 0, nbands = 0, nbytes = 0, tile_nsamps = 0,
+                 tile_nlines = 0, layout = 0, swap = 0;
+};
+static_assert(sizeof(test_header) == TEST_HEADER_LENGTH);
 
 std::span<std::uint8_t> as_bytes(test_header &header)
 {
-    return {reinterpret_cast<std::uint8_t *>(header.data()), sizeof header};
+    return {reinterpret_cast<std::uint8_t *>(&header), sizeof header};
 }
 
 test_geometry wanted;  // what write_header stores that img_createfile has no argument for
 
+// Returns what the file begins with, zeros where that is no header.
+test_header header_of(const img_desc *desc)
+{
+    test_header header;
+    const img_header_file file = img_header_file_of(desc);
+    const bool is_read =
+        img_header_seek(file, 0, 0) == 0 && img_header_read(file, as_bytes(header));
+    return is_read && header.magic == TEST_MAGIC ? header : test_header{};
+}
+
 std::int32_t probe(img_desc *desc)
 {
-    test_header header{};
-    const img_header_file file = img_header_file_of(desc);
-    img_header_seek(file, 0, 0);
-    return img_header_read(file, as_bytes(header)) && header[MAGIC] == TEST_MAGIC ? 1 : 0;
+    return header_of(desc).magic != 0 ? 1 : 0;
 }
 
 std::int32_t read_header(img_desc *desc)
 {
-    test_header header{};
-    const img_header_file file = img_header_file_of(desc);
-    if (img_header_seek(file, 0, 0) != 0 || !img_header_read(file, as_bytes(header))) return -1;
-    desc->swap = header[SWAP];
-    img_set_image_params(desc, header[NLINES], header[NSAMPS], header[TILE_NSAMPS],
-                         header[TILE_NLINES], header[NBANDS], header[NBYTES], -1, header[LAYOUT], 0,
-                         nullptr, nullptr, nullptr);
+    const test_header header = header_of(desc);
+    if (header.magic == 0) return -1;
+    desc->swap = header.swap;
+    img_set_image_params(desc, header.nlines, header.nsamps, header.tile_nsamps, header.tile_nlines,
+                         header.nbands, header.nbytes, -1, header.layout, 0, nullptr, nullptr,
+                         nullptr);
     desc->std_file->data_offset = TEST_HEADER_LENGTH;
     return 0;
 }
@@ -70,21 +67,6 @@ std::int32_t write_header(img_desc *desc)
     return img_header_write(img_header_file_of(desc), as_bytes(header)) ? 0 : -1;
 }
 
-std::int32_t padded(std::int32_t extent, std::int32_t tile_extent)
-{
-    return tile_extent == 0 ? extent : (extent + tile_extent - 1) / tile_extent * tile_extent;
-}
-
-std::int32_t padded_nlines(img_desc *desc)
-{
-    return padded(desc->nlines, desc->tile_nlines);
-}
-
-std::int32_t padded_nsamps(img_desc *desc)
-{
-    return padded(desc->nsamps, desc->tile_nsamps);
-}
-
 img_handle without_chain(img_handle handle)
 {
     if (handle != -1) img_chain_init(handle);
@@ -97,8 +79,8 @@ void test_type_register()
 {
     img_library_init();
     img_std_fill_type(TEST_TYPE, "Test", ".test", IMG_LAYOUT_TILED, IMG_LAYOUT_BSQ, probe,
-                      read_header, write_header, padded_nlines, padded_nsamps, img_no_type_op,
-                      &img_type_table[TEST_TYPE]);
+                      read_header, write_header, img_vitec_padded_nlines, img_vitec_padded_nsamps,
+                      img_no_type_op, &img_type_table[TEST_TYPE]);
 }
 
 img_handle create_test_file(const std::string &name, const test_geometry &geometry)
