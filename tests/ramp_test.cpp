@@ -1,6 +1,7 @@
 // Tests of ramp.cpp: tables that are computed in place of being looked up.
 #include "chain/ramp.h"
 
+#include "base/count.h"
 #include "chain/chain.h"
 #include "chain/chain_lut.h"
 #include "support/effort.h"

@@ -42,7 +42,9 @@ public:
             for (int i = 0; i < 15 && !testing::Test::HasFailure(); ++i) act();
             img_closefile(m_handle);
             m_model.complete();
-            if (m_where != storage::memory) EXPECT_EQ(read_file(m_file), m_model.content);
+            if (m_where != storage::memory) {
+                EXPECT_EQ(read_file(m_file), m_model.content);
+            }
         }
     }
     std::ptrdiff_t failures() const { return m_failures; }
