@@ -123,7 +123,8 @@ TEST_F(VirtualIo, ReachesThePixelsInMemoryAndNoneBeyond)
 
 TEST(MemoryImages, AreMovedWithinTheirBytesAlone)
 {
-    constexpr transfer cases[] = {{.nsamps = 0},
+    constexpr transfer cases[] = {{.nlines = 0},
+                                  {.nsamps = 0},
                                   {.line = 3, .nlines = 2},
                                   {.samp = -1},
                                   {.samp = INT32_MAX, .nsamps = INT32_MAX},
@@ -151,11 +152,13 @@ TEST(MemoryImages, AreMovedWithinTheirBytesAlone)
         EXPECT_EQ(file->veof, last);
         EXPECT_EQ(img_std_sample_offset(desc, 3, 9, 1), layout == 5 ? 0 : last - 1);
         for (const auto &[band, line, samp, nlines, nsamps, stride, tiles, writes] : cases) {
-            const std::int32_t result = nsamps == 0 ? 0 : -1;
+            const std::int32_t result = nlines * nsamps == 0 ? 0 : -1;
             EXPECT_EQ(img_std_read(desc, line, samp, nlines, nsamps, band, nullptr, 1), result);
             EXPECT_EQ(img_std_write(desc, line, samp, nlines, nsamps, band, nullptr, 1, nullptr),
                       result);
         }
+        for (const auto &[line, samp, band] : {std::array{-1, 0, 0}, {0, -1, 0}, {0, 0, -1}})
+            EXPECT_EQ(img_std_sample_offset(desc, line, samp, band), -1);
         EXPECT_EQ(img_read_nontiled(desc, 0, 0, -1, 1, 0, nullptr, 1), 0);
         EXPECT_EQ(img_std_write_nontiled(desc, 0, 0, -1, 1, 0, nullptr, 1, nullptr), 0);
         EXPECT_EQ(img_std_read_nontiled_interleaved(desc, 0, 0, -1, 1, 0, nullptr, 1), 0);
