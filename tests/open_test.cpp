@@ -99,6 +99,9 @@ TEST_F(Create, ReportsWhatItRefuses)
               no_name);
     for (const std::string &name : {m_folder / "no/folder", m_folder / "", m_file + "@nosuch"})
         EXPECT_EQ(creating(name, IMG_TYPE_HELAVA, {}).text, could_not_create(name));
+    fault_arm(io_call::seek, 2);  // after the trailer
+    EXPECT_EQ(creating(m_name, IMG_TYPE_HELAVA, {}).text, could_not_create(m_name));
+    std::filesystem::remove(m_file);
     const setting no_handles(img_handle_pool, nullptr);  // types are checked before one is taken
     for (const std::int32_t type : {1, 43, 44, 45, -1, INT32_MIN, INT32_MAX})
         EXPECT_EQ(creating(m_file, type, {}).text, "Unwritable image type specified as output!!\n");
