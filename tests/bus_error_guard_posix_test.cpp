@@ -38,7 +38,6 @@ protected:
     {
         ::signal(SIGBUS, SIG_DFL);
         ::close(m_empty);
-        img_platform_close(m_fd);
     }
     // Makes the page where reading raises a bus error, at `place` if that is free.
     bool map_page(const std::uint8_t *place = nullptr) const
@@ -120,7 +119,6 @@ TEST_F(HostsBusErrors, ReachTheHandlerThatIsInstalledThen)
     EXPECT_EQ(hosts_errors, 1);
     EXPECT_EQ(lend(0, SIZE, raise_error), 0);
     EXPECT_EQ(hosts_errors, 2);
-    EXPECT_TRUE(installed().sa_handler == m_plain.sa_handler);
 
     // They come before the library knows whose they are.
     struct sigaction fresh = {};

@@ -14,13 +14,8 @@ TEST_F(Lending, GivesWhatTheFileHasNow)
         open(oflags);
         for (const auto &[offset, count] : {std::pair{0, 1}, {0, SIZE}, {4095, 2}, {SIZE - 1, 1}})
             EXPECT_EQ(lend_and_compare(offset, count), 0);
-        for (const auto &[offset, count] : {std::pair{0, SIZE + 1},
-                                            {SIZE, 1},
-                                            {-1, 2},
-                                            {0, 0},
-                                            {5, -1},
-                                            {INT32_MAX, INT32_MAX},
-                                            {INT32_MIN, 1}})
+        for (const auto &[offset, count] :
+             {std::pair{0, SIZE + 1}, {-1, 2}, {0, 0}, {INT32_MAX, INT32_MAX}})
             EXPECT_EQ(lend_and_compare(offset, count), 1);
         m_content[5] ^= 1;
         cut(10);
@@ -41,24 +36,20 @@ TEST_F(Lending, RefusesFilesThatCannotBeMappedOrWatched)
 {
     open(1);
     EXPECT_EQ(lend_and_compare(0, 1), 1);
-    img_platform_close(m_fd);
     open(2);
     host.has_no_status = true;
     EXPECT_EQ(lend_and_compare(0, 1), 1);
     constexpr int ram_disk = 0x01021994, network = 0x6969;
-    for (const fault_host &kind : {fault_host{.block_devices = true},
-                                   {.file_system = network},
-                                   {.file_system = ram_disk, .holes = true},
-                                   {.file_system = ram_disk},
-                                   {.holes = true}}) {
+    const std::pair<fault_host, bool> kinds[] = {{{.block_devices = true}, false},
+                                                 {{.file_system = network}, false},
+                                                 {{.file_system = ram_disk, .holes = true}, false},
+                                                 {{.file_system = ram_disk}, true},
+                                                 {{.holes = true}, true}};
+    for (const auto &[kind, lends] : kinds) {
         host = kind;
-        const bool lends = !kind.block_devices && kind.file_system != network &&
-                           (kind.file_system != ram_disk || !kind.holes);
         for (int i = 0; i < 2; ++i) EXPECT_EQ(lend_and_compare(0, 1), lends ? 0 : 1);
-        img_platform_close(m_fd);
         open(2);
     }
-    img_platform_close(m_fd);
 }
 
 TEST_F(Lending, NoticesThatTheFileIsAnotherOne)
@@ -76,9 +67,7 @@ TEST_F(Lending, NoticesThatTheFileIsAnotherOne)
     host.stamp = 1;
     EXPECT_EQ(lend(0, 1, [&](auto) { EXPECT_EQ(::ftruncate(another, 5), 0); }), -1);
     EXPECT_EQ(lend(0, 1, [&](auto) { ASSERT_NE(::dup2(m_other, m_fd), -1); }), -1);
-    host = {};
     ::close(another);
-    img_platform_close(m_fd);
 }
 
 // Bytes are lent only when a change meanwhile would get another stamp than the last one.
@@ -99,8 +88,6 @@ TEST_F(Lending, WaitsUntilChangesShow)
     EXPECT_EQ(at(start + 5 * second + 6'000'000, start + 5 * second), 1);
     EXPECT_EQ(at(start + 5 * second + 7'000'000, start + 5 * second), 1);
     EXPECT_EQ(at(start + 5 * second + 7'000'100, start + 5 * second), 0);  // one that never stands
-    img_platform_close(m_fd);
-    host = {};
 }
 
 TEST_F(Lending, SurvivesTruncation)
@@ -132,7 +119,6 @@ TEST_F(Lending, SurvivesTruncation)
         ::pthread_sigmask(SIG_SETMASK, &mask, &after);
         EXPECT_EQ(::sigismember(&after, SIGBUS), blocked ? 1 : 0);
     }
-    img_platform_close(m_fd);
 }
 
 // Another program cuts the file short and puts back what was there, all the time.
@@ -154,20 +140,17 @@ TEST_F(Lending, DeliversExactWindowsOrFailsWhileAFileIsTruncated)
         const stderr_capture quiet;
         random_numbers random(1);
         host.seconds_later = 0;
-        int exact = 0, foreign = 0;
+        int exact = 0;
         for (int i = rounds(300'000); i > 0; --i) {
             const std::int32_t line = random.within(0, 400), samp = random.within(0, 400);
             const std::int32_t size = random.within(1, 100);
             if (load(handle, {0, line, samp, size, size, 100}, &window[0]) == -1) continue;
             ++exact;
             for (std::int32_t k = 0; k < size; ++k)
-                foreign += std::equal(&window[0] + k * 100, &window[0] + k * 100 + size,
-                                      &all[0] + (line + k) * 500 + samp)
-                               ? 0
-                               : 1;
+                ASSERT_TRUE(std::equal(&window[0] + k * 100, &window[0] + k * 100 + size,
+                                       &all[0] + (line + k) * 500 + samp));
         }
         EXPECT_GT(exact, 0);
-        EXPECT_EQ(foreign, 0);
         host = {};
         ::kill(child, SIGKILL);
         ::waitpid(child, nullptr, 0);

@@ -32,16 +32,20 @@ protected:
             std::filesystem::last_write_time(m_file, written);
             memory_arm(0);
             const outcome seen = opening(m_file, flags);
-            EXPECT_LT(memory_requested(), 1U << 20U);
+            EXPECT_LT(shortage.requested, 1U << 20U);
             EXPECT_TRUE(taken ? seen.result == 0 : seen == REFUSED_QUIETLY) << seen;
             if (seen.result == 0) expect_reads(model, seen.result);
             img_closefile(seen.result);
             const bool completed = taken && flags == IMG_OPEN_READ_WRITE;
+            bytes expected = model.content;
             const std::size_t end =
                 completed ? static_cast<std::size_t>(model.data_offset) + stored_bytes(model.image)
                           : 0;
-            check_content(model.content, std::max(model.content.size(), end));
+            EXPECT_EQ(std::filesystem::file_size(m_file), std::max(expected.size(), end));
             EXPECT_TRUE(completed || std::filesystem::last_write_time(m_file) == written);
+            expected.resize(std::max(expected.size(), std::min<std::size_t>(end, 4096)));
+            std::filesystem::resize_file(m_file, expected.size());  // it may be huge
+            EXPECT_EQ(read_file(m_file), expected);
             if (HasFailure()) FAIL() << flags << ' ' << testing::PrintToString(model.content);
         }
     }
@@ -52,9 +56,7 @@ protected:
         const std::string objection = type == IMG_TYPE_VITEC ? vitec_objection(image) : "";
         const bool possible = can_be_created(image, type, header_length);
         std::filesystem::remove(m_file);
-        outcome seen = type == TEST_TYPE
-                           ? outcome_of([&] { return create_test_file(m_file, image); })
-                           : creating(m_file, type, image);
+        outcome seen = creating(m_file, type, image);
         EXPECT_EQ(seen.result, possible ? 0 : -1);
         EXPECT_EQ(seen.text, possible ? "" : objection + could_not_create(m_file));
         transfer at{};
@@ -64,25 +66,15 @@ protected:
         const bool writes = possible && stored_bytes(image) > 0 &&
                             std::int64_t{image.tile_nlines} * image.tile_nsamps < 1 << 16;
         EXPECT_TRUE(!writes || dump(seen.result, at, last.data()) == 0);
-        for (const bool reopened : {false, true}) {
-            if (writes) img_chain_init(seen.result);
-            EXPECT_TRUE(!writes || (load(seen.result, at, got.data()) == 0 &&
-                                    std::equal(&last[0], &last[0] + image.nbytes, &got[0])));
-            img_closefile(seen.result);
-            if (!reopened) seen = opening(m_file, IMG_OPEN_READ_ONLY);
-            EXPECT_TRUE(possible ? std::filesystem::file_size(m_file) ==
-                                       static_cast<std::size_t>(header_length) + stored_bytes(image)
-                                 : seen == REFUSED_QUIETLY);
-        }
-    }
-    void check_content(bytes expected, std::size_t length) const
-    {
-        EXPECT_EQ(std::filesystem::file_size(m_file), length);
-        expected.resize(std::min<std::size_t>(length, 4096));  // it may be huge
-        bytes seen(expected.size());
-        std::ifstream(m_file).read(reinterpret_cast<char *>(seen.data()),
-                                   static_cast<std::streamsize>(seen.size()));
-        EXPECT_EQ(seen, expected);
+        img_closefile(seen.result);
+        seen = opening(m_file, IMG_OPEN_READ_ONLY);
+        EXPECT_TRUE(possible ? std::filesystem::file_size(m_file) ==
+                                   static_cast<std::size_t>(header_length) + stored_bytes(image)
+                             : seen == REFUSED_QUIETLY);
+        if (writes) img_chain_init(seen.result);
+        EXPECT_TRUE(!writes || (load(seen.result, at, got.data()) == 0 &&
+                                std::equal(&last[0], &last[0] + image.nbytes, &got[0])));
+        img_closefile(seen.result);
     }
 };
 
@@ -105,11 +97,6 @@ TEST_F(HostileFile, MayHaveAnyNumbersInItsHeader)
         check_open(file, is_within_limits(image, file.data_offset));
         check_create(IMG_TYPE_VITEC, image, VITEC_HEADER);
     });
-    for (const std::int32_t tile_nsamps : {4, 8, 12, 0x8000, 0x10000, 0x10008, 0x18008, -8})
-        for (const std::int32_t tile_nlines : {8, 16, 0x8000, 0x10008, 12, INT32_MIN + 8})
-            for (const std::int32_t nbands : {3, 4})
-                check_create(IMG_TYPE_VITEC, {9, 9, nbands, 1, tile_nsamps, tile_nlines},
-                             VITEC_HEADER);
 }
 
 TEST_F(HostileFile, MayHaveItsPartsAnywhereAndInEitherByteOrder)
@@ -135,17 +122,10 @@ TEST_F(HostileFile, MayHaveAnyNumbersInItsTrailer)
         image.nbytes = index % 5 == 0 ? 0 : 2;  // for which the trailer has no field
         check_create(IMG_TYPE_HELAVA, image, HELAVA_TRAILER);
     });
-}
-
-TEST_F(HostileFile, MayHaveAnyLength)
-{
-    const bytes header = vitec_file({3, 5}), trailer = helava_file({3, 5}, 48);
+    const bytes trailer = helava_file({3, 5}, 48);
     for (std::ptrdiff_t length = 0; length <= 64; ++length) {
-        const auto count = static_cast<std::size_t>(length);
-        for (const bytes &content :
-             {bytes(count), bytes(count, 0xFF), bytes(header.begin(), header.begin() + length)})
-            check_open({{}, 0, content}, false);
-        check_open({{3, 5}, 0, bytes(trailer.end() - length, trailer.end())}, length >= 16);
+        const bytes content(trailer.end() - length, trailer.end());
+        check_open({{3, 5}, 0, content}, length >= HELAVA_TRAILER);
     }
 }
 

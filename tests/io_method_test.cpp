@@ -2,6 +2,7 @@
 #include "base/img_desc.h"
 #include "io/io_default.h"
 #include "io/io_method.h"
+#include "support/guard.h"
 
 #include <cerrno>
 #include <gtest/gtest.h>
@@ -11,15 +12,8 @@ namespace {
 
 // Gives every test an empty table, and the process its own back afterwards.
 class IoMethodTable : public testing::Test {
-protected:
-    IoMethodTable() { img_io_method_count = 0; }
-    ~IoMethodTable() override
-    {
-        img_io_method_table = m_table;
-        img_io_method_count = m_count;
-    }
-    decltype(img_io_method_table) m_table = img_io_method_table;
-    std::int32_t m_count = img_io_method_count;
+    const setting<decltype(img_io_method_table)> m_table{img_io_method_table, img_io_method_table};
+    const setting<std::int32_t> m_count{img_io_method_count, 0};
 };
 
 std::int32_t add(const char *name, std::int32_t (*init_op)(const char *) = nullptr)
@@ -60,7 +54,6 @@ TEST_F(IoMethodTable, AnswersForMissingOperations)
                           bare.write(3, &byte, 1), bare.seek(3, 0, 0), bare.unlink("file")}),
               (std::array{-1, -1, -1, -1, -1, -1}));
     EXPECT_EQ(errno, ENOSYS);
-    EXPECT_EQ(bare.lend, nullptr);
     EXPECT_EQ(img_offer_lending("bar", nullptr), -1);
     EXPECT_EQ(img_allow_merging("bar"), -1);
     EXPECT_EQ(add(nullptr), -1);
@@ -72,15 +65,13 @@ TEST_F(IoMethodTable, SplitsNamesAtTheirFirstAtSign)
 {
     // A name, the file name and the method in it; null: a method that does not exist.
     const std::array<const char *, 3> cases[] = {{"a.img", "a.img", ""},
-                                                 {"a.img@a@b", "a.img", "a@b"},
-                                                 {"a.img@", "a.img", ""},
                                                  {"a.img@@b", "a.img", "@b"},
                                                  {"@@a.img@b", "a.img", "b"},
                                                  {"", "", ""},
                                                  {"@@", "@@", ""},
-                                                 {"@mem", "mem", ""},
-                                                 {"a.img@mem@", "a.img", nullptr}};
-    for (const char *method : {"", "mem", "a@b", "@b", "b"}) ASSERT_EQ(add(method), 0);
+                                                 {"@mem@", "mem", ""},
+                                                 {"a.img@b@", "a.img", nullptr}};
+    for (const char *method : {"", "mem", "@b", "b"}) ASSERT_EQ(add(method), 0);
     for (const auto &[name, filename, method] : cases) {
         std::unique_ptr<char[]> split_filename;
         const img_io_method *split_method = &img_io_method_table[99];

@@ -10,13 +10,10 @@ TEST_F(Messages, GoToTheSinkThatIsSet)
     const setting sink(img_message_sink,
                        [](const char *text, int error) { told.emplace_back(text, error); });
     EXPECT_EQ(creating("", IMG_TYPE_VITEC, {}).text, "");
-    EXPECT_EQ(img_createfile("", 1, 1, 1, IMG_TYPE_VITEC, 0, 0, 1), -1);
     errno = 5;
     EXPECT_EQ(img_fail_errno("img_std_read_tiles:read"), -1);
     EXPECT_EQ(img_fail("%s!!\n", std::string(600, 'x').c_str()), -1);
-    const std::pair<std::string, int> no_name{"No image file name specified!!", 0};
-    EXPECT_EQ(told[0], no_name);
-    EXPECT_EQ(told[1], no_name);
-    EXPECT_EQ(told[2], std::pair(std::string("img_std_read_tiles:read"), 5));
-    EXPECT_EQ(told[3], std::pair(std::string(511, 'x'), 0));
+    EXPECT_EQ(told[0], std::pair(std::string("No image file name specified!!"), 0));
+    EXPECT_EQ(told[1], std::pair(std::string("img_std_read_tiles:read"), 5));
+    EXPECT_EQ(told[2], std::pair(std::string(511, 'x'), 0));
 }

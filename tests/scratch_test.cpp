@@ -17,7 +17,7 @@ TEST(Scratch, KeepsALittleOfWhatWasTaken)
             EXPECT_EQ(reinterpret_cast<std::uintptr_t>(taken.back().get()) % page, 0U);
             std::fill_n(taken.back().get(), size, std::uint8_t{1});
         }
-        return memory_requested();
+        return shortage.requested;
     };
     img_free_scratch();
     EXPECT_EQ(fresh_bytes({1, page + 1, limit / 2}), 3 * page + limit / 2);

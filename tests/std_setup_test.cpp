@@ -148,11 +148,15 @@ TEST_F(StdFile, ClosesBothDescriptorsAndDeletesBothFiles)
         desc->std_file->companion_name = img_copy_name(companion);
         fault_arm(each.call, each.failing);
         EXPECT_EQ(each.operation(desc), each.result);
-        EXPECT_EQ(open_descriptors(), 0);
+        EXPECT_EQ(open_descriptors, 0);
         EXPECT_EQ(std::filesystem::exists(companion), each.keeps_companion);
         EXPECT_EQ(read_file(m_file).size(), each.length);
         img_closefile(desc->handle);  // there is nothing left to close
     }
+    img_desc *const alone = create({});
+    EXPECT_EQ(img_std_delete(alone), 0);
+    EXPECT_FALSE(std::filesystem::exists(m_file));
+    img_closefile(alone->handle);
 }
 
 }  // namespace

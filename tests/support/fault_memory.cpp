@@ -3,41 +3,14 @@
 #include <cerrno>
 #include <new>
 
-namespace {
-
-int requests_left = 0;
-bool denies_the_rest = false;
-bool denied = false;
-std::size_t requested = 0;
-
-bool denies(std::size_t size)
+static bool denies(std::size_t size)
 {
-    requested += size;
-    if (requests_left == 0 || --requests_left != 0) return false;
-    if (denies_the_rest) requests_left = 1;
-    denied = true;
+    shortage.requested += size;
+    if (shortage.requests_left == 0 || --shortage.requests_left != 0) return false;
+    shortage.requests_left = shortage.denies_the_rest ? 1 : 0;
+    shortage.denied = true;
     errno = ENOMEM;
     return true;
-}
-
-}  // namespace
-
-void memory_arm(int nth, bool lasting)
-{
-    requests_left = nth;
-    denies_the_rest = lasting;
-    denied = false;
-    requested = 0;
-}
-
-bool memory_denied()
-{
-    return denied;
-}
-
-std::size_t memory_requested()
-{
-    return requested;
 }
 
 // The linker puts these in place of the non-throwing operators new and new[], the latter also with

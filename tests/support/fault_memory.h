@@ -4,12 +4,20 @@
 
 #include <cstddef>
 
+// What becomes of the library's requests for memory.
+struct memory_plan {
+    int requests_left = 0;         // the last of them is denied; 0: none is
+    bool denies_the_rest = false;  // and every later one
+    bool denied = false;           // a request was
+    std::size_t requested = 0;     // bytes
+};
+inline memory_plan shortage;
+
 // Denies the library's `nth` request for memory from now on, and every later one if `lasting`.
 // Counting starts anew; nth 0: none is denied.
-void memory_arm(int nth, bool lasting = false);
-// True when a request was denied since memory_arm.
-bool memory_denied();
-// Bytes that the library requested since memory_arm.
-std::size_t memory_requested();
+inline void memory_arm(int nth, bool lasting = false)
+{
+    shortage = {nth, lasting};
+}
 
 #endif

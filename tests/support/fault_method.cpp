@@ -1,10 +1,10 @@
 #include "support/fault_method.h"
 
+#include "io/io_default.h"
 #include "io/io_method.h"
 #include "io/platform.h"
 
 #include <cerrno>
-#include <utility>
 
 namespace {
 
@@ -12,23 +12,29 @@ struct {
     io_call call{};
     int nth = 0;
     fault what{};
-    bool lasting = false;
-    bool fired = false;
+    bool lasting = false, fired = false;
     std::map<io_call, int> calls;
-    std::vector<bad_call> bad_calls;
 } plan;
-int descriptors = 0;
 
-bool goes_wrong(io_call call)
+// Returns the record of a call that is to go wrong, with the answer of one that does nothing; null
+// for any other call.
+bad_call *goes_wrong(io_call call, std::int32_t asked = 0)
 {
     const int number = ++plan.calls[call];
     if (call != plan.call || plan.nth == 0 || number < plan.nth ||
         (number > plan.nth && !plan.lasting))
-        return false;
+        return nullptr;
     plan.fired = true;
-    plan.bad_calls.push_back({call});
     errno = EIO;
-    return true;
+    bad_calls.push_back({call, asked});
+    if (plan.what == fault::answers_min) bad_calls.back().got = INT32_MIN;
+    if (plan.what == fault::answers_max) bad_calls.back().got = INT32_MAX;
+    return &bad_calls.back();
+}
+
+bool does_nothing()
+{
+    return plan.what >= fault::fails;
 }
 
 std::uint32_t shortened(std::uint32_t count)
@@ -47,66 +53,50 @@ bool is_at_end(std::int32_t fd)
 
 std::int32_t fault_open(const char *filename, std::int32_t oflags, std::int32_t mode)
 {
-    if (goes_wrong(io_call::open)) return -1;
+    if (goes_wrong(io_call::open) != nullptr) return -1;
     const std::int32_t fd = img_platform_open(filename, oflags, mode);
-    if (fd != -1) ++descriptors;
+    if (fd != -1) ++open_descriptors;
     return fd;
 }
 
 std::int32_t fault_close(std::int32_t fd)
 {
-    --descriptors;
+    --open_descriptors;
     const std::int32_t result = img_platform_close(fd);  // as the system does: closed all the same
-    return goes_wrong(io_call::close) ? -1 : result;
-}
-
-// True for a call whose answer is beyond reason; `answer` is that.
-bool goes_mad(io_call call, std::int32_t *answer)
-{
-    const bool mad = plan.what == fault::answers_min || plan.what == fault::answers_max;
-    *answer = plan.what == fault::answers_min ? INT32_MIN : INT32_MAX;
-    return mad && goes_wrong(call);
+    return goes_wrong(io_call::close) != nullptr ? -1 : result;
 }
 
 std::int32_t fault_read(std::int32_t fd, void *buffer, std::uint32_t count)
 {
-    std::int32_t answer;
-    if (goes_mad(io_call::read, &answer)) return answer;
     const auto asked = static_cast<std::int32_t>(count);
-    const bool wrong = goes_wrong(io_call::read);
-    const bool fails = wrong && plan.what == fault::fails;
-    const std::int32_t got =
-        fails ? -1 : img_platform_read(fd, buffer, wrong ? shortened(count) : count);
-    if (wrong) plan.bad_calls.pop_back();
-    if (got != asked)
-        plan.bad_calls.push_back({io_call::read, asked, got, fails || !is_at_end(fd)});
+    const bool wrong = goes_wrong(io_call::read, asked) != nullptr;
+    if (wrong && does_nothing()) return bad_calls.back().got;
+    if (wrong) bad_calls.pop_back();
+    const std::int32_t got = img_platform_read(fd, buffer, wrong ? shortened(count) : count);
+    if (got != asked) bad_calls.push_back({io_call::read, asked, got, !is_at_end(fd)});
     return got;
 }
 
 std::int32_t fault_write(std::int32_t fd, const void *buffer, std::uint32_t count)
 {
-    if (!goes_wrong(io_call::write)) return img_platform_write(fd, buffer, count);
-    bad_call &bad = plan.bad_calls.back();
-    bad.asked = static_cast<std::int32_t>(count);
-    bad.grows = count == 1 && *static_cast<const std::uint8_t *>(buffer) == 0;
-    if (plan.what != fault::fails) bad.got = img_platform_write(fd, buffer, shortened(count));
-    return bad.got;
+    bad_call *const bad = goes_wrong(io_call::write, static_cast<std::int32_t>(count));
+    if (bad == nullptr) return img_platform_write(fd, buffer, count);
+    bad->grows = count == 1 && *static_cast<const std::uint8_t *>(buffer) == 0;
+    if (!does_nothing()) bad->got = img_platform_write(fd, buffer, shortened(count));
+    return bad->got;
 }
 
 std::int32_t fault_seek(std::int32_t fd, std::int32_t offset, std::int32_t whence)
 {
-    std::int32_t answer;
-    if (goes_mad(io_call::seek, &answer)) return answer;
-    if (!goes_wrong(io_call::seek)) return img_platform_seek(fd, offset, whence);
-    bad_call &bad = plan.bad_calls.back();
-    bad.asked = whence;
-    if (plan.what != fault::fails) bad.got = img_platform_seek(fd, offset + 1, whence);
-    return bad.got;
+    bad_call *const bad = goes_wrong(io_call::seek, whence);
+    if (bad == nullptr) return img_platform_seek(fd, offset, whence);
+    if (!does_nothing()) bad->got = img_platform_seek(fd, offset + 1, whence);
+    return bad->got;
 }
 
 std::int32_t fault_unlink(const char *filename)
 {
-    return goes_wrong(io_call::unlink) ? -1 : img_platform_unlink(filename);
+    return goes_wrong(io_call::unlink) != nullptr ? -1 : img_platform_unlink(filename);
 }
 
 std::int32_t refuse(std::int32_t, std::int32_t, std::int32_t count, img_io_use_fn use, void *arg)
@@ -119,17 +109,6 @@ std::int32_t refuse(std::int32_t, std::int32_t, std::int32_t count, img_io_use_f
 
 }  // namespace
 
-void fault_register()
-{
-    img_register_io_method("fault", nullptr, fault_open, fault_close, fault_read, fault_write,
-                           fault_seek, fault_unlink, nullptr);
-    img_register_io_method("refusing", nullptr, img_platform_open, img_platform_close,
-                           img_platform_read, img_platform_write, img_platform_seek,
-                           img_platform_unlink, nullptr);
-    img_allow_merging("refusing");
-    img_offer_lending("refusing", refuse);
-}
-
 int &refused_loans()
 {
     static int count = 0;
@@ -138,8 +117,12 @@ int &refused_loans()
 
 void fault_arm(io_call call, int nth, fault what, bool lasting)
 {
-    fault_register();
-    plan = {call, nth, what, lasting, false, {}, {}};
+    img_register_io_method("fault", nullptr, fault_open, fault_close, fault_read, fault_write,
+                           fault_seek, fault_unlink, nullptr);
+    img_register_default_io_method("refusing");
+    img_offer_lending("refusing", refuse);
+    plan = {call, nth, what, lasting, false, {}};
+    bad_calls.clear();
 }
 
 bool fault_fired()
@@ -147,17 +130,7 @@ bool fault_fired()
     return plan.fired;
 }
 
-std::vector<bad_call> take_bad_calls()
-{
-    return std::exchange(plan.bad_calls, {});
-}
-
 int calls_of(io_call call)
 {
     return plan.calls[call];
-}
-
-int open_descriptors()
-{
-    return descriptors;
 }

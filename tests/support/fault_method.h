@@ -10,11 +10,11 @@
 enum class io_call { open, close, read, write, seek, unlink };
 
 enum class fault {
-    fails,       // -1, errno EIO, nothing done
     moves_none,  // read, write: 0
     moves_one,   // read, write: 1 byte
     moves_half,  // read, write: half of what was asked
     stands_off,  // seek: the file stands, and is said to stand, one byte further
+    fails,       // nothing done: -1, errno EIO
     answers_min,
     answers_max,  // read, seek: INT_MIN or INT_MAX, nothing done
 };
@@ -27,20 +27,17 @@ struct bad_call {
     bool planned = true;     // false: a read that met the end of the file
     bool grows = false;      // the write of one zero byte
 };
+inline std::vector<bad_call> bad_calls;  // since fault_arm, which clears it, as may a test
 
-// Registers both; once per process, later calls do nothing.
-void fault_register();
 // Lets the `nth` call of that kind from now on go wrong, and every later one if `lasting`.
-// Counters start anew. nth 0: nothing goes wrong.
+// Counters start anew. nth 0: nothing goes wrong. The first call registers both methods.
 void fault_arm(io_call call, int nth, fault what = fault::fails, bool lasting = false);
 // True when a call went wrong since fault_arm.
 bool fault_fired();
-// The bad calls since fault_arm or the last taking.
-std::vector<bad_call> take_bad_calls();
 // Calls since fault_arm.
 int calls_of(io_call call);
 // Descriptors that were opened and not closed since the process began.
-int open_descriptors();
+inline int open_descriptors = 0;
 
 // Bytes on loan that the access method "refusing" was asked for; it has the ordinary files, hands
 // out wrong bytes, and says afterwards that they cannot be lent.

@@ -1,5 +1,6 @@
 #include "support/files.h"
 
+#include <algorithm>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
@@ -15,11 +16,6 @@ scratch_folder::scratch_folder()
     m_path = pattern;
 }
 
-scratch_folder::~scratch_folder()
-{
-    std::filesystem::remove_all(m_path);
-}
-
 bytes read_file(const std::string &path)
 {
     std::ifstream in(path, std::ios::binary);
@@ -28,9 +24,8 @@ bytes read_file(const std::string &path)
 
 void write_file(const std::string &path, const bytes &content)
 {
-    std::ofstream(path, std::ios::binary)
-        .write(reinterpret_cast<const char *>(content.data()),
-               static_cast<std::streamsize>(content.size()));
+    std::ofstream out(path, std::ios::binary);
+    std::copy(content.begin(), content.end(), std::ostreambuf_iterator<char>(out));
 }
 
 stderr_capture::stderr_capture() : m_stderr(::dup(STDERR_FILENO)), m_file(std::tmpfile())
@@ -41,18 +36,16 @@ stderr_capture::stderr_capture() : m_stderr(::dup(STDERR_FILENO)), m_file(std::t
 
 stderr_capture::~stderr_capture()
 {
-    if (m_stderr != -1) text();
+    ::dup2(m_stderr, STDERR_FILENO);
+    ::close(m_stderr);
+    std::fclose(m_file);
 }
 
 std::string stderr_capture::text()
 {
-    ::dup2(m_stderr, STDERR_FILENO);
-    ::close(m_stderr);
-    m_stderr = -1;
     const int fd = ::fileno(m_file);
     std::string text(static_cast<std::size_t>(::lseek(fd, 0, SEEK_END)), '\0');
     if (::pread(fd, text.data(), text.size(), 0) == -1) std::abort();
-    std::fclose(m_file);
     return text;
 }
 

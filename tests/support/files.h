@@ -14,7 +14,7 @@ using bytes = std::vector<std::uint8_t>;
 class scratch_folder {
 public:
     scratch_folder();
-    ~scratch_folder();
+    ~scratch_folder() { std::filesystem::remove_all(m_path); }
     scratch_folder(const scratch_folder &) = delete;
     scratch_folder &operator=(const scratch_folder &) = delete;
     std::string operator/(const std::string &name) const { return m_path / name; }
@@ -26,14 +26,14 @@ private:
 bytes read_file(const std::string &path);
 void write_file(const std::string &path, const bytes &content);
 
-// What is written to the standard error stream between making it and asking for the text.
+// What is written to the standard error stream while it lives.
 class stderr_capture {
 public:
     stderr_capture();
     ~stderr_capture();
     stderr_capture(const stderr_capture &) = delete;
     stderr_capture &operator=(const stderr_capture &) = delete;
-    std::string text();  // ends the capture
+    std::string text();
 
 private:
     int m_stderr;

@@ -14,21 +14,27 @@
 class Lending : public FileTest {
 protected:
     Lending() { write_file(m_file, m_content); }
-    ~Lending() override { ::close(m_other); }
+    ~Lending() override
+    {
+        img_platform_close(m_fd);
+        ::close(m_other);
+    }
 
-    void open(std::int32_t oflags) { m_fd = img_platform_open(m_file.c_str(), oflags, 0600); }
+    // Opens the file instead of the one that is open.
+    void open(std::int32_t oflags)
+    {
+        img_platform_close(m_fd);
+        m_fd = img_platform_open(m_file.c_str(), oflags, 0600);
+    }
     // Lends bytes to `use`. Returns the result; 1: refused without a use.
     std::int32_t lend(std::int32_t offset, std::int32_t count,
                       std::function<void(const std::uint8_t *)> use)
     {
-        std::pair given{std::move(use), false};
         const img_io_use_fn call = [](void *arg, const std::uint8_t *lent) {
-            auto &[function, used] = *static_cast<decltype(given) *>(arg);
-            used = true;
-            function(lent);
+            std::exchange(*static_cast<decltype(use) *>(arg), nullptr)(lent);
         };
-        const std::int32_t result = img_platform_lend(m_fd, offset, count, call, &given);
-        return given.second ? result : result == -1 ? 1 : -2;
+        const std::int32_t result = img_platform_lend(m_fd, offset, count, call, &use);
+        return !use ? result : result == -1 ? 1 : -2;
     }
     std::int32_t lend_and_compare(std::int32_t offset, std::int32_t count)
     {
