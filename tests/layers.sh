@@ -3,10 +3,9 @@
 # Fails for an include or an undefined symbol that leads from a folder to one above it, and for a
 # folder that the order does not name. A lower layer reaches an upper one through a table of
 # operations alone.
-set -eu
+# shellcheck source=tests/expect.sh
+. "$(dirname "$0")/expect.sh"
 archive=$(realpath "$2") nm=$3
-scratch=$(mktemp -d)
-trap 'rm -rf "$scratch"' EXIT
 cd "$1/src"
 
 # Lines "KIND FROM_FOLDER FROM_FILE TO_FOLDER TO_FILE".

@@ -1,13 +1,11 @@
 #!/bin/sh
 # manual.sh HEADER PAGE...: the manual pages render without a warning, and those of section 3 have the
 # functions of the header in their synopses, each once and with the same types and names.
-set -eu
+# shellcheck source=tests/expect.sh
+. "$(dirname "$0")/expect.sh"
 header=$1
 shift
 
-scratch=$(mktemp -d)
-trap 'rm -rf "$scratch"' EXIT
-failed=0
 if command -v mandoc >/dev/null; then
     mandoc -T lint -W warning "$@" || failed=1
 fi
@@ -31,4 +29,4 @@ awk '
     /^\.Fa / { text = text separator substr($0, 5); separator = ", " }
     /^\.Fc/ { print text ");" }' "$@" | sort >"$scratch/described"
 diff -u "$scratch/declared" "$scratch/described" || failed=1
-exit "$failed"
+exit "${failed:?}"

@@ -2,10 +2,9 @@
 # names.sh SOURCE_DIR: file names are unique; every header of src/ has its source by name and every
 # source its test, unless names.txt says otherwise; every test opens with a line that says what it
 # tests.
-set -eu
+# shellcheck source=tests/expect.sh
+. "$(dirname "$0")/expect.sh"
 cd "$1"
-# shellcheck source=/dev/null
-. tests/expect.sh
 
 expect 'names of more than one file' '' "$(find src include tests tools examples fuzz bench cmake scripts -type f \
     \( -name '*.cpp' -o -name '*.[ch]' -o -name '*.sh' -o -name '*.cmake' \) | sed 's|.*/||' | sort | uniq -d)"

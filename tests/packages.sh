@@ -3,13 +3,10 @@
 # as their users will: what they ask for, what is in them, whether man finds every function, and a
 # host and the program of the unpacked tree at work.
 # shellcheck disable=SC2016,SC2059 # dpkg-deb puts the fields in; formats have folders
-set -eu
-# shellcheck source=/dev/null
+# shellcheck source=tests/expect.sh
 . "$(dirname "$0")/expect.sh"
 cpack=$1 build=$2 source=$3 cc=$4
 
-scratch=$(mktemp -d)
-trap 'rm -rf "$scratch"' EXIT
 cd "$scratch"
 export LC_ALL=C.UTF-8 SOURCE_DATE_EPOCH=1700000000
 

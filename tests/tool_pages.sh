@@ -1,15 +1,12 @@
 #!/bin/bash
 # tool_pages.sh PROGRAM PAGES COMPLETION: the manual pages of the tool's commands and its completion
 # have what `--help` has, no less and no more, and the pages explain what is printed as JSON.
-set -eu
-program=$1 pages=$2
-# shellcheck source=/dev/null
+# shellcheck source=tests/expect.sh
 . "$(dirname "$0")/expect.sh"
+program=$1 pages=$2
 # shellcheck source=/dev/null
 source "$3"
 
-scratch=$(mktemp -d)
-trap 'rm -rf "$scratch"' EXIT
 sorted() { sort -u | tr '\n' ' '; }
 options_of_help() { "$program" "$@" --help | sed -n 's/^  \(--[a-z-]*\).*/\1/p' | sorted; }
 values_of_help() {  # COMMAND OPTION: those of "a, b or c (default ..."

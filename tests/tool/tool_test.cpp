@@ -10,6 +10,7 @@
 #include <gtest/gtest.h>
 #include <nlohmann/json.hpp>
 #include <set>
+#include <span>
 #include <sstream>
 #include <tiffio.h>
 
@@ -99,50 +100,33 @@ protected:
     scratch_folder m_folder, m_streams;
 };
 
-struct kept_as {
-    const char *name, *options;
-    std::set<std::size_t> bands;  // how many it can hold
-    int nbytes;                   // of a sample, at most
-};
-const kept_as formats[] = {
-    {"a.img", "", {1, 2, 3}, 2},
-    {"tiled.img", "--tile 16x8", {1, 2, 3}, 2},
-    {"a.d", "", {1, 2, 3}, 1},
-    {"a.pnm", "", {1, 3}, 2},
-    {"a.png", "", {1, 3}, 2},
-    {"a.tif", "", {1, 2, 3}, 2},
-    {"tiled.tif", "--tile 32x16", {1, 2, 3}, 2},
-};
+// The first four hold any image, the next two 1 or 3 bands, and the last one bytes alone.
+const std::vector<std::string> formats = {
+    "a.img", "tiled.img --tile 16x8", "a.tif", "tiled.tif --tile 32x16", "a.pnm", "a.png", "a.d"};
+
+std::string file_of(const std::string &format)
+{
+    return format.substr(0, format.find(' '));
+}
 
 TEST_F(Tool, KeepsSamplesAndWindowsFromAnyFormatToAnyOther)
 {
-    const struct {
-        const char *chosen, *seen;
-        std::vector<int> bands;
-        window part;
-    } list[] = {{"1", "0,0,37,53", {1}, {0, 0, 37, 53}},
-                {"2,0", "9,17,20,30", {2, 0}, {9, 17, 20, 30}},
-                {"0,1,2", "30,40,7,13", {0, 1, 2}, {30, 40, 7, 13}}};
-    for (const auto &[chosen, seen, bands, part] : list)
+    for (const auto &[chosen, bands] : {std::pair{"1", std::vector{1}},
+                                        {"2,0", std::vector{2, 0}},
+                                        {"0,1,2", std::vector{0, 1, 2}}})
         for (const int nbytes : {1, 2}) {
             write_content("source.ppm", pnm({0, 0, 37, 53}, {0, 1, 2}, nbytes));
-            std::vector<kept_as> able;
-            for (const kept_as &each : formats)
-                if (each.bands.contains(bands.size()) && nbytes <= each.nbytes)
-                    able.push_back(each);
+            const std::size_t able = bands.size() == 2 ? 4 : nbytes == 2 ? 6 : 7;
             const std::size_t band = static_cast<std::size_t>(nbytes) % bands.size();
-            for (const kept_as &first : able) {
-                const std::string from = std::string("from_") + first.name;
-                expect_done("convert source.ppm " + from + " --overwrite --band " + chosen + " " +
-                            first.options);
-                for (const kept_as &second : able) {
-                    const std::string target = std::string("to_") + second.name;
-                    expect_done("convert " + from + " " + target + " --overwrite " +
-                                second.options);
-                    expect_done("convert " + target + " seen.pgm --overwrite --band " +
-                                std::to_string(band) + " --window " + seen);
-                    EXPECT_EQ(content_of("seen.pgm"), pnm(part, {bands[band]}, nbytes))
-                        << from << " to " << target << ", bands " << chosen;
+            for (const std::string &first : std::span(formats).first(able)) {
+                expect_done("convert --overwrite source.ppm from_" + first + " --band " + chosen);
+                const std::string from = "from_" + file_of(first);
+                for (const std::string &second : std::span(formats).first(able)) {
+                    expect_done("convert --overwrite " + from + " to_" + second);
+                    expect_done("convert --overwrite to_" + file_of(second) +
+                                " seen.pgm --window 9,17,28,36 --band " + std::to_string(band));
+                    EXPECT_EQ(content_of("seen.pgm"), pnm({9, 17, 28, 36}, {bands[band]}, nbytes))
+                        << from << " to " << second << ", bands " << chosen;
                 }
                 expect_done("compare " + from + " to_a.img");
             }
@@ -165,16 +149,14 @@ constexpr window tall{0, 0, 1700, 900};
 void write_tiff(const char *mode, int compression, bool planar, int strip)
 {
     TIFF *const file = TIFFOpen("a.tif", mode);
-    for (const auto &[tag, value] :
-         {std::pair{TIFFTAG_IMAGELENGTH, tall.nlines},
-          {TIFFTAG_IMAGEWIDTH, tall.nsamps},
-          {TIFFTAG_SAMPLESPERPIXEL, 3},
-          {TIFFTAG_BITSPERSAMPLE, 16},
-          {TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_RGB},
-          {TIFFTAG_COMPRESSION, compression},
-          {TIFFTAG_PLANARCONFIG, planar ? PLANARCONFIG_SEPARATE : PLANARCONFIG_CONTIG},
-          {TIFFTAG_ROWSPERSTRIP, strip}})
-        TIFFSetField(file, static_cast<std::uint32_t>(tag), value);
+    TIFFSetField(file, TIFFTAG_IMAGELENGTH, tall.nlines);
+    TIFFSetField(file, TIFFTAG_IMAGEWIDTH, tall.nsamps);
+    TIFFSetField(file, TIFFTAG_SAMPLESPERPIXEL, 3);
+    TIFFSetField(file, TIFFTAG_BITSPERSAMPLE, 16);
+    TIFFSetField(file, TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_RGB);
+    TIFFSetField(file, TIFFTAG_COMPRESSION, compression);
+    TIFFSetField(file, TIFFTAG_PLANARCONFIG, planar ? PLANARCONFIG_SEPARATE : PLANARCONFIG_CONTIG);
+    TIFFSetField(file, TIFFTAG_ROWSPERSTRIP, strip);
     const int step = planar ? 1 : 3;
     for (int plane = 0; plane < 3; plane += step)
         for (int line = 0; line < tall.nlines; ++line) {
@@ -228,8 +210,8 @@ TEST_F(Tool, RefusesInOneLineAndKeepsTheTarget)
     const std::string pixels = pnm({0, 0, 20, 30}, {0, 1, 2}, 1);
     write_content("rgb.ppm", pixels);
     write_content("cut.pgm", pnm({0, 0, 20, 30}, {0}, 1).substr(0, 400));
-    expect_done("create two.img --lines 20 --samples 30 --bytes 2");
-    expect_done("create seven.d --lines 20 --samples 30 --bands 7");
+    expect_done("convert rgb.ppm cut.img --tile 8 --band 0");
+    fs::resize_file("cut.img", 244 + 8 * 40);
     write_content("junk", "nothing in particular, but long enough to hold a header of some kind");
     write_content("old", "what was there before");
     write_content("empty", "");
@@ -251,15 +233,14 @@ TEST_F(Tool, RefusesInOneLineAndKeepsTheTarget)
         {"convert vast.pgm old --overwrite --format png", "vast.pgm: has no valid PGM or PPM he"},
         {"convert junk old --overwrite --format png", "junk: is not a known image format, or"},
         {"convert cut.pgm old --overwrite --format vitec", "cut.pgm: truncated: line 12 is miss"},
+        {"convert cut.img old --overwrite --format png", "cut.img: truncated: line 8 of band 0 is"},
         {"convert rgb.ppm twin.ppm --overwrite", "twin.ppm: is the input file"},
         {"convert rgb.ppm pipe --overwrite --format png", "pipe: exists and is not a regular"},
         {"convert rgb.ppm old --format png", "old: exists; --overwrite replaces it"},
         {"convert rgb.ppm no/new.png", "no/new.png: cannot be written: No such file"},
         {"convert rgb.ppm old --overwrite", "old: cannot write files without an ending; use --fo"},
         {"convert rgb.ppm - --format png", "standard output takes only PGM and PPM (see imgfile"},
-        {"convert two.img old --overwrite --format helava", "old: Helava files hold samples of"},
-        {"convert seven.d old --overwrite --format vitec", "old: VITec files hold at most 3 bands"},
-        {"convert seven.d old --overwrite --format png", "old: PNG files hold 1 or 3 bands, not 7"},
+        {"convert rgb.ppm a.png --band 0,1", "a.png: PNG files hold 1 or 3 bands, not 2; --band"},
         {"convert rgb.ppm vitec.img --tile 100", "vitec.img: the tile sides of VITec files are"},
         {"convert rgb.ppm tiff.tif --tile 8", "tiff.tif: the tile sides of TIFF files are"},
         {"convert rgb.ppm png.png --tile 16", "png.png: PNG files have no tiles"},
@@ -272,6 +253,8 @@ TEST_F(Tool, RefusesInOneLineAndKeepsTheTarget)
         {"create vast.img --lines 50000 --samples 50000",
          "vast.img: cannot be created: the file would have 2 GiB or more"},
         {"create a.d --lines 5 --samples 5 --tile 8", "a.d: Helava files have no tiles"},
+        {"create a.d --lines 5 --samples 5 --bytes 2", "a.d: Helava files hold samples of one"},
+        {"create a.img --lines 5 --samples 5 --bands 7", "a.img: VITec files hold at most 3 ba"},
         {"create a.d --lines -5 --samples 5", "--lines: Value -5 not in range 0 to 2147483647"},
     };
     for (const auto &[arguments, message] : list) {
@@ -318,12 +301,11 @@ TEST_F(Tool, DescribesFiles)
 {
     expect_done("create a.img --lines 100 --samples 70 --bands 2 --bytes 2 --tile 16x32");
     expect_done("create user@host.d --lines 3 --samples 5 --bands 4");
-    expect_done("convert a.img t.tif --tile 16x32");
-    const finished end = run("info a.img missing user@host.d t.tif --json");
+    const finished end = run("info a.img missing user@host.d --json");
     EXPECT_EQ(end.status, 1);
     EXPECT_EQ(end.err, "imgfile: missing: No such file or directory\n");
     json facts = json::parse(end.out);
-    ASSERT_EQ(facts.size(), 3U);
+    ASSERT_EQ(facts.size(), 2U);
     EXPECT_EQ(facts[0]["created"].get<std::string>().size(), 19U);
     facts[0].erase("created");
     EXPECT_EQ(facts[0], json::parse(R"({
@@ -331,10 +313,8 @@ TEST_F(Tool, DescribesFiles)
         "bands": 2, "bytes_per_sample": 2, "bits_per_sample": 12, "layout": "tiles of band planes",
         "tile_size": {"lines": 16, "samples": 32}, "tile_grid": {"down": 7, "across": 3},
         "data_offset": 244, "file_length": 43252, "expected_length": 43252})"));
-    EXPECT_EQ(facts[1]["type"], "Helava");
     EXPECT_EQ(facts[1]["expected_length"], 3 * 5 * 4 + 16);
     EXPECT_EQ(facts[1]["created"], nullptr);
-    EXPECT_EQ(facts[2]["tile_size"], facts[0]["tile_size"]);
 }
 
 // Facts of one file come from one open: else a file replaced in between would mix them.
@@ -390,7 +370,6 @@ TEST_F(Tool, FindsErrorsInFiles)
         damaged[position] = byte;
         write_content("a.img", damaged);
         const finished end = run("check a.img");
-        EXPECT_EQ(end.err, "");
         EXPECT_EQ(end.status, 1) << position;
         expect_within(end.out, std::string("a.img: ") + finding);
     }
@@ -418,7 +397,7 @@ TEST_F(Tool, ReadsFilesMadeOutsideThisCode)
         {"untiled_16bit.img", 29, 41, 1, 2, "2 bytes, 12 bits\n  order      big-endian\n"},
         {"tiled_16bit_little.img", 29, 41, 2, 2, "8 lines x 32 samples, 4 down x 2 across\n"},
         {"long_header.img", 9, 11, 1, 1, "data at    byte 504\n"},
-        {"helava_2bands.d", 23, 35, 2, 1, "size       23 lines x 35 samples x 2 bands\n"},
+        {"helava_2bands.d", 23, 35, 2, 1, "Helava\n  size       23 lines x 35 samples x 2 bands\n"},
         {"helava_little.d", 23, 35, 1, 1, "little-endian\n"},
     };
     for (const auto &[name, nlines, nsamps, nbands, nbytes, fact] : list) {
