@@ -1,8 +1,7 @@
 #!/bin/sh
 # exports.sh LIBRARY HEADER NM READELF: holds the symbol table of the shared library against the
 # public header, and the libraries it needs against the runtimes.
-set -eu
-# shellcheck source=/dev/null
+# shellcheck source=tests/expect.sh
 . "$(dirname "$0")/expect.sh"
 library=$1 header=$2 nm=$3 readelf=$4
 

@@ -3,16 +3,15 @@
 # Fails for an include or an undefined symbol that leads from a folder to one above it, and for a
 # folder that the order does not name. A lower layer reaches an upper one through a table of
 # operations alone.
-set -eu
+# shellcheck source=tests/expect.sh
+. "$(dirname "$0")/expect.sh"
 archive=$(realpath "$2") nm=$3
-scratch=$(mktemp -d)
-trap 'rm -rf "$scratch"' EXIT
 cd "$1/src"
 
-# Lines "FROM_FOLDER FROM_FILE TO_FOLDER TO_FILE" of either kind.
+# Lines "KIND FROM_FOLDER FROM_FILE TO_FOLDER TO_FILE".
 grep '^#include "' ./*/* |
-    sed -n 's|^\./\([a-z]*\)/\([^:]*\):.*"\([a-z]*\)/\([^"]*\)"|\1 \2 \3 \4|p' |
-    grep -v ' imgfile img\.h$' >"$scratch/includes"
+    sed -n 's|^\./\([a-z]*\)/\([^:]*\):.*"\([a-z]*\)/\([^"]*\)"|include \1 \2 \3 \4|p' |
+    grep -v ' imgfile img\.h$' >"$scratch/all"
 # An object file is named as its source; file names are unique.
 find . -name '*.cpp' | tr / ' ' | cut -d ' ' -f 2- >"$scratch/homes"
 "$nm" -A "$archive" | awk '
@@ -23,22 +22,18 @@ find . -name '*.cpp' | tr / ' ' | cut -d ' ' -f 2- >"$scratch/homes"
     END {
         for (need in needs) {
             split(need, f, " ")
-            if (f[2] in defined && defined[f[2]] != f[1]) print home[f[1]], home[defined[f[2]]]
+            if (f[2] in defined) print "symbol", home[f[1]], home[defined[f[2]]]
         }
-    }' "$scratch/homes" - | sort -u >"$scratch/symbols"
+    }' "$scratch/homes" - | sort -u >>"$scratch/all"
 
-status=0
-for kind in includes symbols; do
-    awk -v kind="$kind" '
-        FNR == NR { if (!/^#/) rank[$1] = FNR; next }
-        { ++seen }
-        !($1 in rank) || !($3 in rank) || rank[$3] < rank[$1] {
-            print kind ": " $1 "/" $2 " reaches up to " $3 "/" $4
-            ++bad
-        }
-        END {
-            print seen + 0 " " kind " between files, " bad + 0 " upwards"
-            exit bad > 0 || seen == 0
-        }' layers.txt "$scratch/$kind" || status=1
-done
-exit "$status"
+awk '
+    FNR == NR { if (!/^#/) rank[$1] = FNR; next }
+    { ++seen[$1] }
+    !($2 in rank) || !($4 in rank) || rank[$4] < rank[$2] {
+        print $1 ": " $2 "/" $3 " reaches up to " $4 "/" $5
+        bad = 1
+    }
+    END {
+        print seen["include"] " includes, " seen["symbol"] " symbols between files"
+        exit bad || !seen["include"] || !seen["symbol"]
+    }' layers.txt "$scratch/all"

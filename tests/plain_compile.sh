@@ -1,12 +1,11 @@
 #!/bin/sh
 # plain_compile.sh CXX CC ROOT: one compiler call makes the library, without a build system and without
 # options for the sources, and the example host runs with it.
-set -eu
+# shellcheck source=tests/expect.sh
+. "$(dirname "$0")/expect.sh"
 cxx=$1 cc=$2
 root=$(cd "$3" && pwd)
 
-scratch=$(mktemp -d)
-trap 'rm -rf "$scratch"' EXIT
 cd "$scratch"
 "$cxx" -std=c++20 -I"$root/src" -I"$root/include" -shared -fPIC "$root"/src/*/*.cpp -o libimgfile.so
 "$cc" -I"$root/include/imgfile" "$root/examples/smallest_host.c" "$scratch/libimgfile.so" -o host

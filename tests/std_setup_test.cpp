@@ -153,7 +153,7 @@ TEST_F(StdFile, ClosesBothDescriptorsAndDeletesBothFiles)
         EXPECT_EQ(read_file(m_file).size(), each.length);
         img_closefile(desc->handle);  // there is nothing left to close
     }
-    img_desc *const alone = create({});
+    img_desc *const alone = img_find_image(create_test_file(m_file, {}));
     EXPECT_EQ(img_std_delete(alone), 0);
     EXPECT_FALSE(std::filesystem::exists(m_file));
     img_closefile(alone->handle);

@@ -1,28 +1,14 @@
 #!/bin/bash
 # tool_pages.sh PROGRAM PAGES COMPLETION: the manual pages of the tool's commands and its completion
 # have what `--help` has, no less and no more, and the pages explain what is printed as JSON.
-set -eu
-program=$1 pages=$2
-# shellcheck source=/dev/null
+# shellcheck source=tests/expect.sh
 . "$(dirname "$0")/expect.sh"
+program=$1 pages=$2
 # shellcheck source=/dev/null
 source "$3"
 
-scratch=$(mktemp -d)
-trap 'rm -rf "$scratch"' EXIT
 sorted() { sort -u | tr '\n' ' '; }
-options_of_help() { "$program" "$@" --help | sed -n 's/^  \(--[a-z-]*\).*/\1/p'; }
-options_of_page() { sed -n 's/^\.It Fl Fl \([a-z-]*\).*/--\1/p' "$1"; }
-options_of_synopsis() {
-    sed -n '/^\.Sh SYNOPSIS/,/^\.Sh DESC/s/^\.\(Op \)*Fl Fl \([a-z-]*\).*/--\2/p' "$1"
-}
-operands_of_help() {
-    "$program" "$1" --help | sed -n 's/^  \([A-Z]*\) .*REQUIRED.*/\1/p' | sorted
-}
-operands_of_page() {
-    sed -n '/^\.Sh SYNOPSIS/,/^\.Sh DESC/s/^\.Ar \([A-Z ]*\).*/\1/p' "$1" | tr ' ' '\n' |
-        grep . | sorted
-}
+options_of_help() { "$program" "$@" --help | sed -n 's/^  \(--[a-z-]*\).*/\1/p' | sorted; }
 values_of_help() {  # COMMAND OPTION: those of "a, b or c (default ..."
     "$program" "$1" --help | sed -n "s/^  $2 [A-Z]*  *\([a-z, ]*[a-z]\) (default.*/\1/p" |
         sed 's/ or /, /; s/, /\n/g' | sorted
@@ -32,30 +18,36 @@ offered() {  # WORD...: what completion offers for the last of them
     _imgfile
     printf '%s\n' "${COMPREPLY[@]}" | sorted
 }
+# What a command's help and its page have in common, in the same words.
+facts_of_help() {
+    "$program" "$1" --help | awk '
+        NR == 1 { print "description: " tolower(substr($0, 1, 1)) substr($0, 2) }
+        /^  [A-Z]+ .*REQUIRED/ { print "operand " $1 }
+        /^  --/ { print "option " $1 }
+        /^  --/ && $1 != "--help" { print "option in the synopsis " $1 }' | sort
+}
+facts_of_page() {
+    awk '
+        /^\.Sh/ { synopsis = $2 == "SYNOPSIS" }
+        /^\.Nd/ { print "description: " substr($0, 5) }
+        /^\.Ar/ && synopsis { for (i = 2; i <= NF && $i != "..."; ++i) print "operand " $i }
+        /^\.It Fl Fl/ { print "option --" $4 }
+        sub(/^\.(Op )?Fl Fl /, "") && synopsis { print "option in the synopsis --" $1 }' "$1" | sort
+}
 
-commands=$("$program" --help | sed -n '/^Commands/,/^$/s/^  \([a-z]*\) .*/\1/p')
-expect 'commands' 'check compare convert create info preview stats ' "$(echo "$commands" | sorted)"
-expect 'options that all have' "$(options_of_help | sorted)" \
-    "$(options_of_page "$pages/imgfile.1" | sorted)"
-expect 'commands in imgfile.1' "$(echo "$commands" | sorted)" \
-    "$(sed -n 's/^\.It Cm //p' "$pages/imgfile.1" | sorted)"
-expect 'pages of commands' "$(echo "$commands" | sorted)" \
+commands=$("$program" --help | sed -n '/^Commands/,/^$/s/^  \([a-z]*\) .*/\1/p' | sorted)
+expect 'commands' 'check compare convert create info preview stats ' "$commands"
+expect 'options that all have' "$(options_of_help)" \
+    "$(sed -n 's/^\.It Fl Fl \([a-z-]*\).*/--\1/p' "$pages/imgfile.1" | sorted)"
+expect 'pages of commands' "$commands" \
     "$(find "$pages" -name 'imgfile-*.1' | sed 's/.*imgfile-//; s/\.1$//' | sorted)"
-expect 'commands of the completion' "$(echo "$commands" | sorted)" "$(offered imgfile '')"
-expect 'options of the completion' "$(options_of_help | sorted)" "$(offered imgfile --)"
+expect 'commands of the completion' "$commands" "$(offered imgfile '')"
+expect 'options of the completion' "$(options_of_help)" "$(offered imgfile --)"
+in_all=$("$program" --help | sed -n '/^Commands/,/^$/s/^  \([a-z]*\)  *\(.\)/.It Cm \1\n.Nd \l\2/p')
+expect 'commands in imgfile.1' "$in_all" "$(sed -n '/^\.It Cm/{N;s/\n/\n.Nd /p;}' "$pages/imgfile.1")"
 for command in $commands; do
-    page=$pages/imgfile-$command.1
-    described=$("$program" --help | sed -n "s/^  $command  *//p")
-    said=$(sed -n 's/^\.Nd //p' "$page")
-    expect "description of $command" "${described,}" "$said"
-    expect "$command in imgfile.1" "$said" \
-        "$(sed -n "/^\.It Cm $command/{n;p;}" "$pages/imgfile.1")"
-    expect "options of $command" "$(options_of_help "$command" | sorted)" \
-        "$(options_of_page "$page" | sorted)"
-    expect "synopsis of $command" "$(options_of_page "$page" | grep -vx -e --help | sorted)" \
-        "$(options_of_synopsis "$page" | sorted)"
-    expect "operands of $command" "$(operands_of_help "$command")" "$(operands_of_page "$page")"
-    expect "completion of $command" "$(options_of_help "$command" | sorted)" \
+    expect "page of $command" "$(facts_of_help "$command")" "$(facts_of_page "$pages/imgfile-$command.1")"
+    expect "completion of $command" "$(options_of_help "$command")" \
         "$(offered imgfile "$command" --)"
 done
 

@@ -2,13 +2,12 @@
 # check_install.sh CMAKE GENERATOR BUILD VERSION CC [CFLAGS]: installs the build tree and moves the
 # installed tree. Then builds and runs a host with it, once through the CMake package and once through
 # pkg-config.
-set -eu
+# shellcheck source=tests/expect.sh
+. "$(dirname "$0")/../expect.sh"
 cmake=$1 generator=$2 build=$3 version=$4 cc=$5 cflags=${6:-}
 
 here=$(cd "$(dirname "$0")" && pwd)
 examples=$(cd "$here/../../examples" && pwd)
-scratch=$(mktemp -d)
-trap 'rm -rf "$scratch"' EXIT
 "$cmake" --install "$build" --prefix "$scratch/installed" >/dev/null
 mv "$scratch/installed" "$scratch/moved"
 cd "$scratch"

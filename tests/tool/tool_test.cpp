@@ -4,27 +4,23 @@
 
 #include <algorithm>
 #include <array>
-#include <cmath>
-#include <csignal>
-#include <cstdio>
+#include <cstdlib>
 #include <cstring>
 #include <filesystem>
-#include <functional>
 #include <gtest/gtest.h>
 #include <nlohmann/json.hpp>
-#include <random>
 #include <set>
+#include <span>
 #include <sstream>
 #include <tiffio.h>
 
-#include <fcntl.h>
 #include <sys/inotify.h>
 #include <sys/resource.h>
 #include <sys/stat.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 namespace fs = std::filesystem;
+using nlohmann::json;
 
 namespace {
 
@@ -39,82 +35,50 @@ void write_content(const std::string &file, const std::string &content)
     write_file(file, bytes(content.begin(), content.end()));
 }
 
-struct finished {
-    int status;  // below 0: the signal that ended the tool
-    std::string out, err;
-    long kilobytes;  // of memory, at most
-};
-
-// Samples in the order of PNM files.
-struct picture {
-    int nlines, nsamps, nbands, nbytes;
-    std::vector<int> samples;
-
-    int sample(int line, int samp, int band) const
-    {
-        return samples[static_cast<std::size_t>((line * nsamps + samp) * nbands + band)];
-    }
-    std::string as_pnm(const std::vector<int> &bands) const
-    {
-        std::ostringstream out;
-        out << (bands.size() == 3 ? "P6\n" : "P5\n") << nsamps << ' ' << nlines << '\n'
-            << (nbytes == 2 ? 65535 : 255) << '\n';
-        for (int line = 0; line < nlines; ++line)
-            for (int samp = 0; samp < nsamps; ++samp)
-                for (const int band : bands) {
-                    if (nbytes == 2) out.put(static_cast<char>(sample(line, samp, band) >> 8));
-                    out.put(static_cast<char>(sample(line, samp, band) & 255));
-                }
-        return out.str();
-    }
-};
-
-picture random_picture(int nlines, int nsamps, int nbands, int nbytes, int highest)
+// Samples as data/README.md describes them; those of two bytes may be larger by a factor.
+int sample(int line, int samp, int band, int nbytes, int factor = 1)
 {
-    std::mt19937 random(static_cast<unsigned>(nlines * 31 + nsamps * 7 + nbands * 3 + nbytes));
-    picture made{nlines, nsamps, nbands, nbytes, {}};
-    made.samples.resize(static_cast<std::size_t>(nlines * nsamps * nbands));
-    for (int &sample : made.samples)
-        sample = static_cast<int>(random() % (static_cast<unsigned>(highest) + 1));
-    return made;
+    return nbytes == 1 ? (band * 101 + line * 31 + samp * 7) % 251
+                       : (band * 501 + line * 13 + samp * 3) % 4096 * factor % 65536;
 }
+
+struct window {
+    int line, samp, nlines, nsamps;
+};
+
+// A PGM or PPM file of these samples.
+std::string pnm(const window &part, const std::vector<int> &bands, int nbytes, int factor = 1)
+{
+    std::ostringstream out;
+    out << (bands.size() == 3 ? "P6\n" : "P5\n") << part.nsamps << ' ' << part.nlines
+        << (nbytes == 2 ? "\n65535\n" : "\n255\n");
+    for (int line = part.line; line < part.line + part.nlines; ++line)
+        for (int samp = part.samp; samp < part.samp + part.nsamps; ++samp)
+            for (const int band : bands) {
+                const int value = sample(line, samp, band, nbytes, factor);
+                if (nbytes == 2) out.put(static_cast<char>(value >> 8));
+                out.put(static_cast<char>(value & 255));
+            }
+    return out.str();
+}
+
+struct finished {
+    int status;  // -1: a signal ended the tool
+    std::string out, err;
+};
 
 class Tool : public testing::Test {
 protected:
     Tool() { fs::current_path(m_folder / ""); }
     ~Tool() override { fs::current_path("/"); }
 
-    // Runs the tool with arguments that are separated by blanks. `prepare` runs in the new process,
-    // which is sent `signal` after `delay` milliseconds.
-    finished run(
-        const std::string &arguments, const std::function<void()> &prepare = [] {}, int signal = 0,
-        int delay = 0)
+    // Runs the tool in the shell: arguments may contain redirections.
+    finished run(const std::string &arguments, const std::string &before = "")
     {
-        std::istringstream words(arguments);
-        std::vector<std::string> list{IMGFILE_TOOL};
-        for (std::string word; words >> word;) list.push_back(word);
-        std::vector<char *> argv;
-        for (std::string &word : list) argv.push_back(word.data());
-        argv.push_back(nullptr);
-        const pid_t child = ::fork();
-        if (child == 0) {
-            for (const auto &[name, stream] :
-                 {std::pair{"out", STDOUT_FILENO}, {"err", STDERR_FILENO}})
-                ::dup2(::open((m_streams / name).c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0600),
-                       stream);
-            prepare();
-            ::execv(argv[0], argv.data());
-            ::_exit(127);
-        }
-        if (signal != 0) {
-            ::usleep(static_cast<useconds_t>(delay) * 1000);
-            ::kill(child, signal);
-        }
-        int status = -1;
-        rusage used{};
-        ::wait4(child, &status, 0, &used);
-        return {WIFSIGNALED(status) ? -WTERMSIG(status) : WEXITSTATUS(status),
-                content_of(m_streams / "out"), content_of(m_streams / "err"), used.ru_maxrss};
+        const std::string out = m_streams / "out", err = m_streams / "err";
+        const int status =
+            std::system((before + IMGFILE_TOOL " >" + out + " 2>" + err + " " + arguments).c_str());
+        return {WIFEXITED(status) ? WEXITSTATUS(status) : -1, content_of(out), content_of(err)};
     }
     void expect_done(const std::string &arguments)
     {
@@ -126,110 +90,81 @@ protected:
     {
         EXPECT_NE(text.find(part), text.npos) << part << " is not in\n" << text;
     }
-    std::vector<std::string> files() const
+    static std::set<std::string> files()
     {
-        std::vector<std::string> names;
-        for (const auto &each : fs::directory_iterator("."))
-            names.push_back(each.path().filename());
-        std::ranges::sort(names);
+        std::set<std::string> names;
+        for (const auto &each : fs::directory_iterator(".")) names.insert(each.path().filename());
         return names;
     }
 
     scratch_folder m_folder, m_streams;
 };
 
-struct kept_as {
-    const char *name, *options;
-    std::set<std::size_t> bands;  // how many it can hold
-    int nbytes;                   // of a sample, at most
-};
-const kept_as formats[] = {
-    {"a.img", "", {1, 2, 3}, 2},
-    {"tiled.img", "--tile 16x8", {1, 2, 3}, 2},
-    {"a.d", "", {1, 2, 3}, 1},
-    {"a.pnm", "", {1, 3}, 2},
-    {"a.png", "", {1, 3}, 2},
-    {"a.tif", "", {1, 2, 3}, 2},
-    {"tiled.tif", "--tile 32x16", {1, 2, 3}, 2},
-};
+// The first four hold any image, the next two 1 or 3 bands, and the last one bytes alone.
+const std::vector<std::string> formats = {
+    "a.img", "tiled.img --tile 16x8", "a.tif", "tiled.tif --tile 32x16", "a.pnm", "a.png", "a.d"};
 
-TEST_F(Tool, KeepsSamplesFromAnyFormatToAnyOther)
+std::string file_of(const std::string &format)
+{
+    return format.substr(0, format.find(' '));
+}
+
+TEST_F(Tool, KeepsSamplesAndWindowsFromAnyFormatToAnyOther)
 {
     for (const auto &[chosen, bands] : {std::pair{"1", std::vector{1}},
                                         {"2,0", std::vector{2, 0}},
                                         {"0,1,2", std::vector{0, 1, 2}}})
         for (const int nbytes : {1, 2}) {
-            const picture source = random_picture(37, 53, 3, nbytes, nbytes == 1 ? 255 : 4095);
-            write_content("source.ppm", source.as_pnm({0, 1, 2}));
-            std::vector<kept_as> able;
-            for (const kept_as &each : formats)
-                if (each.bands.contains(bands.size()) && nbytes <= each.nbytes)
-                    able.push_back(each);
+            write_content("source.ppm", pnm({0, 0, 37, 53}, {0, 1, 2}, nbytes));
+            const std::size_t able = bands.size() == 2 ? 4 : nbytes == 2 ? 6 : 7;
             const std::size_t band = static_cast<std::size_t>(nbytes) % bands.size();
-            for (const kept_as &first : able) {
-                const std::string from = std::string("from_") + first.name;
-                expect_done("convert source.ppm " + from + " --overwrite --band " + chosen + " " +
-                            first.options);
-                for (const kept_as &second : able) {
-                    const std::string target = std::string("to_") + second.name;
-                    expect_done("convert " + from + " " + target + " --overwrite " +
-                                second.options);
-                    expect_done("convert " + target + " seen.pgm --overwrite --band " +
-                                std::to_string(band));
-                    EXPECT_EQ(content_of("seen.pgm"), source.as_pnm({bands[band]}))
-                        << from << " to " << target << ", bands " << chosen;
+            for (const std::string &first : std::span(formats).first(able)) {
+                expect_done("convert --overwrite source.ppm from_" + first + " --band " + chosen);
+                const std::string from = "from_" + file_of(first);
+                for (const std::string &second : std::span(formats).first(able)) {
+                    expect_done("convert --overwrite " + from + " to_" + second);
+                    expect_done("convert --overwrite to_" + file_of(second) +
+                                " seen.pgm --window 9,17,28,36 --band " + std::to_string(band));
+                    EXPECT_EQ(content_of("seen.pgm"), pnm({9, 17, 28, 36}, {bands[band]}, nbytes))
+                        << from << " to " << second << ", bands " << chosen;
                 }
                 expect_done("compare " + from + " to_a.img");
             }
         }
 }
 
-TEST_F(Tool, ExtractsWindowsAndReadsStandardInput)
+TEST_F(Tool, ReadsStandardInputMoreThanOnce)
 {
-    const picture source = random_picture(40, 50, 3, 2, 65535);
-    write_content("a.ppm", source.as_pnm({0, 1, 2}));
-    for (const char *const name :
-         {"a.img --tile 8", "a.tif --tile 16", "a.png", "a.tif --overwrite"}) {
-        expect_done(std::string("convert --quiet a.ppm ") + name);
-        const std::string file = std::string(name).substr(0, 5);
-        expect_done("--quiet convert " + file + " w.pgm --overwrite --window 9,17,20,30 --band 2");
-        picture part{20, 30, 1, 2, {}};
-        for (int line = 0; line < 20; ++line)
-            for (int samp = 0; samp < 30; ++samp)
-                part.samples.push_back(source.sample(line + 9, samp + 17, 2));
-        EXPECT_EQ(content_of("w.pgm"), part.as_pnm({0})) << name;
-    }
-    // Standard input can be read more than once, by more than one reader at a time.
-    const auto from_picture = [] { ::dup2(::open("a.png", O_RDONLY), STDIN_FILENO); };
-    EXPECT_EQ(run("convert - - --format ppm", from_picture).out, content_of("a.ppm"));
-    EXPECT_EQ(run("compare - -", from_picture).status, 0);
-    EXPECT_EQ(run("convert - b.ppm --stretch", from_picture).status, 0);
+    write_content("a.ppm", pnm({0, 0, 40, 50}, {0, 1, 2}, 2, 37));
+    expect_done("convert a.ppm a.png");
+    EXPECT_EQ(run("convert - - --format ppm <a.png").out, content_of("a.ppm"));
+    expect_done("compare - - <a.png");  // by two readers at a time
+    expect_done("convert - b.ppm --stretch <a.png");
     expect_done("convert a.ppm c.ppm --stretch");
     EXPECT_EQ(content_of("b.ppm"), content_of("c.ppm"));
 }
 
-void write_tiff(const char *name, const char *mode, const picture &source, int compression,
-                bool planar, int strip)
+constexpr window tall{0, 0, 1700, 900};
+
+void write_tiff(const char *mode, int compression, bool planar, int strip)
 {
-    TIFF *const file = TIFFOpen(name, mode);
-    for (const auto &[tag, value] :
-         {std::pair{TIFFTAG_IMAGELENGTH, source.nlines},
-          {TIFFTAG_IMAGEWIDTH, source.nsamps},
-          {TIFFTAG_SAMPLESPERPIXEL, source.nbands},
-          {TIFFTAG_BITSPERSAMPLE, 16},
-          {TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_RGB},
-          {TIFFTAG_COMPRESSION, compression},
-          {TIFFTAG_PLANARCONFIG, planar ? PLANARCONFIG_SEPARATE : PLANARCONFIG_CONTIG},
-          {TIFFTAG_ROWSPERSTRIP, strip}})
-        TIFFSetField(file, static_cast<std::uint32_t>(tag), value);
-    const int step = planar ? 1 : source.nbands;
-    for (int plane = 0; plane < source.nbands; plane += step)
-        for (int line = 0; line < source.nlines; ++line) {
-            std::vector<std::uint16_t> samples;
-            for (int samp = 0; samp < source.nsamps; ++samp)
-                for (int band = plane; band < plane + step; ++band)
-                    samples.push_back(static_cast<std::uint16_t>(source.sample(line, samp, band)));
-            TIFFWriteScanline(file, samples.data(), static_cast<std::uint32_t>(line),
+    TIFF *const file = TIFFOpen("a.tif", mode);
+    TIFFSetField(file, TIFFTAG_IMAGELENGTH, tall.nlines);
+    TIFFSetField(file, TIFFTAG_IMAGEWIDTH, tall.nsamps);
+    TIFFSetField(file, TIFFTAG_SAMPLESPERPIXEL, 3);
+    TIFFSetField(file, TIFFTAG_BITSPERSAMPLE, 16);
+    TIFFSetField(file, TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_RGB);
+    TIFFSetField(file, TIFFTAG_COMPRESSION, compression);
+    TIFFSetField(file, TIFFTAG_PLANARCONFIG, planar ? PLANARCONFIG_SEPARATE : PLANARCONFIG_CONTIG);
+    TIFFSetField(file, TIFFTAG_ROWSPERSTRIP, strip);
+    const int step = planar ? 1 : 3;
+    for (int plane = 0; plane < 3; plane += step)
+        for (int line = 0; line < tall.nlines; ++line) {
+            std::vector<std::uint16_t> row;
+            for (int i = 0; i < tall.nsamps * step; ++i)
+                row.push_back(
+                    static_cast<std::uint16_t>(sample(line, i / step, plane + i % step, 2, 37)));
+            TIFFWriteScanline(file, row.data(), static_cast<std::uint32_t>(line),
                               static_cast<std::uint16_t>(plane));
         }
     TIFFClose(file);
@@ -238,16 +173,14 @@ void write_tiff(const char *name, const char *mode, const picture &source, int c
 // Strips are read piece by piece, from any line.
 TEST_F(Tool, ReadsStripsOfAllKinds)
 {
-    const picture source = random_picture(1700, 900, 3, 2, 300);
-    write_content("a.ppm", source.as_pnm({0, 1, 2}));
-    expect_done("convert a.ppm window.ppm --window 777,50,200,600 --band 2,0,2");
+    write_content("a.ppm", pnm(tall, {0, 1, 2}, 2, 37));
     for (const int compression : {COMPRESSION_NONE, COMPRESSION_LZW})
         for (const bool planar : {false, true})
             for (const int strip : {7, 1700}) {
-                write_tiff("a.tif", strip == 7 ? "wb" : "wl", source, compression, planar, strip);
+                write_tiff(strip == 7 ? "wb" : "wl", compression, planar, strip);
                 expect_done("compare a.ppm a.tif");
                 expect_done("convert a.tif b.ppm --overwrite --window 777,50,200,600 --band 2,0,2");
-                EXPECT_EQ(content_of("b.ppm"), content_of("window.ppm"));
+                EXPECT_EQ(content_of("b.ppm"), pnm({777, 50, 200, 600}, {2, 0, 2}, 2, 37));
             }
     expect_done("convert a.ppm b.tif");
     fs::resize_file("b.tif", 4'000'000);
@@ -257,101 +190,77 @@ TEST_F(Tool, ReadsStripsOfAllKinds)
 // What the tool stretches is what a host of the library sees.
 TEST_F(Tool, StretchesAsTheLibraryDoesAllAtOnce)
 {
-    const picture source = random_picture(70, 90, 1, 2, 6000);
-    write_content("a.pgm", source.as_pnm({0}));
-    const finished converted = run("convert a.pgm a.img");
-    expect_within(converted.err, "imgfile: a.pgm: note: ");
-    expect_within(converted.err, " samples lie beyond 12 bits; they were kept as they are\n");
-    for (const std::string window : {"0,0,70,90", "3,5,60,71"}) {
-        int line, samp, nlines, nsamps;
-        std::sscanf(window.c_str(), "%d,%d,%d,%d", &line, &samp, &nlines, &nsamps);
-        const finished end = run("convert a.img s.pgm --stretch --overwrite --window " + window);
-        expect_within(end.err, " beyond 12 bits; they were mapped as the highest value\n");
-        std::vector<std::uint8_t> seen(static_cast<std::size_t>(nlines * nsamps));
-        const img_handle image = img_openfile("a.img", IMG_OPEN_READ_ONLY);
-        ASSERT_EQ(
-            img_load_buffer(image, line, samp, nlines, nsamps, 0, seen.data(), nsamps, nullptr), 0);
-        img_closefile(image);
-        const std::string bytes = content_of("s.pgm");
-        EXPECT_EQ(bytes.substr(bytes.size() - seen.size()), std::string(seen.begin(), seen.end()));
-    }
+    write_content("a.pgm", pnm({0, 0, 70, 90}, {0}, 2, 1201));
+    const std::string kept = run("convert a.pgm a.img").err;
+    expect_within(kept, "imgfile: a.pgm: note: ");
+    expect_within(kept, " samples lie beyond 12 bits; they were kept as they are\n");
+    expect_within(run("check a.img").out, "samples beyond 12 bits\n");
+    expect_done("--quiet convert a.pgm a.img --overwrite");
+    expect_within(run("convert a.img s.pgm --stretch --window 3,5,60,71").err,
+                  " beyond 12 bits; they were mapped as the highest value\n");
+    std::string seen(60 * 71, '\0');
+    const img_handle image = img_openfile("a.img", IMG_OPEN_READ_ONLY);
+    EXPECT_EQ(img_load_buffer(image, 3, 5, 60, 71, 0, seen.data(), 71, nullptr), 0);
+    img_closefile(image);
+    EXPECT_EQ(content_of("s.pgm"), "P5\n71 60\n255\n" + seen);
 }
 
 TEST_F(Tool, RefusesInOneLineAndKeepsTheTarget)
 {
-    write_content("rgb.ppm", random_picture(20, 30, 3, 1, 255).as_pnm({0, 1, 2}));
-    expect_done("create two.img --lines 20 --samples 30 --bytes 2 --pattern");
-    expect_done("create seven.d --lines 20 --samples 30 --bands 7 --pattern");
-    write_content("cut.pgm", random_picture(20, 30, 1, 1, 255).as_pnm({0}).substr(0, 400));
-    expect_done("convert rgb.ppm whole.img --tile 8 --band 0");
-    write_content("cut.img", content_of("whole.img").substr(0, 244 + 8 * 40));
+    const std::string pixels = pnm({0, 0, 20, 30}, {0, 1, 2}, 1);
+    write_content("rgb.ppm", pixels);
+    write_content("cut.pgm", pnm({0, 0, 20, 30}, {0}, 1).substr(0, 400));
+    expect_done("convert rgb.ppm cut.img --tile 8 --band 0");
+    fs::resize_file("cut.img", 244 + 8 * 40);
     write_content("junk", "nothing in particular, but long enough to hold a header of some kind");
     write_content("old", "what was there before");
     write_content("empty", "");
     write_content("vast.pgm", "P5 99999999999 5 255\n");
     fs::create_hard_link("rgb.ppm", "twin.ppm");
-    fs::create_symlink("rgb.ppm", "link.ppm");
-    fs::create_symlink("loop", "loop");
     ASSERT_EQ(::mkfifo("pipe", 0600), 0);
-    const std::string pixels = content_of("rgb.ppm");
-    struct refusal {
-        std::string arguments;
-        int status;
-        std::string message;  // its beginning, without the name of the tool
+    const auto before = files();
+    const struct {
+        std::string arguments, message;  // the message's beginning, without the name of the tool
+    } list[] = {
+        {"", "a command is required (see imgfile --help)"},
+        {"--versio", "unknown option: --versio (see imgfile --help)"},
+        {"--quiet nonsense", "unknown command: nonsense (see imgfile --help)"},
+        {"check -", "check cannot read standard input (see imgfile check --help)"},
+        {"info empty", "empty: is empty"},
+        {"convert missing.img old --overwrite --format png", "missing.img: No such file"},
+        {"convert . old --overwrite --format png", ".: is a folder"},
+        {"convert pipe old --overwrite --format png", "pipe: is not a regular file"},
+        {"convert vast.pgm old --overwrite --format png", "vast.pgm: has no valid PGM or PPM he"},
+        {"convert junk old --overwrite --format png", "junk: is not a known image format, or"},
+        {"convert cut.pgm old --overwrite --format vitec", "cut.pgm: truncated: line 12 is miss"},
+        {"convert cut.img old --overwrite --format png", "cut.img: truncated: line 8 of band 0 is"},
+        {"convert rgb.ppm twin.ppm --overwrite", "twin.ppm: is the input file"},
+        {"convert rgb.ppm pipe --overwrite --format png", "pipe: exists and is not a regular"},
+        {"convert rgb.ppm old --format png", "old: exists; --overwrite replaces it"},
+        {"convert rgb.ppm no/new.png", "no/new.png: cannot be written: No such file"},
+        {"convert rgb.ppm old --overwrite", "old: cannot write files without an ending; use --fo"},
+        {"convert rgb.ppm - --format png", "standard output takes only PGM and PPM (see imgfile"},
+        {"convert rgb.ppm a.png --band 0,1,0,1", "a.png: PNG files hold 1 or 3 bands, not 4"},
+        {"convert rgb.ppm vitec.img --tile 100", "vitec.img: the tile sides of VITec files are"},
+        {"convert rgb.ppm tiff.tif --tile 8", "tiff.tif: the tile sides of TIFF files are"},
+        {"convert rgb.ppm png.png --tile 16", "png.png: PNG files have no tiles"},
+        {"convert rgb.ppm a.png --window 0,0,21,1", "rgb.ppm: has no window 0,0,21,1: it has 20"},
+        {"convert rgb.ppm a.png --window 0,0,0,1", "--window is empty (see imgfile convert --help"},
+        {"convert rgb.ppm a.png --band 3", "rgb.ppm: has no band 3: it has 3, counted from 0"},
+        {"convert rgb.ppm a.png --band 1,x", "--band: invalid value \"1,x\" (see imgfile convert"},
+        {"preview rgb.ppm a.png --band 0,1", "--band takes one band or three (see imgfile prev"},
+        {"stats rgb.ppm --histogram rgb.ppm --overwrite", "rgb.ppm: the picture is a PNG file; it"},
+        {"create vast.img --lines 50000 --samples 50000",
+         "vast.img: cannot be created: the file would have 2 GiB or more"},
+        {"create a.d --lines 5 --samples 5 --tile 8", "a.d: Helava files have no tiles"},
+        {"create a.d --lines 5 --samples 5 --bytes 2", "a.d: Helava files hold samples of one"},
+        {"create a.img --lines 5 --samples 5 --bands 7", "a.img: VITec files hold at most 3 ba"},
+        {"create a.d --lines -5 --samples 5", "--lines: Value -5 not in range 0 to 2147483647"},
     };
-    std::vector<refusal> list{
-        {"convert rgb.ppm old --format png", 1, "old: exists; --overwrite replaces it"},
-        {"convert rgb.ppm twin.ppm --overwrite", 1, "twin.ppm: is the input file"},
-        {"convert link.ppm rgb.ppm --overwrite", 1, "rgb.ppm: is the input file"},
-        {"convert rgb.ppm pipe --format png --overwrite", 1, "pipe: exists and is not a regular"},
-        {"convert rgb.ppm nowhere/new.png", 1, "nowhere/new.png: cannot be written: No such file"},
-        {"convert rgb.ppm - --format png", 2, ""},
-        {"preview rgb.ppm old.png --band 0,1", 2, ""},
-        {"stats rgb.ppm --histogram rgb.ppm --overwrite", 2, ""},
-        {"create old --overwrite --type vitec --lines 50000 --samples 50000", 1,
-         "old: cannot be created: the file would have 2 GiB or more\n"},
-        {"create old --overwrite --type helava --lines 5 --samples 5 --tile 8", 1,
-         "old: Helava files have no tiles\n"},
-        {"create old.xyz --lines 5 --samples 5", 2, "old.xyz: cannot write .xyz files; use --type"},
-        {"create old --overwrite --type vitec --lines -5 --samples 5", 2,
-         "--lines: Value -5 not in range 0 to 2147483647 (see imgfile create --help)\n"},
-        {"check -", 2, "check cannot read standard input (see imgfile check --help)\n"},
-        {"info empty", 1, "empty: is empty\n"},
-        {"check loop", 1, "loop: Too many levels of symbolic links\n"},
-        {"compare rgb.ppm missing.img", 1, "missing.img: No such file or directory\n"},
-        {"--quiet nonsense", 2, "unknown command: nonsense (see imgfile --help)\n"},
-        {"--versio", 2, "unknown option: --versio (see imgfile --help)\n"},
-        {"", 2, "a command is required (see imgfile --help)\n"},
-    };
-    for (const auto &[arguments, status, message] : {
-             refusal{"missing.img old --format png", 1, "missing.img: No such file or directory\n"},
-             {". old --format png", 1, ".: is a folder\n"},
-             {"pipe old --format png", 1, "pipe: is not a regular file\n"},
-             {"vast.pgm old --format png", 1, "vast.pgm: has no valid PGM or PPM header\n"},
-             {"junk old --format png", 1, "junk: is not a known image format, or its header is"},
-             {"cut.pgm old --format vitec", 1, "cut.pgm: truncated: line 12 is missing\n"},
-             {"cut.img old --format png", 1, "cut.img: truncated: line 8 of band 0 is missing\n"},
-             {"two.img old --format helava", 1,
-              "old: Helava files hold samples of one byte (imgfile"},
-             {"seven.d old --format vitec", 1,
-              "old: VITec files hold at most 3 bands, not 7 (imgfile"},
-             {"seven.d old --format png", 1,
-              "old: PNG files hold 1 or 3 bands, not 7; --band chooses"},
-             {"rgb.ppm old --format vitec --tile 100", 1, "old: the tile sides of VITec files are"},
-             {"rgb.ppm old --format tiff --tile 8", 1, "old: the tile sides of TIFF files are"},
-             {"rgb.ppm old --format png --tile 16", 1, "old: PNG files have no tiles\n"},
-             {"rgb.ppm old --format png --window 0,0,21,1", 1,
-              "rgb.ppm: has no window 0,0,21,1: it"},
-             {"rgb.ppm old --format png --window 0,0,0,1", 2, "--window is empty (see imgfile"},
-             {"rgb.ppm old --format png --band 3", 1, "rgb.ppm: has no band 3: it has 3, counted"},
-             {"rgb.ppm old --format png --band=", 2, ""},
-             {"rgb.ppm old", 2, ""},
-         })
-        list.push_back({"convert " + arguments + " --overwrite", status, message});
-    for (const auto &[arguments, status, message] : list) {
-        const auto before = files();
+    for (const auto &[arguments, message] : list) {
         const finished end = run(arguments);
-        EXPECT_EQ(end.status, status) << arguments;
+        const bool is_usage = end.err.find(" --help)") != end.err.npos;
+        EXPECT_EQ(end.status, is_usage ? 2 : 1) << arguments;
         EXPECT_EQ(std::ranges::count(end.err, '\n'), 1) << arguments << ": " << end.err;
         EXPECT_TRUE(end.err.starts_with("imgfile: " + message)) << arguments << ": " << end.err;
         EXPECT_EQ(end.out, "") << arguments;
@@ -364,36 +273,24 @@ TEST_F(Tool, RefusesInOneLineAndKeepsTheTarget)
 TEST_F(Tool, LeavesNothingWhenItFails)
 {
     expect_done("create a.img --lines 900 --samples 700 --bands 3 --pattern");
-    for (const char *const name : {"b.img", "b.d", "b.ppm", "b.png", "b.tif"}) {
-        const finished end = run(std::string("convert a.img ") + name, [] {
-            const rlimit limit{2'000, 2'000};
-            ::setrlimit(RLIMIT_FSIZE, &limit);
-        });
+    for (const std::string name : {"b.img", "b.d", "b.ppm", "b.png", "b.tif"}) {
+        const finished end = run("convert a.img " + name, "ulimit -f 3; ");
         EXPECT_EQ(end.status, 1) << name;
-        EXPECT_EQ(end.err,
-                  std::string("imgfile: ") + name + ": cannot be written: File too large\n");
+        EXPECT_EQ(end.err, "imgfile: " + name + ": cannot be written: File too large\n");
     }
-    for (const int signal : {SIGINT, SIGTERM, SIGKILL})
-        for (int delay = 5; delay < 60; delay += 10) {
-            const finished end = run(
-                "convert a.img c.png", [] {}, signal, delay);
-            EXPECT_TRUE(end.status == 0 || end.status == -signal);
-            EXPECT_TRUE(end.status != 0 || fs::exists("c.png"));
-            const bool is_there = fs::exists("c.png");  // the work may end before the signal
-            EXPECT_TRUE(!is_there || run("compare a.img c.png").status == 0);
+    for (const std::string before : {"timeout -s INT 0.0", "timeout -s KILL 0.0"})
+        for (const char *const delay : {"05 ", "1 ", "15 ", "2 ", "3 ", "4 ", "5 ", "6 "}) {
+            const int status = run("convert a.img c.png", before + delay).status;
+            EXPECT_TRUE(status == 0 || status == 124 || status == 137) << status;
+            // The work may end before the signal.
+            EXPECT_TRUE(fs::exists("c.png") ? run("compare a.img c.png").status == 0 : status != 0);
             fs::remove("c.png");
         }
-    EXPECT_EQ(files(), (std::vector<std::string>{"a.img"}));
+    EXPECT_EQ(files(), std::set<std::string>{"a.img"});
 
-    for (const char *const arguments : {"info a.img", "--help", "convert a.img -", "stats a.img",
-                                        "compare a.img a.img", "--version"})
-        for (const bool closed : {false, true}) {
-            const finished end = run(arguments, [=] {
-                if (closed)
-                    ::close(STDOUT_FILENO);
-                else
-                    ::dup2(::open("/dev/full", O_WRONLY), STDOUT_FILENO);
-            });
+    for (const std::string arguments : {"info a.img", "--help", "convert a.img -"})
+        for (const char *const closed_or_full : {" >&-", " >/dev/full"}) {
+            const finished end = run(arguments + closed_or_full);
             EXPECT_EQ(end.status, 1) << arguments;
             EXPECT_TRUE(end.err.starts_with("imgfile: standard output: cannot be written"))
                 << end.err;
@@ -404,39 +301,31 @@ TEST_F(Tool, DescribesFiles)
 {
     expect_done("create a.img --lines 100 --samples 70 --bands 2 --bytes 2 --tile 16x32");
     expect_done("create user@host.d --lines 3 --samples 5 --bands 4");
-    expect_done("convert a.img t.tif --tile 16x32");
-    const finished end = run("info a.img missing user@host.d t.tif --json");
+    const finished end = run("info a.img missing user@host.d --json");
     EXPECT_EQ(end.status, 1);
     EXPECT_EQ(end.err, "imgfile: missing: No such file or directory\n");
-    auto facts = nlohmann::json::parse(end.out);
-    ASSERT_EQ(facts.size(), 3U);
+    json facts = json::parse(end.out);
+    ASSERT_EQ(facts.size(), 2U);
     EXPECT_EQ(facts[0]["created"].get<std::string>().size(), 19U);
     facts[0].erase("created");
-    EXPECT_EQ(facts[0], nlohmann::json::parse(R"({
+    EXPECT_EQ(facts[0], json::parse(R"({
         "file": "a.img", "type": "VITec", "byte_order": "big", "lines": 100, "samples": 70,
         "bands": 2, "bytes_per_sample": 2, "bits_per_sample": 12, "layout": "tiles of band planes",
         "tile_size": {"lines": 16, "samples": 32}, "tile_grid": {"down": 7, "across": 3},
         "data_offset": 244, "file_length": 43252, "expected_length": 43252})"));
-    EXPECT_EQ(facts[1]["type"], "Helava");
     EXPECT_EQ(facts[1]["expected_length"], 3 * 5 * 4 + 16);
     EXPECT_EQ(facts[1]["created"], nullptr);
-    EXPECT_EQ(facts[2]["tile_size"], facts[0]["tile_size"]);
-
-    write_content("a.img", content_of("a.img").substr(0, 1000));
-    expect_within(run("info a.img").out, "1,000 bytes, TRUNCATED: 42,252 of 43,252 are missing");
 }
 
 // Facts of one file come from one open: else a file replaced in between would mix them.
 TEST_F(Tool, OpensAFileOnce)
 {
-    expect_done("create a.img --lines 40 --samples 40 --tile 8 --bytes 2 --pattern");
-    expect_done("create b.d --lines 40 --samples 40 --pattern");
-    for (const char *const name : {"c.ppm", "c.png", "c.tif"})
-        expect_done(std::string("convert --band 0,0,0 a.img ") + name);
+    write_content("c.ppm", pnm({0, 0, 40, 40}, {0, 1, 2}, 1));
+    for (const char *const target : {"a.img --tile 8", "b.d", "c.png", "c.tif"})
+        expect_done(std::string("convert c.ppm ") + target);
     for (const std::string name : {"a.img", "b.d", "c.ppm", "c.png", "c.tif"})
         for (const std::string &arguments :
-             {"info " + name, "info --json " + name, "check " + name, "stats " + name,
-              "stats --overwrite --histogram h.png " + name,
+             {"info " + name, "check " + name, "stats --overwrite --histogram h.png " + name,
               "preview --overwrite " + name + " p.png", "convert --overwrite " + name + " o.tif",
               "convert --overwrite --stretch " + name + " o.tif"}) {
             const int watch = ::inotify_init1(IN_NONBLOCK);
@@ -481,7 +370,6 @@ TEST_F(Tool, FindsErrorsInFiles)
         damaged[position] = byte;
         write_content("a.img", damaged);
         const finished end = run("check a.img");
-        EXPECT_EQ(end.err, "");
         EXPECT_EQ(end.status, 1) << position;
         expect_within(end.out, std::string("a.img: ") + finding);
     }
@@ -491,15 +379,11 @@ TEST_F(Tool, FindsErrorsInFiles)
     std::fill(zeros.begin() + 244 + 5 * 64 * 3, zeros.end(), '\0');
     write_content("a.img", zeros);
     EXPECT_EQ(run("check a.img").out, "a.img: band 0 is 0 from line 24 on, of 64\n");
-    write_content("b.pgm", random_picture(9, 9, 1, 2, 5000).as_pnm({0}));
-    run("convert b.pgm b.img");
-    expect_within(run("check b.img").out, "samples beyond 12 bits\n");
+    write_content("b.pgm", pnm({0, 0, 9, 9}, {0}, 2));
     expect_done("check b.pgm");
-    write_content("c.pgm", content_of("b.pgm") + "more");
-    EXPECT_EQ(run("check c.pgm").out, "c.pgm: 4 bytes more than the header states\n");
 }
 
-// data/README.md describes the files and states the formula of their samples.
+// data/README.md describes the files.
 TEST_F(Tool, ReadsFilesMadeOutsideThisCode)
 {
     const struct {
@@ -513,76 +397,58 @@ TEST_F(Tool, ReadsFilesMadeOutsideThisCode)
         {"untiled_16bit.img", 29, 41, 1, 2, "2 bytes, 12 bits\n  order      big-endian\n"},
         {"tiled_16bit_little.img", 29, 41, 2, 2, "8 lines x 32 samples, 4 down x 2 across\n"},
         {"long_header.img", 9, 11, 1, 1, "data at    byte 504\n"},
-        {"helava_2bands.d", 23, 35, 2, 1, "size       23 lines x 35 samples x 2 bands\n"},
+        {"helava_2bands.d", 23, 35, 2, 1, "Helava\n  size       23 lines x 35 samples x 2 bands\n"},
         {"helava_little.d", 23, 35, 1, 1, "little-endian\n"},
     };
     for (const auto &[name, nlines, nsamps, nbands, nbytes, fact] : list) {
-        picture source{nlines, nsamps, nbands, nbytes, {}};
-        for (int i = 0; i < nlines * nsamps * nbands; ++i) {
-            const int band = i % nbands, samp = i / nbands % nsamps, line = i / nbands / nsamps;
-            source.samples.push_back(nbytes == 1 ? (band * 101 + line * 31 + samp * 7) % 251
-                                                 : (band * 501 + line * 13 + samp * 3) % 4096);
-        }
         const std::string file = std::string(IMGFILE_TEST_DATA "/") + name;
         const std::string facts = run("info " + file).out;
         expect_within(facts, fact);
         expect_within(facts, " bytes, as the header states\n");
         for (int band = 0; band < nbands; ++band) {
             expect_done("convert " + file + " band.pgm --overwrite --band " + std::to_string(band));
-            EXPECT_EQ(content_of("band.pgm"), source.as_pnm({band})) << file;
+            EXPECT_EQ(content_of("band.pgm"), pnm({0, 0, nlines, nsamps}, {band}, nbytes)) << file;
         }
     }
     const std::string cut = IMGFILE_TEST_DATA "/cut_in_line_20.img";
     expect_within(run("info " + cut).out, "TRUNCATED: 884 of 2,205 are missing");
-    expect_within(run("check " + cut).out, "truncated: line 20 of band 0 is missing\n");
-    EXPECT_EQ(run("convert " + cut + " cut.png").err,
-              "imgfile: " + cut + ": truncated: line 20 of band 0 is missing\n");
+    const std::string problem = cut + ": truncated: line 20 of band 0 is missing\n";
+    expect_within(run("check " + cut).out, problem);
+    EXPECT_EQ(run("convert " + cut + " cut.png").err, "imgfile: " + problem);
 }
 
 TEST_F(Tool, ComparesAndMeasuresSamples)
 {
-    picture source = random_picture(30, 20, 3, 1, 200);
-    write_content("a.ppm", source.as_pnm({0, 1, 2}));
-    expect_done("convert a.ppm a.img --tile 8");
-    EXPECT_EQ(run("compare a.ppm a.img").out, "a.ppm and a.img are equal: 1,800 samples\n");
-    source.samples[(7 * 20 + 5) * 3 + 2] ^= 64;
-    source.samples[(7 * 20 + 6) * 3] ^= 1;
-    write_content("b.ppm", source.as_pnm({0, 1, 2}));
-    const finished end = run("compare a.img b.ppm");
+    const std::string samples("P6\n2 2\n255\n\0\5\0\0\5\0\2\5\0\2\5\x8", 23);
+    write_content("m.ppm", samples);
+    EXPECT_EQ(run("compare m.ppm m.ppm").out, "m.ppm and m.ppm are equal: 12 samples\n");
+    std::string changed = samples;
+    changed[11 + 5] = 64;
+    changed[11 + 6] = 3;
+    write_content("n.ppm", changed);
+    const finished end = run("compare n.ppm m.ppm");
     EXPECT_EQ(end.status, 1);
-    const int changed = source.sample(7, 5, 2);
-    EXPECT_EQ(end.out,
-              "a.img and b.ppm differ: 2 of 1,800 samples; first at line 7, sample 5, band 2: " +
-                  std::to_string(changed ^ 64) + " and " + std::to_string(changed) +
-                  "; largest difference 64\n");
-    expect_done("convert a.ppm c.png --window 0,0,29,20");
-    EXPECT_EQ(run("compare a.ppm c.png").status, 1);
+    EXPECT_EQ(end.out, "n.ppm and m.ppm differ: 2 of 12 samples; first at line 0, sample 1, "
+                       "band 2: 64 and 0; largest difference 64\n");
 
-    const picture measured{2, 2, 3, 1, {0, 5, 0, 0, 5, 0, 2, 5, 0, 2, 5, 8}};
-    write_content("m.ppm", measured.as_pnm({0, 1, 2}));
-    const auto facts = nlohmann::json::parse(run("stats m.ppm --json --histogram h.png").out);
-    const double expected[3][5] = {
-        {0, 2, 1, 1, 0.5}, {5, 5, 5, 0, 0}, {0, 8, 2, std::sqrt(12), 0.75}};
-    for (std::size_t band = 0; band < 3; ++band) {
-        const char *const names[] = {"minimum", "maximum", "mean", "standard_deviation",
-                                     "share_of_zero"};
-        for (std::size_t i = 0; i < 5; ++i)
-            EXPECT_NEAR(facts["bands"][band][names[i]], expected[band][i], 1e-6) << names[i];
-        EXPECT_EQ(facts["bands"][band]["beyond_stated_bits"], 0);
-    }
+    const json facts = json::parse(run("stats m.ppm --json --histogram h.png").out);
+    EXPECT_EQ(facts["bands"][1]["minimum"], 5);
+    EXPECT_EQ(facts["bands"][2], json::parse(R"({
+        "band": 2, "minimum": 0, "maximum": 8, "mean": 2.0, "share_of_zero": 0.75,
+        "standard_deviation": 3.4641016151377544, "stated_bits": 8, "beyond_stated_bits": 0})"));
     expect_within(run("info h.png").out, "540 lines x 960 samples x 3 bands");
+    EXPECT_EQ(run("compare m.ppm h.png").status, 1);
     fs::copy("m.ppm", "\xff.ppm");
     expect_done("stats \xff.ppm --histogram i.png --quiet");
     EXPECT_GT(fs::file_size("i.png"), fs::file_size("h.png") / 2);  // not empty
 
-    expect_done("preview a.img p.png --size 16 --raw");
+    write_content("a.ppm", pnm({0, 0, 30, 20}, {0, 1, 2}, 1));
+    expect_done("preview a.ppm p.png --size 16 --raw");
     expect_done("convert p.png p.ppm");
     const std::string pixels = content_of("p.ppm");
     EXPECT_TRUE(pixels.starts_with("P6\n10 15\n255\n"));
-    const int mean = (source.sample(8, 4, 1) + source.sample(8, 5, 1) + source.sample(9, 4, 1) +
-                      source.sample(9, 5, 1)) /
-                     4;
-    EXPECT_EQ(static_cast<unsigned char>(pixels[pixels.size() - 450 + (4 * 10 + 2) * 3 + 1]), mean);
+    // The mean of 126, 133, 157 and 164.
+    EXPECT_EQ(static_cast<unsigned char>(pixels[pixels.size() - 450 + (4 * 10 + 2) * 3 + 1]), 145);
 }
 
 #ifndef IMGFILE_SANITIZED  // sanitizers use memory of their own
@@ -593,14 +459,15 @@ TEST_F(Tool, UsesLittleMemoryForLargeImages)
                           "\xc4\x78\xc9\0\0\0\0IDAT";
     write_content("line.png", std::string(header, sizeof header - 1));
     expect_done("create a.img --lines 10000 --samples 15000");
-    for (const char *const arguments :
+    for (const std::string arguments :
          {"convert a.img b.img --tile 256", "convert b.img c.tif --tile 512", "convert a.img -",
           "stats b.img", "preview b.img p.png", "check a.img", "compare a.img b.img",
           "preview line.img l.png", "convert line.img l.pgm", "check line.png", "check line.img"}) {
-        const finished end =
-            run(arguments, [] { ::dup2(::open("/dev/null", O_WRONLY), STDOUT_FILENO); });
-        EXPECT_LT(end.kilobytes, 64 * 1024) << arguments;
-        EXPECT_EQ(end.status, std::strncmp(arguments, "check", 5) == 0 ? 1 : 0) << arguments;
+        EXPECT_EQ(run(arguments + " >/dev/null").status, arguments.starts_with("check") ? 1 : 0)
+            << arguments;
+        rusage used{};  // by the run that used most
+        ::getrusage(RUSAGE_CHILDREN, &used);
+        EXPECT_LT(used.ru_maxrss, 64 * 1024) << arguments;
     }
 }
 #endif
