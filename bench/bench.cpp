@@ -1,7 +1,7 @@
 // imgfile_bench: how long the library takes for twelve everyday tasks, beside candidates written by
 // hand for the same task and beside other libraries. The tasks are defined below, in make_tasks.
 //
-// imgfile_bench [--small] [--dir=FOLDER] [--json=FILE] [--list | --scaling | TASK...]
+// imgfile_bench [--small] [--dir=FOLDER] [--json=FILE] [--list | --scaling | --threads | TASK...]
 //   TASK      T1 to T12; without a name, all
 //   --list    prints the tasks
 //   --small   tiny images and two rounds, to check that everything works and all candidates agree
@@ -10,6 +10,7 @@
 //             the end. Default: the folder for temporary files
 //   --json    also writes the medians to a file
 //   --scaling how the library's times grow with images, windows, tiles and bands
+//   --threads how many windows threads read, beside as many processes
 // Options of Google Benchmark are accepted, too. Exit status: 1 if candidates read or write
 // different bytes, or if anything fails; 2 for an unknown argument. Read task.h first, then
 // measure.h.
@@ -81,7 +82,7 @@ private:
 };
 
 struct options {
-    bool list = false, small = false, scaling = false;
+    bool list = false, small = false, scaling = false, threads = false;
     std::filesystem::path folder = std::filesystem::temp_directory_path();
     std::string json = {};
     std::vector<std::string> tasks = {};
@@ -96,6 +97,8 @@ bool take_argument(const std::string &argument, options &asked)
         asked.small = true;
     else if (argument == "--scaling")
         asked.scaling = true;
+    else if (argument == "--threads")
+        asked.threads = true;
     else if (argument.starts_with("--dir="))
         asked.folder = argument.substr(6);
     else if (argument.starts_with("--json="))
@@ -132,6 +135,11 @@ int run(const options &asked)
     const bench_folder folder(asked.folder);
     const image_set images{folder.path(), asked.small ? SMALL_SIDE : FULL_SIDE,
                            asked.small ? SMALL_TILE : FULL_TILE};
+    if (asked.threads) {
+        make_files(images);
+        measure_threads(images, make_tasks(images), asked.small);
+        return 0;
+    }
     medians times;
     if (asked.scaling) {
         register_scaling(images, asked.small);
@@ -168,7 +176,8 @@ int main(int argc, char **argv)
             if (take_argument(argument, asked)) continue;
             std::fprintf(stderr,
                          "imgfile_bench: unknown argument %s\nusage: imgfile_bench [--small] "
-                         "[--dir=FOLDER] [--json=FILE] [--list | --scaling | TASK...]\n",
+                         "[--dir=FOLDER] [--json=FILE] [--list | --scaling | --threads | "
+                         "TASK...]\n",
                          argument.c_str());
             return 2;
         }

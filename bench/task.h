@@ -60,4 +60,7 @@ void add_gdal(const image_set &images, std::vector<task> &tasks);
 // Registers the measurements with growing sizes; only the first of them if `small`.
 void register_scaling(const image_set &images, bool small);
 
+// Prints how those of the tasks that read windows scale with threads; one short round if `small`.
+void measure_threads(const image_set &images, const std::vector<task> &tasks, bool small);
+
 #endif

@@ -90,7 +90,7 @@ std::int32_t memory_seek(std::int32_t fd, std::int32_t offset, std::int32_t when
 }
 
 std::int32_t memory_lend(std::int32_t fd, std::int32_t offset, std::int32_t count,
-                         img_io_use_fn use, void *arg)
+                         std::int32_t /*discards*/, img_io_use_fn use, void *arg)
 {
     const bytes &file = *descriptors.at(static_cast<std::size_t>(fd)).file;
     if (offset < 0 || count < 1 || std::int64_t{offset} + count > std::ssize(file)) return -1;

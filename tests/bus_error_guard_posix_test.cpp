@@ -25,7 +25,6 @@ class HostsBusErrors : public Lending {
 protected:
     HostsBusErrors()
     {
-        open(0);
         hosts_errors = 0;
         m_plain.sa_handler = [](int) { mend_hosts_page(); };
         m_informed.sa_flags = SA_SIGINFO;
@@ -66,6 +65,7 @@ protected:
             action.sa_handler = handler;
             action.sa_flags = static_cast<int>(flags);
             ::sigaction(SIGBUS, &action, nullptr);
+            open(0);
             map_page();
             ::_exit(lend(0, SIZE, [=](auto *lent) { sent ? raise_error(lent) : touch_page(); }));
         }
@@ -87,28 +87,75 @@ TEST_F(HostsBusErrors, ReachTheirHandler)
         for (const bool elsewhere : {false, true})
             for (const auto *const action : {&m_plain, &m_informed, &once}) {
                 ::sigaction(SIGBUS, action, nullptr);
+                open(0);
                 const auto use = [&](const std::uint8_t *lent) {
                     while (!map_page(lent += step)) continue;
                     elsewhere ? std::thread(touch_page).join() : touch_page();
                 };
                 EXPECT_EQ(lend(0, SIZE, use), 0);
+                img_platform_close(m_fd);
                 EXPECT_TRUE(installed().sa_handler ==
                             (action == &once ? SIG_DFL : action->sa_handler));
                 ::munmap(const_cast<std::uint8_t *>(hosts_page), 4096);
             }
+    EXPECT_EQ(hosts_errors, 12);
+}
+
+// Handlers of the host that are installed later, in front of the library's, and that call the one
+// which they have replaced.
+std::array<struct sigaction, 2> replaced;
+std::array<int, 2> passed;
+
+template <std::size_t handler>
+void pass_on(int signal, siginfo_t *info, void *context)
+{
+    ++passed[handler];
+    const struct sigaction &next = replaced[handler];
+    if ((next.sa_flags & SA_SIGINFO) != 0)
+        next.sa_sigaction(signal, info, context);
+    else
+        next.sa_handler(signal);
+}
+
+TEST_F(HostsBusErrors, ReachAllHandlersOnce)
+{
+    struct sigaction added = {};
+    added.sa_flags = SA_SIGINFO;
     ::sigaction(SIGBUS, &m_plain, nullptr);
-    const auto cut_off = [&](const std::uint8_t *lent) {  // and read by another thread
-        hosts_page = const_cast<std::uint8_t *>(lent);
-        cut(0);
-        std::thread(touch_page).join();
-    };
-    EXPECT_EQ(lend(0, SIZE, cut_off), -1);
-    EXPECT_EQ(hosts_errors, 13);
-    restore();
+    open(0);
+    EXPECT_EQ(lend(0, SIZE, [](auto) {}), 0);
+    added.sa_sigaction = pass_on<0>;
+    ::sigaction(SIGBUS, &added, &replaced[0]);
+    EXPECT_EQ(lend(0, SIZE, raise_error), 0);
+    added.sa_sigaction = pass_on<1>;
+    ::sigaction(SIGBUS, &added, &replaced[1]);
+    ::raise(SIGBUS);  // the library has not seen it yet
+    EXPECT_EQ(lend(0, SIZE, raise_error), 0);
+    EXPECT_EQ(hosts_errors, 3);
+    EXPECT_EQ(passed, (std::array{3, 2}));
+}
+
+template <int>
+void ignore(int)
+{
+}
+
+TEST_F(HostsBusErrors, AreLeftAloneByTheLibraryAfterManyHandlers)
+{
+    open(0);
+    int loans = 0;
+    for (const auto handler : {ignore<0>, ignore<1>, ignore<2>, ignore<3>, ignore<4>, ignore<5>,
+                               ignore<6>, ignore<7>, ignore<8>}) {
+        ::signal(SIGBUS, handler);
+        loans += lend(0, SIZE, [](auto) {}) == 0 ? 1 : 0;
+    }
+    EXPECT_EQ(loans, 8);
+    EXPECT_EQ(installed().sa_handler, ignore<8>);
 }
 
 TEST_F(HostsBusErrors, ReachTheHandlerThatIsInstalledThen)
 {
+    open(0);
     // Another thread has a handler of its own for a while, which ends at the wrong time.
     struct sigaction during;
     ::sigaction(SIGBUS, &m_plain, nullptr);
@@ -130,7 +177,12 @@ TEST_F(HostsBusErrors, ReachTheHandlerThatIsInstalledThen)
     std::thread other;
     host.after_sigaction = [&] {
         map_page();
-        other = std::thread(touch_page);
+        other = std::thread([] {
+            sigset_t none;  // the library blocks them in this thread meanwhile
+            ::sigemptyset(&none);
+            ::pthread_sigmask(SIG_SETMASK, &none, nullptr);
+            touch_page();
+        });
         std::this_thread::sleep_for(std::chrono::milliseconds(20));
     };
     EXPECT_EQ(lend(0, SIZE, [](auto) {}), 0);
@@ -159,6 +211,7 @@ TEST_F(HostsBusErrors, StayPendingWhereTheyAreBlocked)
     ::sigaddset(&bus_errors, SIGBUS);
     ::pthread_sigmask(SIG_BLOCK, &bus_errors, nullptr);
     ::raise(SIGBUS);
+    open(0);
     EXPECT_EQ(lend(0, SIZE, [](auto) {}), 0);
     constexpr std::timespec now{};
     EXPECT_EQ(::sigtimedwait(&bus_errors, nullptr, &now), SIGBUS);

@@ -12,6 +12,9 @@
 #include "std/std_lines.h"
 #include "std/std_tiles.h"
 
+#include <chrono>
+#include <thread>
+
 namespace {
 
 struct fault_plan {
@@ -254,7 +257,36 @@ private:
     int m_lost_tiles = 0, m_lost_bytes = 0;
 };
 
-class Faults : public FileTest, public testing::WithParamInterface<image_kind> {};
+class Faults : public FileTest, public testing::WithParamInterface<image_kind> {
+protected:
+    // Another thread reads another image all the while, which no fault may touch.
+    void read_beside(const std::stop_token &over)
+    {
+        bytes samples(SIZE);
+        while (!over.stop_requested()) {
+            std::ranges::fill(samples, UNTOUCHED);
+            EXPECT_EQ(load(m_other, {.nsamps = SIZE}, samples.data()), 0);
+            EXPECT_EQ(std::ranges::count(samples, 8), SIZE);
+            std::this_thread::sleep_for(std::chrono::microseconds(100));
+        }
+    }
+    ~Faults() override
+    {
+        m_beside = {};
+        img_closefile(m_other);
+    }
+
+private:
+    static constexpr std::int32_t SIZE = 20'000;  // more than is copied by way of working memory
+    img_handle m_other = [this] {
+        const std::string name = m_folder / "other";
+        write_file(name, helava_file({.nsamps = SIZE}, SIZE));
+        const img_handle image = img_openfile(name.c_str(), IMG_OPEN_READ_WRITE);
+        EXPECT_EQ(dump(image, {.nsamps = SIZE}, bytes(SIZE, 8).data()), 0);
+        return image;
+    }();
+    std::jthread m_beside{[this](const std::stop_token &over) { read_beside(over); }};
+};
 
 TEST_P(Faults, AreReportedAndLoseNothing)
 {

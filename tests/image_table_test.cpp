@@ -1,4 +1,5 @@
 // Tests of image_table.cpp and id_pool.cpp: the handles of open images.
+#include "api/open.h"
 #include "support/file_test.h"
 
 using Handles = FileTest;
@@ -15,5 +16,5 @@ TEST_F(Handles, NumberSixtyImagesFromTheLowestAndReuseTheLastReturned)
         EXPECT_EQ(img_query_image_type(handle), IMG_TYPE_VITEC);
         EXPECT_EQ(img_closefile(handle), 0);
     }
-    img_pool_give_back(img_handle_pool, 7);  // of which none was taken
+    img_release_image(7, 0);  // of which none was taken
 }

@@ -55,6 +55,7 @@ TEST_F(IoMethodTable, AnswersForMissingOperations)
               (std::array{-1, -1, -1, -1, -1, -1}));
     EXPECT_EQ(errno, ENOSYS);
     EXPECT_EQ(img_offer_lending("bar", nullptr), -1);
+    EXPECT_EQ(img_offer_positional_reads("bar", nullptr), -1);
     EXPECT_EQ(img_allow_merging("bar"), -1);
     EXPECT_EQ(add(nullptr), -1);
     EXPECT_EQ(img_register_default_io_method("bare"), -1);

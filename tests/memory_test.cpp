@@ -40,7 +40,8 @@ protected:
             denied = shortage.denied;
             memory_arm(0);
             if (denied) {
-                EXPECT_TRUE(answer.result < 0 || each.may_succeed) << answer;
+                // Small windows of lent bytes are copied twice, if there is memory for that.
+                EXPECT_TRUE(answer.result < 0 || each.may_succeed || m_name == m_file) << answer;
                 if (answer.text.starts_with(OUT_OF_CACHE)) answer.text = OUT_OF_CACHE;
                 if (answer.result < 0) m_messages.insert(answer.text);
                 img_closefile(std::max(answer.result, 1));

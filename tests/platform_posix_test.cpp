@@ -119,6 +119,7 @@ TEST_F(Platform, PositionsAndCountsFit31Bits)
     std::uint8_t byte = 0;
     for (const std::int32_t each : {fd, -1, 0}) {
         EXPECT_EQ(img_platform_read(each, &byte, 0x80000000U), -1);
+        EXPECT_EQ(img_platform_read_at(each, 7, &byte, INT32_MAX), -1);
         EXPECT_EQ(img_platform_write(each, &byte, 0x80000000U), -1);
         EXPECT_EQ(img_platform_close(each), each == fd ? 0 : -1);
     }

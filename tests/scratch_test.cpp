@@ -1,9 +1,12 @@
 // Tests of scratch.cpp: what is kept of working memory.
 #include "base/scratch.h"
+
+#include "api/library.h"
 #include "imgfile/img.h"
 #include "support/fault_memory.h"
 
 #include <gtest/gtest.h>
+#include <thread>
 #include <vector>
 
 TEST(Scratch, KeepsALittleOfWhatWasTaken)
@@ -19,6 +22,9 @@ TEST(Scratch, KeepsALittleOfWhatWasTaken)
         }
         return shortage.requested;
     };
+    for (int i = 0; i < 2; ++i) EXPECT_GE(fresh_bytes({1}), page);  // nothing is kept yet
+    img_library_init();
+    fresh_bytes({1});  // makes the store of this thread
     img_free_scratch();
     EXPECT_EQ(fresh_bytes({1, page + 1, limit / 2}), 3 * page + limit / 2);
     EXPECT_EQ(fresh_bytes({page, 2 * page - 1, limit / 2}), 0U);
@@ -31,4 +37,10 @@ TEST(Scratch, KeepsALittleOfWhatWasTaken)
     EXPECT_EQ(img_take_scratch(SIZE_MAX), nullptr);
     img_mgr_cleanup();
     EXPECT_EQ(fresh_bytes({1}), page);
+    std::thread([&] {
+        memory_arm(2);  // the store of the thread
+        img_take_scratch(1).reset();
+        EXPECT_TRUE(shortage.denied);
+        EXPECT_GE(fresh_bytes({1}), page);
+    }).join();
 }

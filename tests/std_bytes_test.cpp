@@ -35,6 +35,15 @@ TEST_F(Bytes, AreZeroUpToAWriteAndToTheFullSize)
     EXPECT_EQ(read_file(m_file), expected);
 }
 
+TEST_F(Bytes, AreNotReadBeyond31Bits)
+{
+    img_desc *const desc = img_find_image(create_test_file(m_file, {}));
+    char byte;
+    EXPECT_EQ(img_std_read_at(desc, std::int64_t{1} << 31, &byte, 1), -1);
+    EXPECT_EQ(errno, EOVERFLOW);
+    img_closefile(desc->handle);
+}
+
 TEST_F(Bytes, LeaveAReasonWhereTheyCannotBeMoved)
 {
     img_desc *const desc = img_find_image(create_test_file(m_name, {}));

@@ -83,4 +83,25 @@ TEST_F(TiledWrites, AskOnceForALoanOfWhatTheyKeep)
         EXPECT_EQ(stored[i], 0);
 }
 
+using TiledWindows = FileTest;
+
+// Windows that are copied straight from where tiles lie, and by way of working memory.
+TEST_F(TiledWindows, AreExactWhereTilesAreLent)
+{
+    const test_geometry geometry{200, 200, 1, 1, 64, 64, IMG_LAYOUT_TILED};
+    const bytes written = numbered(bytes(40'000), 0, 40'000);
+    const img_handle image = creating(m_file, IMG_TYPE_VITEC, geometry).result;
+    EXPECT_EQ(dump(image, {.nlines = 200, .nsamps = 200}, written.data()), 0);
+    host.seconds_later = 3600;
+    for (const std::int32_t nlines : {50, 200}) {
+        const transfer window{.nlines = nlines, .nsamps = 180, .stride = 200};
+        bytes read(40'000), expected(40'000);
+        EXPECT_EQ(load(image, window, read.data()), 0);
+        for (std::size_t i = 0; i < 200 * static_cast<std::size_t>(nlines); ++i)
+            expected[i] = i % 200 < 180 ? written[i] : 0;
+        EXPECT_EQ(read, expected);
+    }
+    img_closefile(image);
+}
+
 }  // namespace

@@ -22,7 +22,13 @@
  * two bytes; two-byte samples have 12 significant bits. An image that exceeds these limits cannot
  * be opened or created. An image with zero lines, samples or bands is valid and empty.
  *
- * Threads. The library is not thread-safe: only one thread at a time may call it. */
+ * Threads. Any thread may call any function at any time. Calls on different images run at the same
+ * time, and so do loads and queries of one image. A dump waits for the loads of its image, and they
+ * wait for it: no call sees a part of what another one writes. Closing an image waits for the calls
+ * in progress on it; a call that begins earlier and gets its turn later finds the handle closed.
+ * errno and messages belong to the call that made them. After a fork, the child may use the library
+ * and all open images; the fork waits for calls in progress. A signal handler must not call the
+ * library. */
 #ifndef IMG_H
 #define IMG_H
 

@@ -1,6 +1,6 @@
 // Reading a window. Samples outside the image get the fill, those inside come from the type's
-// `read`, and all of them pass the image's chain on their way to the host. Read load_window.h and
-// chain/chain.h first.
+// `read`, and all of them pass the image's chain on their way to the host. Several threads may load
+// windows of one image at the same time. Read load_window.h and chain/chain.h first.
 #include "access/load_window.h"
 
 #include "access/merged_bands.h"
@@ -10,6 +10,7 @@
 #include "base/types.h"
 #include "chain/chain_apply.h"
 #include "chain/chain_prepare.h"
+#include "chain/mapdown.h"
 
 #include <cstring>
 
@@ -57,6 +58,20 @@ std::int32_t fill_and_read(img_desc *desc, const img_buffer_def &def, std::int32
     return read_window(desc, window, band, buffer, def.stride);
 }
 
+// Loads a window that passes the links of a chain, which this load alone uses.
+std::int32_t load_through(img_chain &chain, img_desc *desc, const img_buffer_def &def,
+                          std::int32_t band, std::uint8_t *buffer)
+{
+    img_buffer_def work_def;
+    std::uint8_t *const work = img_chain_prepare(chain, desc, buffer, &def, &work_def);
+    if (work == nullptr) return -1;
+    if (const std::int32_t result = fill_and_read(desc, work_def, band, work); result != 0) {
+        img_chain_release(chain);
+        return result;
+    }
+    return img_chain_apply(chain);
+}
+
 }  // namespace
 
 std::int32_t img_load_window(img_desc *desc, const img_window &window, std::int32_t band,
@@ -79,12 +94,11 @@ std::int32_t img_load_window(img_desc *desc, const img_window &window, std::int3
         .nbits = chain.out_bits,
         .fill = static_cast<std::uint16_t>(fill != nullptr ? *fill : 0),
     };
-    img_buffer_def work_def;
-    std::uint8_t *const work = img_chain_prepare(chain, desc, buffer, &def, &work_def);
-    if (work == nullptr) return -1;
-    if (const std::int32_t result = fill_and_read(desc, work_def, band, work); result != 0) {
-        img_chain_release(chain);
-        return result;
+    if (chain.identity != 0) return fill_and_read(desc, def, band, buffer);
+    if (img_is_mapdown(chain)) {
+        img_mapdown_copy own(chain);
+        return own.chain() != nullptr ? load_through(*own.chain(), desc, def, band, buffer) : -1;
     }
-    return img_chain_apply(chain);
+    const img_mutex_lock lock(chain.mutex);
+    return load_through(chain, desc, def, band, buffer);
 }

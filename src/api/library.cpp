@@ -2,13 +2,16 @@
 // library.h first.
 #include "api/library.h"
 
+#include "api/calls.h"
 #include "base/image_table.h"
 #include "base/scratch.h"
+#include "base/shared_lock.h"
 #include "base/types.h"
 #include "formats/helava.h"
 #include "formats/vitec.h"
 #include "io/io_default.h"
 
+#include <atomic>
 #include <utility>
 
 namespace {
@@ -28,14 +31,13 @@ constexpr std::array<type_registration, IMG_STATIC_TYPES> img_static_types = [] 
 constexpr std::array<std::pair<const char *, std::int32_t (*)(const char *name)>, 1>
     img_late_registrations{{{"", img_register_default_io_method}}};
 
-bool initialised = false;
+img_mutex start_mutex;
+std::atomic<bool> initialised = false;
+bool watches_forks IMG_GUARDED_BY(start_mutex) = false;
 
-}  // namespace
-
-void img_library_init()
+// Fills the tables. Types and methods that a test or a host has registered before stay.
+void register_all()
 {
-    if (initialised) return;
-    img_handle_pool = img_pool_create(0, IMG_MAX_HANDLES);
     for (std::int32_t slot = 0; slot < IMG_MAX_TYPES; ++slot) {
         img_type_slot(slot).enabled = 0;
         img_type_slot(slot).spare = {};
@@ -44,15 +46,27 @@ void img_library_init()
         if (img_static_types[slot] != nullptr)
             img_static_types[slot](static_cast<std::int32_t>(slot), &img_type_table[slot]);
     for (const auto &[name, registration] : img_late_registrations) registration(name);
+}
 
+}  // namespace
+
+void img_library_init()
+{
+    if (initialised.load(std::memory_order_acquire)) return;
+    const img_mutex_lock lock(start_mutex);
+    if (initialised) return;  // uncounted: another thread was faster
+    img_start_scratch();
+    if (!watches_forks) watches_forks = img_watch_calls_over_forks();
+    register_all();
     // Without a pool this call fails as with no free handle, and the next one tries again.
     // Registering twice changes nothing.
-    initialised = img_handle_pool != nullptr;
+    initialised = img_make_handle_pool();
 }
 
 std::int32_t img_mgr_cleanup()
 {
-    img_pool_free(std::exchange(img_handle_pool, nullptr));
+    const img_pause pause;
+    img_free_handle_pool();
     img_free_scratch();
     return 0;
 }

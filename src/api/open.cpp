@@ -1,9 +1,11 @@
 // The life of an image: opening, creating, closing, and the record that lives in between. A record
-// is in the table of images from its allocation on, also while types probe the file. Read
-// open.h first, then base/types.h for the order in which a type's operations are called.
+// is in the table of images from its allocation on, also while types probe the file; other calls
+// find it once it is published. Read open.h first, then base/types.h for the order in which a
+// type's operations are called.
 #include "api/open.h"
 
 #include "access/tile_cache.h"
+#include "api/calls.h"
 #include "api/library.h"
 #include "base/image_table.h"
 #include "base/img_desc.h"
@@ -61,7 +63,8 @@ img_desc *new_record(img_handle handle, std::int32_t oflags)
     };
 }
 
-void release_image(img_desc *desc, std::int32_t flush)
+// Frees the record. The handle remains taken.
+void free_image(img_desc *desc, std::int32_t flush)
 {
     const img_handle handle = desc->handle;
     img_tile_cache_destroy(std::exchange(desc->tile_cache, nullptr), flush);
@@ -69,7 +72,14 @@ void release_image(img_desc *desc, std::int32_t flush)
     delete desc;
     img_image_slot(handle) = nullptr;
     img_chain_init(handle);
-    img_pool_give_back(img_handle_pool, handle);
+}
+
+// Gives up an image that was not published.
+void release_image(img_desc *desc, std::int32_t flush)
+{
+    const img_handle handle = desc->handle;
+    free_image(desc, flush);
+    img_give_back_handle(handle);
 }
 
 img_handle release_without_memory(img_desc *desc)
@@ -100,7 +110,7 @@ std::int32_t give_name(img_desc *desc, const image_name &name)
 img_desc *allocate_image(const image_name &name, std::int32_t flags)
 {
     img_library_init();
-    const img_handle handle = img_pool_take(img_handle_pool);
+    const img_handle handle = img_take_handle();
     if (handle == -1) {
         img_fail("No more open images available!!!\n");
         errno = NO_FREE_HANDLE;
@@ -110,7 +120,7 @@ img_desc *allocate_image(const image_name &name, std::int32_t flags)
     img_image_slot(handle) = desc;
     if (desc == nullptr) {
         img_fail("Out of memory!!!\n");
-        img_release_image(handle, 0);
+        img_give_back_handle(handle);
         return nullptr;
     }
     if (give_name(desc, name) == -1) {
@@ -163,6 +173,7 @@ img_handle finish_opening(img_desc *desc)
         release_image(desc, 0);
         return -1;
     }
+    img_publish_image(desc->handle);
     return desc->handle;
 }
 
@@ -181,6 +192,7 @@ bool open_as_some_type(img_desc *desc)
 
 img_handle open_image(const image_name &name, std::int32_t flags)
 {
+    const img_call call;
     img_desc *const desc = allocate_image(name, flags);
     if (desc == nullptr) return -1;
     if (!open_as_some_type(desc)) {
@@ -199,6 +211,7 @@ struct new_geometry {
 
 img_handle create_image(const image_name &name, new_geometry geometry)
 {
+    const img_call call;
     img_library_init();
     if (name.text == nullptr || *name.text == '\0')
         return img_fail("No image file name specified!!\n");
@@ -225,17 +238,22 @@ img_handle create_image(const image_name &name, new_geometry geometry)
 
 img_handle img_alloc_image(const char *name, std::int32_t flags)
 {
+    const img_call call;
     const img_desc *const desc =
         allocate_image({.text = name, .is_plain = false, .method = nullptr}, flags);
-    return desc != nullptr ? desc->handle : -1;
+    if (desc == nullptr) return -1;
+    img_publish_image(desc->handle);
+    return desc->handle;
 }
 
 void img_release_image(img_handle handle, std::int32_t flush)
 {
-    if (img_desc *const desc = img_find_image(handle); desc != nullptr)
-        release_image(desc, flush);
-    else
-        img_pool_give_back(img_handle_pool, handle);
+    const img_call call;
+    {
+        const img_image_use image(handle, img_purpose::close);
+        if (image.desc() != nullptr) free_image(image.desc(), flush);
+    }
+    img_give_back_handle(handle);
 }
 
 img_handle img_openfile(const char *name, std::int32_t flags)
@@ -268,6 +286,13 @@ img_handle img_create_plain_file(const char *filename, const img_io_method *meth
 
 std::int32_t img_closefile(img_handle handle)
 {
-    if (img_desc *const desc = img_find_image(handle); desc != nullptr) release_image(desc, 1);
+    const img_call call;
+    {
+        const img_image_use image(handle, img_purpose::close);
+        if (image.desc() == nullptr) return 0;
+        free_image(image.desc(), 1);
+    }
+    // Only now may another image get the handle.
+    img_give_back_handle(handle);
     return 0;
 }

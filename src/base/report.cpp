@@ -7,7 +7,7 @@
 #include <cstdio>
 #include <cstring>
 
-img_message_fn img_message_sink = nullptr;
+constinit thread_local img_message_fn img_message_sink = nullptr;
 
 std::int32_t img_fail(const char *format, ...)
 {
@@ -27,9 +27,12 @@ std::int32_t img_fail(const char *format, ...)
 
 std::int32_t img_fail_errno(const char *prefix)
 {
-    if (img_message_sink != nullptr)
+    if (img_message_sink != nullptr) {
         img_message_sink(prefix, errno);
-    else
-        std::perror(prefix);
+        return -1;
+    }
+    ::flockfile(stderr);  // perror may print through another stream
+    std::perror(prefix);
+    ::funlockfile(stderr);
     return -1;
 }

@@ -7,7 +7,9 @@
 // Takes a message of the library: the text without its line feed, and the errno value that belongs
 // to it, 0 if none does.
 using img_message_fn = void (*)(const char *text, int error);
-extern img_message_fn img_message_sink;  // null: the standard error stream
+// Where the messages of this thread's calls go; null: the standard error stream, where lines of
+// several threads never mix.
+extern constinit thread_local img_message_fn img_message_sink;
 
 // Prints the formatted text, which ends in a line feed, and returns -1.
 [[gnu::format(printf, 1, 2)]] std::int32_t img_fail(const char *format, ...);

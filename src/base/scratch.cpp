@@ -1,7 +1,11 @@
 // Working memory. Capacities are powers of two, so that sizes that differ a little share a block.
 // Address sanitizers see the bytes beyond the size that was asked for, and blocks that are kept, as
-// not usable. Read scratch.h first.
+// not usable. A store is used by its thread alone, without a lock, but for two occasions on which
+// that thread is in no call: a fork and clean-up. Read scratch.h first.
 #include "base/scratch.h"
+
+#include "base/shared_lock.h"
+#include "base/threads.h"
 
 #include <algorithm>
 #include <array>
@@ -27,8 +31,6 @@ struct kept_block {
     std::uint8_t *block;  // null: none
     std::size_t capacity;
 };
-std::array<kept_block, 8> kept{};  // oldest first; free entries at the end
-std::size_t kept_bytes = 0;
 
 constexpr std::align_val_t ALIGNMENT{IMG_SCRATCH_ALIGNMENT};
 
@@ -47,21 +49,103 @@ void free_block(const kept_block &memory)
     ::operator delete[](memory.block, ALIGNMENT);
 }
 
-// Takes an entry off the kept blocks; the later ones move up.
-kept_block take_kept(kept_block *entry)
+// The blocks that one thread keeps.
+class store {
+public:
+    store() = default;
+    ~store() { free_all(); }
+    store(const store &) = delete;
+    store &operator=(const store &) = delete;
+
+    // Returns a block of that capacity, or null.
+    std::uint8_t *take(std::size_t capacity)
+    {
+        kept_block *const found = std::ranges::find(m_kept, capacity, &kept_block::capacity);
+        return found != m_kept.end() ? take_out(found).block : nullptr;
+    }
+    // Keeps a block of at most IMG_SCRATCH_LIMIT bytes.
+    void keep(const kept_block &back)
+    {
+        while (m_kept.back().block != nullptr || m_bytes + back.capacity > IMG_SCRATCH_LIMIT)
+            free_block(take_out(m_kept.begin()));
+        *std::ranges::find(m_kept, std::size_t{0}, &kept_block::capacity) = back;
+        m_bytes += back.capacity;
+        mark_usable(back, 0);
+    }
+    void free_all()
+    {
+        while (m_kept.front().block != nullptr) free_block(take_out(m_kept.begin()));
+    }
+
+    store *previous = nullptr, *next = nullptr;  // in the list of all stores
+
+private:
+    // Takes an entry off the kept blocks; the later ones move up.
+    kept_block take_out(kept_block *entry)
+    {
+        const kept_block taken = std::exchange(*entry, {});
+        m_bytes -= taken.capacity;
+        std::rotate(entry, entry + 1, m_kept.end());
+        return taken;
+    }
+
+    std::array<kept_block, 8> m_kept{};  // oldest first; free entries at the end
+    std::size_t m_bytes = 0;
+};
+
+img_mutex list_mutex;
+store *stores IMG_GUARDED_BY(list_mutex) = nullptr;  // of all threads; the first of a list
+
+// The store of this thread; null: it has none.
+constinit thread_local store *own_store = nullptr;
+std::atomic<bool> is_stopped = false;  // the stores are gone, whatever own_store says
+
+void enlist(store *added)
 {
-    const kept_block taken = std::exchange(*entry, {});
-    kept_bytes -= taken.capacity;
-    std::rotate(entry, entry + 1, kept.end());
-    return taken;
+    const img_mutex_lock lock(list_mutex);
+    added->next = stores;
+    if (stores != nullptr) stores->previous = added;
+    stores = added;
 }
 
-// Returns a kept block of that capacity, or a new one.
-std::uint8_t *take_block(std::size_t capacity)
+void forget(store *ended)
 {
-    kept_block *const found = std::ranges::find(kept, capacity, &kept_block::capacity);
-    return found != kept.end() ? take_kept(found).block
-                               : new (ALIGNMENT, std::nothrow) std::uint8_t[capacity];
+    {
+        const img_mutex_lock lock(list_mutex);
+        (ended->previous != nullptr ? ended->previous->next : stores) = ended->next;
+        if (ended->next != nullptr) ended->next->previous = ended->previous;
+    }
+    delete ended;
+}
+
+// Called when a thread ends that has a store.
+void on_thread_end(void *object)
+{
+    own_store = nullptr;
+    forget(static_cast<store *>(object));
+}
+
+// Returns the store of this thread, or null.
+store *find_store()
+{
+    // uncounted: nothing is counted after the stop
+    return is_stopped.load(std::memory_order_relaxed) ? nullptr : own_store;
+}
+
+// The same; one that is missing is made if possible.
+store *need_store()
+{
+    store *const found = find_store();
+    if (found != nullptr || is_stopped) return found;  // uncounted: as above
+    auto *const made = new (std::nothrow) store;
+    if (made == nullptr) return nullptr;
+    if (!img_set_thread_object(made)) {
+        delete made;
+        return nullptr;
+    }
+    enlist(made);
+    own_store = made;
+    return made;
 }
 
 }  // namespace
@@ -71,26 +155,52 @@ img_scratch img_take_scratch(std::size_t size)
     if (size > std::numeric_limits<std::ptrdiff_t>::max()) return nullptr;
     const std::size_t capacity =
         std::max(size > IMG_SCRATCH_LIMIT ? size : std::bit_ceil(size), IMG_SCRATCH_ALIGNMENT);
-    img_scratch block(take_block(capacity), {capacity});
+    store *const keeper = find_store();
+    std::uint8_t *memory = keeper != nullptr ? keeper->take(capacity) : nullptr;
+    if (memory == nullptr) memory = new (ALIGNMENT, std::nothrow) std::uint8_t[capacity];
+    img_scratch block(memory, {capacity});
     if (block) mark_usable({block.get(), capacity}, size);
     return block;
 }
 
 void img_scratch_return::operator()(std::uint8_t *block) const
 {
-    const kept_block back{block, capacity};
-    if (capacity > IMG_SCRATCH_LIMIT) {
-        free_block(back);
-        return;
-    }
-    while (kept.back().block != nullptr || kept_bytes + capacity > IMG_SCRATCH_LIMIT)
-        free_block(take_kept(kept.begin()));
-    *std::ranges::find(kept, std::size_t{0}, &kept_block::capacity) = back;
-    kept_bytes += capacity;
-    mark_usable(back, 0);
+    store *const keeper = capacity <= IMG_SCRATCH_LIMIT ? need_store() : nullptr;
+    if (keeper != nullptr)
+        keeper->keep({block, capacity});
+    else
+        free_block({block, capacity});
+}
+
+void img_start_scratch()
+{
+    img_watch_thread_ends(on_thread_end);
 }
 
 void img_free_scratch()
 {
-    while (kept.front().block != nullptr) free_block(take_kept(kept.begin()));
+    const img_mutex_lock lock(list_mutex);
+    for (store *each = stores; each != nullptr; each = each->next) each->free_all();
+}
+
+void img_stop_scratch()
+{
+    img_ignore_thread_ends();
+    is_stopped = true;
+    const img_mutex_lock lock(list_mutex);
+    while (stores != nullptr) delete std::exchange(stores, stores->next);
+}
+
+void img_scratch_before_fork() IMG_UNCHECKED_LOCKS
+{
+    list_mutex.lock();
+}
+
+void img_scratch_after_fork(bool in_child) IMG_UNCHECKED_LOCKS
+{
+    list_mutex.unlock();
+    if (!in_child) return;  // uncounted: children of the tests end without a count
+    // uncounted: the same
+    for (store *each = stores; each != nullptr; each = each->next)
+        if (each != own_store) each->free_all();  // uncounted: the same
 }

@@ -6,7 +6,7 @@
 
 namespace {
 
-std::array<img_chain, IMG_MAX_HANDLES> chains{};
+std::array<img_chain, IMG_MAX_HANDLES> chains;
 
 }  // namespace
 

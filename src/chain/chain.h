@@ -10,6 +10,7 @@
 #define IMG_CHAIN_H
 
 #include "base/scratch.h"
+#include "base/shared_lock.h"
 #include "imgfile/img.h"
 
 #include <array>
@@ -97,7 +98,9 @@ struct img_chain_link {
 };
 
 // The chain of one handle. It lives as long as the process; img_chain_init resets it when the image
-// is opened and when it is released.
+// is opened and when it is released. Links are added and removed while no load of the image is in
+// progress. Loads through links that share tables take turns; those through the mapdown alone run
+// at the same time (mapdown.h), and so do those of a chain without links.
 struct img_chain {
     std::uint8_t identity;      // 1: no slot holds a link; samples pass unchanged
     std::uint8_t prepared;      // 1: between preparation and the successful end of application
@@ -111,6 +114,7 @@ struct img_chain {
     std::uint8_t *final_buffer;  // the caller's
     const img_buffer_def *final_def;
     std::array<img_chain_link, IMG_CHAIN_LINKS> links;
+    img_mutex mutex;  // held by a load that uses the chain itself, and the tables of its links
 };
 
 // Returns the chain of a handle within 0..59.

@@ -19,17 +19,20 @@ bool is_stretch_width(std::int32_t bits)
     return bits >= 1 && bits <= MAX_BITS;
 }
 
-// Counts every fourth sample of each line. Samples without a counter go to histogram[size]: a
-// branch would be mispredicted where many samples lie beyond the stated bits.
+// Counts every fourth sample of each line. Samples without a counter are counted as the last one
+// and taken off again: a branch would be mispredicted where many lie beyond the stated bits.
 template <typename Sample>
 void count_samples(const std::uint8_t *buffer, const img_buffer_def &def, std::uint32_t *histogram,
                    std::size_t size)
 {
     constexpr std::size_t step = 4;
-    const auto count = [=](const std::uint8_t *sample) {
+    const std::size_t last = size - 1;
+    std::uint32_t beyond = 0;
+    const auto count = [&beyond, histogram, last](const std::uint8_t *sample) {
         Sample value;
         std::memcpy(&value, sample, sizeof value);
-        ++histogram[std::min<std::size_t>(value, size)];
+        ++histogram[std::min<std::size_t>(value, last)];
+        beyond += value > last ? 1 : 0;
     };
     const auto line_length = img_count(def.stride) * sizeof(Sample);
     const auto nlines = img_count(std::max(def.nlines, 0));
@@ -45,6 +48,7 @@ void count_samples(const std::uint8_t *buffer, const img_buffer_def &def, std::u
         }
         for (; left > 0; --left, sample += step * sizeof(Sample)) count(sample);
     }
+    histogram[last] -= beyond;
 }
 
 struct cut {
@@ -119,10 +123,10 @@ std::int32_t img_chain_create_stretch_lut_from_buffer(const std::uint8_t *buffer
                                    .size = static_cast<std::int32_t>(size),
                                    .lut = lut,
                                    .owned = 0};
-    const img_scratch counters = img_take_scratch((size + 1) * sizeof(std::uint32_t));
+    const img_scratch counters = img_take_scratch(size * sizeof(std::uint32_t));
     if (!counters) return img_fail_errno("img_chain_create_stretch_lut_from_buffer:calloc");
     auto *const histogram = reinterpret_cast<std::uint32_t *>(counters.get());
-    std::fill_n(histogram, size + 1, 0U);
+    std::fill_n(histogram, size, 0U);
     if (def->nbytes == 2)
         count_samples<std::uint16_t>(buffer, *def, histogram, size);
     else

@@ -21,6 +21,7 @@ std::int32_t img_register_default_io_method(const char *name)
         /*read=*/img_platform_read, /*write=*/img_platform_write, /*seek=*/img_platform_seek,
         /*unlink=*/img_platform_unlink, /*get_value=*/no_value);
     if (result != 0) return result;
+    img_offer_positional_reads(name, img_platform_read_at);
     img_offer_lending(name, img_platform_lend);
     return img_allow_merging(name);
 }

@@ -3,6 +3,7 @@
 #include "io/io_method.h"
 
 #include "base/count.h"
+#include "base/shared_lock.h"
 
 #include <algorithm>
 #include <cerrno>
@@ -13,6 +14,8 @@ std::array<img_io_method, IMG_MAX_IO_METHODS> img_io_method_table{};
 std::int32_t img_io_method_count = 0;
 
 namespace {
+
+img_mutex registration_mutex;
 
 // Stands in for an operation that a method does not offer.
 template <typename Operation>
@@ -39,10 +42,11 @@ std::int32_t img_register_io_method(const char *name, std::int32_t (*init_op)(co
                                     img_io_write_fn write, img_io_seek_fn seek,
                                     img_io_unlink_fn unlink, img_io_value_fn get_value)
 {
+    const img_mutex_lock lock(registration_mutex);
     if (name == nullptr || img_find_io_method(name) != -1 ||
         img_io_method_count == IMG_MAX_IO_METHODS)
         return -1;
-    const auto slot = img_count(img_io_method_count++);
+    const auto slot = img_count(img_io_method_count);
     img_io_method_table[slot] = {
         .name = name,
         .enabled = init_op == nullptr || init_op(name) == 0 ? 1 : 0,
@@ -53,9 +57,20 @@ std::int32_t img_register_io_method(const char *name, std::int32_t (*init_op)(co
         .seek = given_or_refusal(seek),
         .unlink = given_or_refusal(unlink),
         .get_value = given_or_refusal(get_value),
+        .read_at = nullptr,
         .lend = nullptr,
         .may_merge_transfers = 0,
     };
+    // Threads that look for a method see the new entry from here on.
+    std::atomic_ref(img_io_method_count).fetch_add(1, std::memory_order_release);
+    return 0;
+}
+
+std::int32_t img_offer_positional_reads(const char *name, img_io_read_at_fn read_at)
+{
+    const std::int32_t slot = img_find_io_method(name);
+    if (slot == -1) return -1;
+    img_io_method_table[img_count(slot)].read_at = read_at;
     return 0;
 }
 
@@ -77,7 +92,8 @@ std::int32_t img_allow_merging(const char *name)
 
 std::int32_t img_find_io_method(const char *name)
 {
-    const auto *const end = img_io_method_table.begin() + img_io_method_count;
+    const auto *const end = img_io_method_table.begin() +
+                            std::atomic_ref(img_io_method_count).load(std::memory_order_acquire);
     const auto *const found =
         std::find_if(img_io_method_table.cbegin(), end, [name](const img_io_method &method) {
             return method.enabled != 0 && std::string_view(method.name) == name;

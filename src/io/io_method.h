@@ -8,9 +8,17 @@
 //   close                      last, also after failures
 //
 // There is one position per descriptor. read and write start at it and move it on by the bytes that
-// they return; lend neither uses nor moves it. After a failed call the position is unknown: the
-// library seeks from the start or the end before the next transfer. An operation must not call the
-// library for the image that it works for.
+// they return; read_at and lend neither use nor move it. After a failed call the position is
+// unknown: the library seeks from the start or the end before the next transfer.
+//
+// Threads. Operations on different descriptors run at the same time, and so do open and unlink. On
+// one descriptor, read_at and lend run at the same time as each other; the other operations run
+// alone.
+//
+// The library holds the lock of the image, and its own against forks, while an operation runs. An
+// operation must not call the library for the image that it works for, nor for images whose
+// operations may call back for that one; must not fork; and must not wait for a thread that does
+// one of these, or that closes or writes the image. Calls for other images are allowed.
 #ifndef IMG_IO_METHOD_H
 #define IMG_IO_METHOD_H
 
@@ -38,14 +46,16 @@ using img_io_value_fn = double (*)();
 // Reads lent bytes, which are valid until it returns. Called with the `arg` of the loan.
 using img_io_use_fn = void (*)(void *arg, const std::uint8_t *bytes);
 using img_io_lend_fn = std::int32_t (*)(std::int32_t fd, std::int32_t offset, std::int32_t count,
-                                        img_io_use_fn use, void *arg);
+                                        std::int32_t discards, img_io_use_fn use, void *arg);
+using img_io_read_at_fn = std::int32_t (*)(std::int32_t fd, std::int32_t offset, void *buffer,
+                                           std::uint32_t count);
 
 // One access method. Operations that fail return -1 and leave the reason in errno. A transfer that
 // fails fails the host's call. While a file is probed a failure means "not of this type"; while it
 // is closed a failure is ignored.
 //
 // A registration replaces a null operation by one that fails with ENOSYS, so that callers need not
-// test for it; `lend` alone may be null here.
+// test for it; `read_at` and `lend` alone may be null here.
 struct img_io_method {
     const char *name;      // referenced: the registrant keeps it valid for the life of the process
     std::int32_t enabled;  // 1: it can be found; 0: its initialisation failed
@@ -76,12 +86,17 @@ struct img_io_method {
     img_io_unlink_fn unlink;
     img_io_value_fn get_value;  // never called
 
+    // Reads as `read` does, but from `offset`, 0 to 2^31 - 1. Null: the library seeks and reads,
+    // for one thread at a time.
+    img_io_read_at_fn read_at;
     // Calls `use` at most once with the bytes [offset, offset + count) of the file where they lie
     // in memory: in a mapping, or in a buffer of the method's own. The library does not compare
     // them with the file's length; an offset below 0 or a count below 1 is refused. Returns 0 when
     // `use` was called and the file had all of these bytes from before the call until `use`
     // returned. Else -1, quietly: a refusal is no failure. The library then makes the ordinary
-    // calls, and their results count. Null: nothing is lent.
+    // calls, and their results count. `discards` 0: `use` is not called with bytes that the file
+    // is known not to have any more; not 0: it may be, since the library discards what `use` did.
+    // Null: nothing is lent.
     img_io_lend_fn lend;
     // 1: the library may merge the transfers of several lines or tiles into one call and split one
     // into several, and leaves out writes to a file opened read-only. 0: it makes one call per
@@ -94,17 +109,18 @@ struct img_io_method {
 extern std::array<img_io_method, IMG_MAX_IO_METHODS> img_io_method_table;
 extern std::int32_t img_io_method_count;
 
-// Appends a method that lends nothing and whose transfers are not merged. `init_op`, if given,
-// decides whether the method is enabled: it returns 0 if so. Returns 0, or -1 quietly when an
-// enabled method has that name, the name is null, or the table is full.
+// Appends a method without positional reads, that lends nothing and whose transfers are not merged.
+// `init_op`, if given, decides whether the method is enabled: it returns 0 if so. Returns 0, or -1
+// quietly when an enabled method has that name, the name is null, or the table is full.
 std::int32_t img_register_io_method(const char *name, std::int32_t (*init_op)(const char *name),
                                     img_io_open_fn open, img_io_close_fn close, img_io_read_fn read,
                                     img_io_write_fn write, img_io_seek_fn seek,
                                     img_io_unlink_fn unlink, img_io_value_fn get_value);
 
-// Set what a registration has no argument for, of the enabled method of that name: its `lend`
-// (null: none), and that its transfers may be merged. Return 0, or -1 quietly when no such method
-// exists.
+// Set what a registration has no argument for, of the enabled method of that name: its `read_at`,
+// its `lend` (null: none), and that its transfers may be merged. To be called before an image is
+// opened with the method. Return 0, or -1 quietly when no such method exists.
+std::int32_t img_offer_positional_reads(const char *name, img_io_read_at_fn read_at);
 std::int32_t img_offer_lending(const char *name, img_io_lend_fn lend);
 std::int32_t img_allow_merging(const char *name);
 

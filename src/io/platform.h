@@ -20,11 +20,16 @@ inline constexpr std::size_t IMG_MAX_PLATFORM_FILES = 64;
 std::int32_t img_platform_open(const char *filename, std::int32_t oflags, std::int32_t mode);
 std::int32_t img_platform_close(std::int32_t fd);
 std::int32_t img_platform_read(std::int32_t fd, void *buffer, std::uint32_t count);
+std::int32_t img_platform_read_at(std::int32_t fd, std::int32_t offset, void *buffer,
+                                  std::uint32_t count);
 std::int32_t img_platform_write(std::int32_t fd, const void *buffer, std::uint32_t count);
 std::int32_t img_platform_seek(std::int32_t fd, std::int32_t offset, std::int32_t whence);
 std::int32_t img_platform_unlink(const char *filename);
 // Lends the bytes of regular files. Truncating the file meanwhile does not harm the process.
 std::int32_t img_platform_lend(std::int32_t fd, std::int32_t offset, std::int32_t count,
-                               img_io_use_fn use, void *arg);
+                               std::int32_t discards, img_io_use_fn use, void *arg);
+// For the child of a fork, and when the library is unloaded.
+void img_platform_after_fork();
+void img_platform_unload();
 
 #endif

@@ -1,12 +1,16 @@
 // Ordinary files of a POSIX system. Positions are kept here, so that a seek makes no system call:
-// reads and writes are pread and pwrite at the recorded position. Read platform.h first.
+// reads and writes are pread and pwrite at the recorded position. Threads open and close files at
+// the same time; an entry of the table belongs to its file from the open to the close. Read
+// platform.h first.
 #include "io/platform.h"
 
 #include "base/img_desc.h"
+#include "io/bus_error_guard_posix.h"
 #include "io/file_mapping_posix.h"
 
 #include <algorithm>
 #include <array>
+#include <atomic>
 #include <cerrno>
 #include <cstddef>
 #include <utility>
@@ -35,22 +39,36 @@ struct open_file {
 };
 
 constexpr std::int32_t NO_DESCRIPTOR = 0;  // a standard stream's: never that of a file here
-std::array<std::int32_t, IMG_MAX_PLATFORM_FILES> descriptors{};
-std::array<open_file, descriptors.size()> open_files{};  // entry i belongs to descriptors[i]
+constexpr std::int32_t RESERVED = -1;      // an entry that an open fills in
+std::array<std::atomic<std::int32_t>, IMG_MAX_PLATFORM_FILES> descriptors{};
+std::array<open_file, IMG_MAX_PLATFORM_FILES> open_files;  // entry i belongs to descriptors[i]
 
-// Returns the index of a descriptor; the number of entries if it has none.
+// Returns the index of a descriptor of an open file; the number of entries if it has none.
 std::size_t find_index(std::int32_t fd)
 {
-    return static_cast<std::size_t>(std::ranges::find(descriptors, fd) - descriptors.begin());
+    std::size_t index = 0;
+    while (index < descriptors.size() && descriptors[index].load(std::memory_order_acquire) != fd)
+        ++index;
+    return index;
 }
 
 // Returns the open file of a descriptor, or null with errno set.
 open_file *find_file(std::int32_t fd)
 {
-    const std::size_t index = find_index(fd);
-    if (fd != NO_DESCRIPTOR && index < open_files.size()) return &open_files[index];
+    const std::size_t index = fd > STDERR_FILENO ? find_index(fd) : open_files.size();
+    if (index < open_files.size()) return &open_files[index];
     errno = EBADF;
     return nullptr;
+}
+
+// Returns the index of a free entry, which is reserved; the number of entries if none is free.
+std::size_t reserve_entry()
+{
+    for (std::size_t index = 0; index < descriptors.size(); ++index) {
+        std::int32_t free = NO_DESCRIPTOR;
+        if (descriptors[index].compare_exchange_strong(free, RESERVED)) return index;
+    }
+    return descriptors.size();
 }
 
 // Returns the system's flags for `oflags`, or -1 for flags that have no meaning here.
@@ -108,25 +126,25 @@ std::int32_t close_and_fail(int fd, int error)
     return -1;
 }
 
-// Writes from `source`, or where that is null reads into `target`, at the file's position: until
-// `count` bytes are moved, a call moves none, or an error occurs.
-std::int32_t transfer_whole(open_file *file, std::byte *target, const std::byte *source,
-                            std::uint32_t count)
+// Writes from `source`, or where that is null reads into `target`, at `*position`, which moves on:
+// until `count` bytes are moved, a call moves none, or an error occurs.
+std::int32_t transfer_whole(int fd, std::int32_t *position, std::byte *target,
+                            const std::byte *source, std::uint32_t count)
 {
-    if (count > static_cast<std::uint32_t>(INT32_MAX - file->position)) {
+    if (count > static_cast<std::uint32_t>(INT32_MAX - *position)) {
         errno = EINVAL;
         return -1;
     }
     std::uint32_t done = 0;
     while (done < count) {
         const ssize_t moved = source != nullptr
-                                  ? ::pwrite(file->fd, source + done, count - done, file->position)
-                                  : ::pread(file->fd, target + done, count - done, file->position);
+                                  ? ::pwrite(fd, source + done, count - done, *position)
+                                  : ::pread(fd, target + done, count - done, *position);
         if (moved == -1 && errno == EINTR) continue;
         if (moved == -1 && done == 0) return -1;
         if (moved <= 0) break;
         done += static_cast<std::uint32_t>(moved);
-        file->position += static_cast<std::int32_t>(moved);
+        *position += static_cast<std::int32_t>(moved);
     }
     return static_cast<std::int32_t>(done);
 }
@@ -161,15 +179,14 @@ std::int32_t img_platform_open(const char *filename, std::int32_t oflags, std::i
     struct stat status;
     if (::fstat(fd, &status) == -1) return close_and_fail(fd, errno);
     if (!S_ISREG(status.st_mode) && !S_ISBLK(status.st_mode)) return close_and_fail(fd, EINVAL);
-    const std::size_t index = find_index(NO_DESCRIPTOR);
+    const std::size_t index = reserve_entry();
     if (index == open_files.size()) return close_and_fail(fd, EMFILE);
-    descriptors[index] = fd;
     open_file &file = open_files[index];  // field by field: its head need not be cleared
     file.fd = fd;
     file.position = 0;
-    file.mapping = {};
     file.head.length = S_ISREG(status.st_mode) ? status.st_size : -1;
     file.head.head_length = -1;
+    descriptors[index].store(fd, std::memory_order_release);
     return fd;
 }
 
@@ -178,7 +195,7 @@ std::int32_t img_platform_close(std::int32_t fd)
     open_file *const file = find_file(fd);
     if (file == nullptr) return -1;
     file->mapping.drop();
-    descriptors[find_index(fd)] = NO_DESCRIPTOR;
+    descriptors[find_index(fd)].store(NO_DESCRIPTOR, std::memory_order_release);
     // An interrupted close is not repeated: the descriptor may be in use again by then.
     return ::close(fd);
 }
@@ -188,7 +205,14 @@ std::int32_t img_platform_read(std::int32_t fd, void *buffer, std::uint32_t coun
     open_file *const file = find_file(fd);
     if (file == nullptr) return -1;
     if (const std::int32_t got = read_head(file, buffer, count); got != -1) return got;
-    return transfer_whole(file, static_cast<std::byte *>(buffer), nullptr, count);
+    return transfer_whole(fd, &file->position, static_cast<std::byte *>(buffer), nullptr, count);
+}
+
+std::int32_t img_platform_read_at(std::int32_t fd, std::int32_t offset, void *buffer,
+                                  std::uint32_t count)
+{
+    if (find_file(fd) == nullptr) return -1;
+    return transfer_whole(fd, &offset, static_cast<std::byte *>(buffer), nullptr, count);
 }
 
 std::int32_t img_platform_write(std::int32_t fd, const void *buffer, std::uint32_t count)
@@ -196,7 +220,8 @@ std::int32_t img_platform_write(std::int32_t fd, const void *buffer, std::uint32
     open_file *const file = find_file(fd);
     if (file == nullptr) return -1;
     file->head.length = -1;
-    return transfer_whole(file, nullptr, static_cast<const std::byte *>(buffer), count);
+    return transfer_whole(fd, &file->position, nullptr, static_cast<const std::byte *>(buffer),
+                          count);
 }
 
 std::int32_t img_platform_seek(std::int32_t fd, std::int32_t offset, std::int32_t whence)
@@ -220,13 +245,24 @@ std::int32_t img_platform_seek(std::int32_t fd, std::int32_t offset, std::int32_
 }
 
 std::int32_t img_platform_lend(std::int32_t fd, std::int32_t offset, std::int32_t count,
-                               img_io_use_fn use, void *arg)
+                               std::int32_t discards, img_io_use_fn use, void *arg)
 {
     open_file *const file = find_file(fd);
-    return file != nullptr && file->mapping.lend(fd, offset, count, use, arg) ? 0 : -1;
+    if (file == nullptr) return -1;
+    return file->mapping.lend(fd, offset, count, discards != 0, use, arg) ? 0 : -1;
 }
 
 std::int32_t img_platform_unlink(const char *filename)
 {
     return ::unlink(filename);
+}
+
+void img_platform_after_fork()
+{
+    img_bus_errors_after_fork();
+}
+
+void img_platform_unload()
+{
+    img_leave_bus_errors();
 }

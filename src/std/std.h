@@ -20,6 +20,7 @@
 #ifndef IMG_STD_H
 #define IMG_STD_H
 
+#include "base/shared_lock.h"
 #include "base/types.h"
 
 #include <array>
@@ -42,6 +43,7 @@ struct img_std_file {
     std::int32_t padded_nsamps;  // samples of a stored line
     std::int32_t padded_nlines;  // stored lines of a band plane
     std::unique_ptr<char[]> companion_name;  // null: the image has no second file
+    img_mutex position_mutex;  // held by a read that seeks, for several threads may read
 };
 
 // The fill of transfers that have none of their own.

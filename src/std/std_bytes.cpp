@@ -81,9 +81,14 @@ std::int32_t img_std_extend(img_desc *desc, std::int32_t count)
 std::int32_t img_std_read_at(const img_desc *desc, std::int64_t offset, void *buffer,
                              std::int32_t count)
 {
+    const img_io_method *const method = desc->io_method;
+    img_std_file *const file = desc->std_file;
+    if (method->read_at != nullptr && img_std_fit31(offset) != -1)
+        return method->read_at(file->data_fd, static_cast<std::int32_t>(offset), buffer,
+                               static_cast<std::uint32_t>(count));
+    const img_mutex_lock lock(file->position_mutex);
     if (img_std_seek_to(desc, offset) == -1) return -1;
-    return desc->io_method->read(desc->std_file->data_fd, buffer,
-                                 static_cast<std::uint32_t>(count));
+    return method->read(file->data_fd, buffer, static_cast<std::uint32_t>(count));
 }
 
 std::int32_t img_std_write_at(img_desc *desc, std::int64_t offset, const void *buffer,
@@ -124,8 +129,13 @@ bool img_std_may_merge(const img_desc *desc)
     return desc->io_method->may_merge_transfers != 0;
 }
 
-bool img_std_lend(const img_desc *desc, std::int64_t offset, std::int64_t count, img_io_use_fn use,
-                  void *arg)
+bool img_std_lends_files(const img_desc *desc)
+{
+    return !desc->mem_image && desc->io_method->lend != nullptr;
+}
+
+bool img_std_lend(const img_desc *desc, std::int64_t offset, std::int64_t count, bool discards,
+                  img_io_use_fn use, void *arg)
 {
     const img_std_file *const file = desc->std_file;
     if (desc->mem_image) {
@@ -135,5 +145,5 @@ bool img_std_lend(const img_desc *desc, std::int64_t offset, std::int64_t count,
     }
     return desc->io_method->lend != nullptr &&
            desc->io_method->lend(file->data_fd, static_cast<std::int32_t>(offset),
-                                 static_cast<std::int32_t>(count), use, arg) == 0;
+                                 static_cast<std::int32_t>(count), discards ? 1 : 0, use, arg) == 0;
 }

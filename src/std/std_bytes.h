@@ -2,9 +2,12 @@
 #ifndef IMG_STD_BYTES_H
 #define IMG_STD_BYTES_H
 
+#include "base/scratch.h"
 #include "io/io_method.h"
 
+#include <cstddef>
 #include <cstdint>
+#include <cstring>
 
 struct img_desc;
 
@@ -37,8 +40,9 @@ std::int32_t img_std_extend(img_desc *desc, std::int32_t count);
 
 // --- Transfers ---
 
-// Read or write `count` bytes at `offset` of the file. A write grows the file up to it and updates
-// veof. Return the bytes moved, or -1 with errno set.
+// Read or write `count` bytes at `offset` of the file. Reads of several threads run at the same
+// time where the access method can read at a position; else they take turns. A write grows the file
+// up to it and updates veof. Return the bytes moved, or -1 with errno set.
 std::int32_t img_std_read_at(const img_desc *desc, std::int64_t offset, void *buffer,
                              std::int32_t count);
 std::int32_t img_std_write_at(img_desc *desc, std::int64_t offset, const void *buffer,
@@ -55,21 +59,57 @@ std::uint8_t *img_std_memory_to_write(img_desc *desc, std::int64_t offset, std::
 
 // --- Loans ---
 
+// True when the image lies in a file whose access method lends bytes.
+bool img_std_lends_files(const img_desc *desc);
+
 // True when transfers to the image's file may be merged and split freely. Not for images in memory.
 bool img_std_may_merge(const img_desc *desc);
 // Calls `use` with the `count` bytes at `offset` where they lie: in memory, or in a file whose
 // access method lends them. Returns true when all of them were there. False: `use` may have been
 // called with bytes that are not those of the file; its result must be discarded, and the ordinary
-// transfers run instead.
-bool img_std_lend(const img_desc *desc, std::int64_t offset, std::int64_t count, img_io_use_fn use,
-                  void *arg);
+// transfers run instead. `discards` true: that costs the caller nothing, so that `use` may be
+// called although the file is known to have changed.
+bool img_std_lend(const img_desc *desc, std::int64_t offset, std::int64_t count, bool discards,
+                  img_io_use_fn use, void *arg);
 template <typename Use>
-bool img_std_lend(const img_desc *desc, std::int64_t offset, std::int64_t count, Use use)
+bool img_std_lend(const img_desc *desc, std::int64_t offset, std::int64_t count, bool discards,
+                  Use use)
 {
     const img_io_use_fn call = [](void *arg, const std::uint8_t *lent) {
         (*static_cast<Use *>(arg))(lent);
     };
-    return img_std_lend(desc, offset, count, call, &use);
+    return img_std_lend(desc, offset, count, discards, call, &use);
+}
+
+// Where the samples of a region go: rows of `row_length` bytes, `pitch` bytes apart.
+struct img_std_target {
+    std::uint8_t *rows;
+    std::size_t nrows, row_length, pitch;
+};
+// Lends the bytes for a copy of samples: calls `copy(bytes, rows, pitch)`, which fills rows that
+// lie `pitch` bytes apart. Small regions are copied in between, so that a failed loan leaves the
+// target alone. Returns true when the target was filled.
+template <typename Copy>
+bool img_std_lend_rows(const img_desc *desc, std::int64_t offset, std::int64_t count,
+                       const img_std_target &target, Copy copy)
+{
+    // A copy of so many bytes in the processor's cache takes less time than a system call.
+    constexpr std::size_t small_region = 16384;
+    img_scratch between;
+    if (target.nrows * target.row_length <= small_region && img_std_lends_files(desc))
+        between = img_take_scratch(target.nrows * target.row_length);
+    if (!between)
+        return img_std_lend(desc, offset, count, false, [&](const std::uint8_t *lent) {
+            copy(lent, target.rows, target.pitch);
+        });
+    if (!img_std_lend(desc, offset, count, true, [&](const std::uint8_t *lent) {
+            copy(lent, between.get(), target.row_length);
+        }))
+        return false;
+    for (std::size_t row = 0; row < target.nrows; ++row)
+        std::memcpy(target.rows + row * target.pitch, between.get() + row * target.row_length,
+                    target.row_length);
+    return true;
 }
 
 #endif

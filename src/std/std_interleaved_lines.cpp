@@ -132,7 +132,7 @@ std::int32_t img_std_read_nontiled_interleaved(img_desc *desc, std::int32_t line
     const std::int64_t begin = img_std_pixel_offset(desc, line, samp);
     const std::int64_t end =
         img_std_pixel_offset(desc, std::int64_t{line} + nlines - 1, samp + nsamps);
-    if (img_std_lend(desc, begin, end - begin, [&](const std::uint8_t *bytes) {
+    if (img_std_lend(desc, begin, end - begin, false, [&](const std::uint8_t *bytes) {
             copy_band(desc, bytes, nlines, nsamps, band, buffer, stride);
         }))
         return 0;

@@ -111,13 +111,17 @@ std::int32_t img_std_read_lines(img_desc *desc, std::int32_t line, std::int32_t 
     const std::int64_t begin = img_std_line_offset(desc, line, samp, band);
     const std::int64_t end =
         img_std_line_offset(desc, std::int64_t{line} + nlines - 1, samp + nsamps, band);
-    if (img_std_lend(desc, begin, end - begin, [&](const std::uint8_t *bytes) {
-            img_std_copy_rows({bytes, img_std_sample_bytes(desc, desc->std_file->padded_nsamps),
-                               img_count(desc->nbytes)},
-                              buffer, img_std_sample_bytes(desc, stride), img_count(nlines),
-                              img_count(nsamps), desc->nbytes, exchange);
-        }))
-        return 0;
+    const img_std_target target{.rows = buffer,
+                                .nrows = img_count(nlines),
+                                .row_length = img_std_sample_bytes(desc, nsamps),
+                                .pitch = img_std_sample_bytes(desc, stride)};
+    const auto copy = [&](const std::uint8_t *bytes, std::uint8_t *rows, std::size_t pitch) {
+        img_std_copy_rows({bytes, img_std_sample_bytes(desc, desc->std_file->padded_nsamps),
+                           img_count(desc->nbytes)},
+                          rows, pitch, img_count(nlines), img_count(nsamps), desc->nbytes,
+                          exchange);
+    };
+    if (img_std_lend_rows(desc, begin, end - begin, target, copy)) return 0;
     if (desc->mem_image)
         return read_lines_in_memory(desc, line, samp, nlines, nsamps, band, buffer, stride,
                                     exchange);

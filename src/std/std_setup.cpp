@@ -138,6 +138,7 @@ bool make_state(img_desc *desc, std::int32_t fd)
         .padded_nsamps = 0,
         .padded_nlines = 0,
         .companion_name = nullptr,
+        .position_mutex = {},
     };
     return desc->std_file != nullptr;
 }

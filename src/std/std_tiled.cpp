@@ -38,6 +38,7 @@ public:
         : m_begin(begin), m_last(begin + extent - 1), m_tile_extent(tile_extent)
     {
     }
+    std::int32_t extent() const { return m_last - m_begin + 1; }
     std::int32_t first_tile() const { return m_begin / m_tile_extent; }
     std::int32_t ntiles() const { return m_last / m_tile_extent - first_tile() + 1; }
     // Returns the part of the span that lies in its `index`th tile.
@@ -60,7 +61,7 @@ struct tile_part {
     std::size_t nlines, nsamps;
     std::size_t first_sample;  // in the tile
     std::size_t run_byte;      // where it begins in a run of planes
-    std::size_t buffer_byte;   // where it begins in the caller's buffer
+    std::size_t line, samp;    // where it begins in the region
 };
 
 // A region of a tiled image: a run of tiles in each row of tiles.
@@ -103,10 +104,22 @@ public:
                 .nsamps = img_count(samps.count),
                 .first_sample = first_sample,
                 .run_byte = img_count(tile) * img_plane_size(m_desc) + first_sample * width(),
-                .buffer_byte =
-                    img_count(lines.start) * buffer_pitch() + img_count(samps.start) * width(),
+                .line = img_count(lines.start),
+                .samp = img_count(samps.start),
             });
         }
+    }
+    // Where a part begins in the caller's buffer.
+    std::size_t buffer_byte(const tile_part &part) const
+    {
+        return part.line * buffer_pitch() + part.samp * width();
+    }
+    img_std_target target(std::uint8_t *buffer) const
+    {
+        return {.rows = buffer,
+                .nrows = img_count(m_lines.extent()),
+                .row_length = img_count(m_samps.extent()) * width(),
+                .pitch = buffer_pitch()};
     }
     // The lines of its tiles that the region touches.
     tile_span::part lines_in_tile(std::int32_t tile_row) const { return m_lines.in_tile(tile_row); }
@@ -142,17 +155,18 @@ bool read_lent_region(const img_desc *desc, const tiled_region &region, std::int
     const img_std_plane plane = img_std_plane_in_tile(desc, band);
     const std::size_t line_length = plane.step * img_count(desc->tile_nsamps);
     const bool exchange = img_std_exchanges_bytes(desc);
-    return img_std_lend(desc, begin, end - begin, [&](const std::uint8_t *bytes) {
+    const auto copy = [&](const std::uint8_t *bytes, std::uint8_t *rows, std::size_t pitch) {
         for (std::int32_t row = 0; row <= last_row; ++row)
             region.for_each_tile(row, [&](const tile_part &part) {
                 const std::int64_t tile =
                     img_std_tile_offset(desc, region.first_tile(row) + part.index, band) - begin;
                 img_std_copy_rows({bytes + tile + plane.first + part.first_sample * plane.step,
                                    line_length, plane.step},
-                                  buffer + part.buffer_byte, region.buffer_pitch(), part.nlines,
-                                  part.nsamps, desc->nbytes, exchange);
+                                  rows + part.line * pitch + part.samp * region.width(), pitch,
+                                  part.nlines, part.nsamps, desc->nbytes, exchange);
             });
-    });
+    };
+    return img_std_lend_rows(desc, begin, end - begin, region.target(buffer), copy);
 }
 
 // Loads a run without asking for it on loan.
@@ -210,9 +224,10 @@ void overlay(const row_write &write)
 {
     const tiled_region &region = write.region;
     region.for_each_tile(write.row, [&](const tile_part &part) {
-        img_std_copy_rows({write.buffer + part.buffer_byte, region.buffer_pitch(), region.width()},
-                          write.run + part.run_byte, region.plane_pitch(), part.nlines, part.nsamps,
-                          write.desc->nbytes, img_std_exchanges_bytes(write.desc));
+        img_std_copy_rows(
+            {write.buffer + region.buffer_byte(part), region.buffer_pitch(), region.width()},
+            write.run + part.run_byte, region.plane_pitch(), part.nlines, part.nsamps,
+            write.desc->nbytes, img_std_exchanges_bytes(write.desc));
     });
 }
 
@@ -364,7 +379,7 @@ std::int32_t img_read_tiled(img_desc *desc, std::int32_t line, std::int32_t samp
         if (load(desc, region.first_tile(row), region.ntiles(), band, run.get()) == -1) return -1;
         region.for_each_tile(row, [&](const tile_part &part) {
             img_std_copy_rows({run.get() + part.run_byte, region.plane_pitch(), region.width()},
-                              buffer + part.buffer_byte, region.buffer_pitch(), part.nlines,
+                              buffer + region.buffer_byte(part), region.buffer_pitch(), part.nlines,
                               part.nsamps, desc->nbytes, img_std_exchanges_bytes(desc));
         });
     }

@@ -19,7 +19,7 @@
 #include <cerrno>
 #include <cstring>
 
-std::int32_t img_std_report_errors = 1;
+constinit thread_local std::int32_t img_std_report_errors = 1;
 
 namespace {
 
@@ -284,7 +284,7 @@ bool img_std_read_lent_tiles(img_desc *desc, std::int32_t first_tile, std::int32
     const std::int64_t next = img_std_tile_offset(desc, std::int64_t{first_tile} + 1, band);
     const std::int64_t end = begin + (next - begin) * (ntiles - 1) + desc->std_file->tile_size;
     const img_std_plane plane = img_std_plane_in_tile(desc, band);
-    return img_std_lend(desc, begin, end - begin, [&](const std::uint8_t *bytes) {
+    return img_std_lend(desc, begin, end - begin, false, [&](const std::uint8_t *bytes) {
         img_std_copy_rows(
             {bytes + plane.first + first_sample * plane.step, img_count(next - begin), plane.step},
             buffer + first_sample * img_count(desc->nbytes), img_plane_size(desc),

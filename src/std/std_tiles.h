@@ -12,10 +12,10 @@
 
 struct img_desc;
 
-// 0: img_std_read_tiles fails without a message. 1 at start. A pre-read through a type's own
-// read_tiles sets it to 0 meanwhile: such an operation may call img_std_read_tiles, and has no
-// argument that says so. The driver's own pre-reads do not need it.
-extern std::int32_t img_std_report_errors;
+// Of the calls of this thread. 0: img_std_read_tiles fails without a message. 1 at start. A
+// pre-read through a type's own read_tiles sets it to 0 meanwhile: such an operation may call
+// img_std_read_tiles, and has no argument that says so. The driver's own pre-reads do not need it.
+extern constinit thread_local std::int32_t img_std_report_errors;
 
 // Return 0, or -1 after a message; quietly when memory is short. A failed read leaves in `buffer`
 // the bytes that it got.

@@ -1,10 +1,13 @@
 #include "support/fault_memory.h"
 
 #include <cerrno>
+#include <mutex>
 #include <new>
 
 static bool denies(std::size_t size)
 {
+    static std::mutex mutex;
+    const std::lock_guard lock(mutex);
     shortage.requested += size;
     if (shortage.requests_left == 0 || --shortage.requests_left != 0) return false;
     shortage.requests_left = shortage.denies_the_rest ? 1 : 0;

@@ -99,7 +99,8 @@ std::int32_t fault_unlink(const char *filename)
     return goes_wrong(io_call::unlink) != nullptr ? -1 : img_platform_unlink(filename);
 }
 
-std::int32_t refuse(std::int32_t, std::int32_t, std::int32_t count, img_io_use_fn use, void *arg)
+std::int32_t refuse(std::int32_t, std::int32_t, std::int32_t count, std::int32_t, img_io_use_fn use,
+                    void *arg)
 {
     ++refused_loans();
     if (count > 0)

@@ -104,7 +104,7 @@ std::time_t __wrap_time(std::time_t *now)
 int __wrap_sigaction(int signal, const struct sigaction *action, struct sigaction *found)
 {
     const int result = __real_sigaction(signal, action, found);
-    if (host.after_sigaction) std::exchange(host.after_sigaction, nullptr)();
+    if (action != nullptr && host.after_sigaction) std::exchange(host.after_sigaction, nullptr)();
     return result;
 }
 

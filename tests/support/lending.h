@@ -33,7 +33,7 @@ protected:
         const img_io_use_fn call = [](void *arg, const std::uint8_t *lent) {
             std::exchange(*static_cast<decltype(use) *>(arg), nullptr)(lent);
         };
-        const std::int32_t result = img_platform_lend(m_fd, offset, count, call, &use);
+        const std::int32_t result = img_platform_lend(m_fd, offset, count, 0, call, &use);
         return !use ? result : result == -1 ? 1 : -2;
     }
     std::int32_t lend_and_compare(std::int32_t offset, std::int32_t count)

@@ -27,12 +27,12 @@ constexpr std::array<colour, 6> crops{{{0.66, 0.57, 0.33, 0.48},
                                        {0.56, 0.50, 0.28, 0.42},
                                        {0.18, 0.31, 0.12, 0.64}}};
 
-// Returns `first`, `second`, or a mixture; `part`: the share of `second`, 0 to 1.
-colour mix(const colour &first, const colour &second, double part)
+// Returns a mixture of two colours; `share`: that of `added`, 0 to 1.
+colour mix(const colour &ground, const colour &added, double share)
 {
     colour result;
     for (std::size_t i = 0; i < result.size(); ++i)
-        result[i] = std::lerp(first[i], second[i], part);
+        result[i] = std::lerp(ground[i], added[i], share);
     return result;
 }
 

@@ -226,6 +226,14 @@ int run(int argc, char **argv)
             if (command->parsed()) return action();
     } catch (const wrong_usage &error) {
         return report_wrong_usage(app, error.what());
+    }
+    return 1;
+}
+
+int run_and_report(int argc, char **argv) noexcept
+{
+    try {
+        return run(argc, argv);
     } catch (const std::bad_alloc &) {
         print_failure("not enough memory");
     } catch (const std::exception &error) {
@@ -242,7 +250,7 @@ int main(int argc, char **argv)
     library_message::collect();
     std::signal(SIGPIPE, SIG_IGN);  // a closed pipe is an error like others
     std::signal(SIGXFSZ, SIG_IGN);
-    const int status = run(argc, argv);
+    const int status = run_and_report(argc, argv);
     if (std::fflush(stdout) == 0 && std::ferror(stdout) == 0 && std::cout.flush().good())
         return status;
     std::fprintf(stderr, "imgfile: standard output: cannot be written\n");

@@ -84,7 +84,7 @@ constexpr std::int32_t LARGEST_LOAN = 9 << 20;
 // Reads the bytes into a buffer by one call and lends that: the ordinary calls would read line by
 // line.
 std::int32_t lend_buffer(std::int32_t fd, std::int32_t offset, std::int32_t count,
-                         img_io_use_fn use, void *arg)
+                         std::int32_t /*discards*/, img_io_use_fn use, void *arg)
 {
     static const auto buffer = std::make_unique_for_overwrite<std::uint8_t[]>(LARGEST_LOAN);
     if (count < 1 || count > LARGEST_LOAN ||
@@ -95,9 +95,9 @@ std::int32_t lend_buffer(std::int32_t fd, std::int32_t offset, std::int32_t coun
 }
 
 std::int32_t lend_mapped(std::int32_t fd, std::int32_t offset, std::int32_t count,
-                         img_io_use_fn use, void *arg)
+                         std::int32_t discards, img_io_use_fn use, void *arg)
 {
-    return mappings[fd].lend(fd, offset, count, use, arg) ? 0 : -1;
+    return mappings[fd].lend(fd, offset, count, discards != 0, use, arg) ? 0 : -1;
 }
 
 static_assert(SEEK_SET == IMG_SEEK_START && SEEK_CUR == IMG_SEEK_CURRENT &&
@@ -115,6 +115,7 @@ constexpr img_io_method method_that_lends(const char *name, img_io_lend_fn lend)
         .seek = seek_file,
         .unlink = keep_file,
         .get_value = no_value,
+        .read_at = nullptr,  // the tool has one thread
         .lend = lend,
         .may_merge_transfers = 1,
     };
