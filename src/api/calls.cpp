@@ -87,10 +87,9 @@ img_image_use::img_image_use(img_handle handle, img_purpose purpose) : m_handle(
     if (!enter(alone, opening)) return;
     if (needs_image_alone(purpose, m_desc)) {
         leave();
-        enter(true, opening);
+        if (!enter(true, opening)) return;  // uncounted: the image is closed just then
     }
-    if (m_desc != nullptr && purpose == img_purpose::close)
-        slot_of(handle).opening.store(opening + 1);
+    if (purpose == img_purpose::close) slot_of(handle).opening.store(opening + 1);
 }
 
 img_image_use::~img_image_use()

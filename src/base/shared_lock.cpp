@@ -68,6 +68,7 @@ void img_shared_lock::lock_shared()
 void img_shared_lock::unlock_shared()
 {
     std::atomic<std::int32_t> &readers = own_counter().readers;
+    // uncounted: a writer comes just then
     if (readers.fetch_sub(1) == 1 && m_has_writer.load() != 0) img_wake_waiting(readers);
 }
 

@@ -127,7 +127,6 @@ img_file_mapping::view *img_file_mapping::map_up_to(int fd, std::int64_t end, co
         m_device = now.device;
         m_inode = now.inode;
     }
-    if (!is_mapped_file(now)) return nullptr;
     if (index == NO_VIEW || static_cast<std::int64_t>(m_views[img_count(index)].size) < end) {
         const std::uint32_t file_system = local_file_system(fd);
         if (file_system == 0) return nullptr;

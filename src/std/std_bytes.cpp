@@ -129,9 +129,11 @@ bool img_std_may_merge(const img_desc *desc)
     return desc->io_method->may_merge_transfers != 0;
 }
 
-bool img_std_lends_files(const img_desc *desc)
+img_scratch img_std_between(const img_desc *desc, std::size_t size)
 {
-    return !desc->mem_image && desc->io_method->lend != nullptr;
+    constexpr std::size_t small_region = 16384;
+    const bool is_in_a_lent_file = !desc->mem_image && desc->io_method->lend != nullptr;
+    return is_in_a_lent_file && size <= small_region ? img_take_scratch(size) : nullptr;
 }
 
 bool img_std_lend(const img_desc *desc, std::int64_t offset, std::int64_t count, bool discards,

@@ -59,9 +59,6 @@ std::uint8_t *img_std_memory_to_write(img_desc *desc, std::int64_t offset, std::
 
 // --- Loans ---
 
-// True when the image lies in a file whose access method lends bytes.
-bool img_std_lends_files(const img_desc *desc);
-
 // True when transfers to the image's file may be merged and split freely. Not for images in memory.
 bool img_std_may_merge(const img_desc *desc);
 // Calls `use` with the `count` bytes at `offset` where they lie: in memory, or in a file whose
@@ -86,6 +83,10 @@ struct img_std_target {
     std::uint8_t *rows;
     std::size_t nrows, row_length, pitch;
 };
+// Returns working memory between the lent bytes and the target of a small region, null for others.
+// A copy of so many bytes in the processor's cache takes less time than the call of the system that
+// it saves.
+img_scratch img_std_between(const img_desc *desc, std::size_t size);
 // Lends the bytes for a copy of samples: calls `copy(bytes, rows, pitch)`, which fills rows that
 // lie `pitch` bytes apart. Small regions are copied in between, so that a failed loan leaves the
 // target alone. Returns true when the target was filled.
@@ -93,11 +94,7 @@ template <typename Copy>
 bool img_std_lend_rows(const img_desc *desc, std::int64_t offset, std::int64_t count,
                        const img_std_target &target, Copy copy)
 {
-    // A copy of so many bytes in the processor's cache takes less time than a system call.
-    constexpr std::size_t small_region = 16384;
-    img_scratch between;
-    if (target.nrows * target.row_length <= small_region && img_std_lends_files(desc))
-        between = img_take_scratch(target.nrows * target.row_length);
+    const img_scratch between = img_std_between(desc, target.nrows * target.row_length);
     if (!between)
         return img_std_lend(desc, offset, count, false, [&](const std::uint8_t *lent) {
             copy(lent, target.rows, target.pitch);
