@@ -49,8 +49,13 @@ void free_block(const kept_block &memory)
     ::operator delete[](memory.block, ALIGNMENT);
 }
 
+class store;
+struct list_entry {
+    store *previous = nullptr, *next = nullptr;  // in the list of all stores
+};
+
 // The blocks that one thread keeps.
-class store {
+class store : public list_entry {
 public:
     store() = default;
     ~store() { free_all(); }
@@ -76,8 +81,6 @@ public:
     {
         while (m_kept.front().block != nullptr) free_block(take_out(m_kept.begin()));
     }
-
-    store *previous = nullptr, *next = nullptr;  // in the list of all stores
 
 private:
     // Takes an entry off the kept blocks; the later ones move up.

@@ -5,6 +5,7 @@
 
 #include "base/threads.h"
 
+#include <algorithm>
 #include <bit>
 
 namespace {
@@ -94,12 +95,10 @@ bool img_shared_lock::try_lock()
     std::int32_t turn = m_serving.load();
     if (!m_next.compare_exchange_strong(turn, turn + 1)) return false;
     m_has_writer.store(1);
-    for (const counter &each : m_counters)
-        if (each.readers.load() != 0) {
-            unlock();
-            return false;
-        }
-    return true;
+    const bool is_free = std::ranges::all_of(
+        m_counters, [](const counter &each) { return each.readers.load() == 0; });
+    if (!is_free) unlock();
+    return is_free;
 }
 
 void img_shared_lock::reset_in_child()
