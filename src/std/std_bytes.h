@@ -103,6 +103,10 @@ bool img_std_lend_rows(const img_desc *desc, std::int64_t offset, std::int64_t c
             copy(lent, between.get(), target.row_length);
         }))
         return false;
+    if (target.pitch == target.row_length) {
+        std::memcpy(target.rows, between.get(), target.nrows * target.row_length);
+        return true;
+    }
     for (std::size_t row = 0; row < target.nrows; ++row)
         std::memcpy(target.rows + row * target.pitch, between.get() + row * target.row_length,
                     target.row_length);
