@@ -35,12 +35,12 @@ TEST(SharedLock, IsSharedByReadersOrHeldByOneWriter)
                 writers -= 1;
                 lock.unlock();
             } else {
-                lock.lock_shared();
+                const std::uint32_t counter = lock.lock_shared();
                 most_readers = std::max(most_readers.load(), readers.fetch_add(1) + 1);
                 EXPECT_EQ(writers, 0);
                 std::this_thread::yield();
                 readers -= 1;
-                lock.unlock_shared();
+                lock.unlock_shared(counter);
             }
         }
     });
@@ -50,15 +50,14 @@ TEST(SharedLock, IsSharedByReadersOrHeldByOneWriter)
 TEST(SharedLock, IsTakenAtOnceOrNotAtAll)
 {
     img_shared_lock lock;
-    lock.lock_shared();
+    const std::uint32_t counter = lock.lock_shared();
     EXPECT_FALSE(lock.try_lock());
     std::thread([&] { EXPECT_FALSE(lock.try_lock()); }).join();
-    lock.unlock_shared();
+    lock.unlock_shared(counter);
     ASSERT_TRUE(lock.try_lock());
     EXPECT_FALSE(lock.try_lock());
     lock.unlock();
-    lock.lock_shared();
-    lock.unlock_shared();
+    lock.unlock_shared(lock.lock_shared());
     lock.lock();
     lock.unlock();
 }
@@ -71,12 +70,16 @@ TEST(SharedLock, LetsNobodyWaitForever)
     run_threads(3, [&](int thread) {
         bool counted = false;
         for (int i = 0; left > 0 || !counted; ++i) {
-            thread == 0 ? lock.lock_shared() : lock.lock();
+            std::uint32_t counter = 0;
+            if (thread == 0)
+                counter = lock.lock_shared();
+            else
+                lock.lock();
             if (i == 100) {
                 left -= 1;
                 counted = true;
             }
-            thread == 0 ? lock.unlock_shared() : lock.unlock();
+            thread == 0 ? lock.unlock_shared(counter) : lock.unlock();
         }
     });
 }

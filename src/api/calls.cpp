@@ -71,12 +71,12 @@ void after_fork_in_child() IMG_UNCHECKED_LOCKS
 
 img_call::img_call() IMG_UNCHECKED_LOCKS
 {
-    if (depth++ == 0) library_lock.lock_shared();
+    if (depth++ == 0) m_counter = library_lock.lock_shared();
 }
 
 img_call::~img_call() IMG_UNCHECKED_LOCKS
 {
-    if (--depth == 0) library_lock.unlock_shared();
+    if (--depth == 0) library_lock.unlock_shared(m_counter);
 }
 
 img_image_use::img_image_use(img_handle handle, img_purpose purpose) : m_handle(handle)
@@ -106,7 +106,7 @@ bool img_image_use::enter(bool alone, std::uint32_t opening) IMG_UNCHECKED_LOCKS
     if (alone)
         slot.lock.lock();
     else
-        slot.lock.lock_shared();
+        m_counter = slot.lock.lock_shared();
     if (slot.opening.load() == opening) {
         m_desc = img_image_slot(m_handle);
         return true;
@@ -121,7 +121,7 @@ void img_image_use::leave() IMG_UNCHECKED_LOCKS
     if (m_is_alone)
         slot.lock.unlock();
     else
-        slot.lock.unlock_shared();
+        slot.lock.unlock_shared(m_counter);
     m_desc = nullptr;
 }
 

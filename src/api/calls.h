@@ -30,6 +30,9 @@ public:
     ~img_call();
     img_call(const img_call &) = delete;
     img_call &operator=(const img_call &) = delete;
+
+private:
+    std::uint32_t m_counter = 0;  // of the library's lock
 };
 
 enum class img_purpose : std::uint8_t { query, load, dump, close };
@@ -53,7 +56,8 @@ private:
 
     img_handle m_handle;
     bool m_is_alone = false;
-    img_desc *m_desc = nullptr;  // null: no lock is held
+    std::uint32_t m_counter = 0;  // of the lock, where it is shared
+    img_desc *m_desc = nullptr;   // null: no lock is held
 };
 
 // Makes the image of `handle` known to other calls. Before, only the opening thread works with it.

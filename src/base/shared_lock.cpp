@@ -33,11 +33,6 @@ void img_mutex::unlock()
     if (m_holders.exchange(0) == 2) img_wake_waiting(m_holders);
 }
 
-img_shared_lock::counter &img_shared_lock::own_counter()
-{
-    return m_counters[number_of_thread() % COUNTERS];
-}
-
 void img_shared_lock::take_turn()
 {
     const std::int32_t mine = m_next.fetch_add(1);
@@ -51,24 +46,25 @@ void img_shared_lock::pass_turn()
     if (m_next.load() != next) img_wake_waiting(m_serving);
 }
 
-void img_shared_lock::lock_shared()
+std::uint32_t img_shared_lock::lock_shared()
 {
     const std::uint32_t index = number_of_thread() % COUNTERS;
     const std::uint64_t bit = std::uint64_t{1} << index;
     if ((m_used_counters.load() & bit) == 0) m_used_counters.fetch_or(bit);
     std::atomic<std::int32_t> &readers = m_counters[index].readers;
     readers.fetch_add(1);
-    if (m_has_writer.load() == 0) return;
+    if (m_has_writer.load() == 0) return index;
     // In its turn the reader is alone with the other readers.
-    unlock_shared();
+    unlock_shared(index);
     take_turn();
     readers.fetch_add(1);
     pass_turn();
+    return index;
 }
 
-void img_shared_lock::unlock_shared()
+void img_shared_lock::unlock_shared(std::uint32_t index)
 {
-    std::atomic<std::int32_t> &readers = own_counter().readers;
+    std::atomic<std::int32_t> &readers = m_counters[index].readers;
     // uncounted: a writer comes just then
     if (readers.fetch_sub(1) == 1 && m_has_writer.load() != 0) img_wake_waiting(readers);
 }

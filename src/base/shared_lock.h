@@ -54,8 +54,9 @@ private:
 // the order in which they came, so that nobody waits forever. Not recursive; keeps errno.
 class IMG_CAPABILITY("shared lock") img_shared_lock {
 public:
-    void lock_shared() IMG_ACQUIRE_SHARED();
-    void unlock_shared() IMG_RELEASE_SHARED();
+    // Returns the index of the counter in which the reader is counted, for unlock_shared.
+    std::uint32_t lock_shared() IMG_ACQUIRE_SHARED();
+    void unlock_shared(std::uint32_t index) IMG_RELEASE_SHARED();
     void lock() IMG_ACQUIRE();
     void unlock() IMG_RELEASE();
     // Takes the lock if nobody has it. Returns true then.
@@ -72,7 +73,6 @@ private:
         std::atomic<std::int32_t> readers;
     };
 
-    counter &own_counter();
     void take_turn();
     void pass_turn();
 
