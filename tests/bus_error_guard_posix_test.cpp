@@ -194,6 +194,20 @@ TEST_F(HostsBusErrors, ReachTheHandlerThatIsInstalledThen)
     EXPECT_EQ(hosts_errors, 104);
 }
 
+TEST_F(HostsBusErrors, MayComeAtAnyTime)
+{
+    ::sigaction(SIGBUS, &m_plain, nullptr);
+    open(0);
+    EXPECT_EQ(lend(0, SIZE, [](auto) {}), 0);
+    const pid_t reader = ::getpid(), child = ::fork();
+    if (child == 0) {
+        for (int i = 0; i < 3000; ++i) ::kill(reader, SIGBUS);
+        ::_exit(0);
+    }
+    while (::waitpid(child, nullptr, WNOHANG) == 0) EXPECT_EQ(lend(0, SIZE, [](auto) {}), 0);
+    EXPECT_GT(hosts_errors, 0);
+}
+
 TEST_F(HostsBusErrors, EndTheProcessThatHasNoHandler)
 {
     EXPECT_EQ(end_of_child(SIG_DFL, true), -SIGBUS);

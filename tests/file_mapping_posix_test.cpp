@@ -52,6 +52,28 @@ TEST_F(Lending, RefusesFilesThatCannotBeMappedOrWatched)
     }
 }
 
+// Loans whose result is discarded when they fail begin without a look at the file.
+TEST_F(Lending, AsksAgainWhatMayHaveChanged)
+{
+    open(0);
+    const img_io_use_fn use = [](void *arg, const std::uint8_t *lent) {
+        *static_cast<std::uint8_t *>(arg) = *lent;
+    };
+    std::uint8_t seen = 0;
+    const auto lend_byte = [&](std::int32_t offset) {
+        return img_platform_lend(m_fd, offset, 1, 1, use, &seen);
+    };
+    EXPECT_EQ(lend_byte(SIZE), -1);  // before anything is mapped
+    for (int i = 0; i < 3; ++i) {
+        EXPECT_EQ(lend_byte(5), 0);
+        EXPECT_EQ(seen, m_content[5]);
+        m_content[5] ^= 1;
+        restore();
+    }
+    cut(0);
+    EXPECT_EQ(lend_byte(5), -1);
+}
+
 TEST_F(Lending, NoticesThatTheFileIsAnotherOne)
 {
     open(2);

@@ -97,7 +97,7 @@ TEST_F(Memory, ShortageFailsTheCallThatNeedsIt)
         {opens, deep, IMG_TYPE_VITEC},
         {loads, pixels},
         {loads, mixed, TEST_TYPE, 1, true},
-        {loads, deep, IMG_TYPE_VITEC},
+        {loads, deep, IMG_TYPE_VITEC, 0, true},  // without a table of its own, it takes turns
         {loads_merged, lines},
         {loads_linked, deep, IMG_TYPE_VITEC},
         {loads_tile, mixed, TEST_TYPE, 1, true},

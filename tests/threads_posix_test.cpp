@@ -38,6 +38,26 @@ TEST_F(Threads, LeaveNoMemory)
     img_closefile(image);
 }
 
+TEST_F(Threads, AreCancelledAfterTheCall)
+{
+    img_closefile(creating(m_file, IMG_TYPE_VITEC, {.nlines = 50, .nsamps = 50}).result);
+    const img_handle image = opening(m_file).result;
+    for (int i = 0; i < 20; ++i) {
+        std::atomic<bool> reads = false;
+        std::thread reader([&] {
+            bytes samples(2500);
+            for (;; reads = true) {
+                load(image, {.nlines = 50, .nsamps = 50}, samples.data());
+                ::pthread_testcancel();
+            }
+        });
+        while (!reads) {}
+        ::pthread_cancel(reader.native_handle());
+        reader.join();
+    }
+    EXPECT_EQ(img_closefile(image), 0);  // nobody holds its lock
+}
+
 // A library that was used by threads, one of which lives on, is unloaded without a trace: threads
 // end, processes fork and bus errors reach the host afterwards.
 TEST_F(UnloadedLibrary, LeavesNothing)

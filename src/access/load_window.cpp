@@ -97,7 +97,7 @@ std::int32_t img_load_window(img_desc *desc, const img_window &window, std::int3
     if (chain.identity != 0) return fill_and_read(desc, def, band, buffer);
     if (img_is_mapdown(chain)) {
         img_mapdown_copy own(chain);
-        return own.chain() != nullptr ? load_through(*own.chain(), desc, def, band, buffer) : -1;
+        if (own.chain() != nullptr) return load_through(*own.chain(), desc, def, band, buffer);
     }
     const img_mutex_lock lock(chain.mutex);
     return load_through(chain, desc, def, band, buffer);

@@ -34,16 +34,18 @@ bool needs_image_alone(img_purpose purpose, const img_desc *desc)
 
 // --- Forks ---
 
+// Handlers of the host that run between ours may call the library, as if from inside of a call.
+
 void before_fork() IMG_UNCHECKED_LOCKS
 {
-    if (depth > 0) return;  // it would wait for itself
+    if (depth++ > 0) return;  // it would wait for itself
     library_lock.lock();
     img_scratch_before_fork();
 }
 
 void after_fork_in_parent() IMG_UNCHECKED_LOCKS
 {
-    if (depth > 0) return;
+    if (--depth > 0) return;
     img_scratch_after_fork(/*in_child=*/false);
     library_lock.unlock();
 }
@@ -51,10 +53,16 @@ void after_fork_in_parent() IMG_UNCHECKED_LOCKS
 void after_fork_in_child() IMG_UNCHECKED_LOCKS
 {
     // uncounted: children of the tests end without a count
-    if (depth > 0) return;
+    if (--depth > 0) return;
     img_scratch_after_fork(/*in_child=*/true);
     img_platform_after_fork();
     library_lock.reset_in_child();
+}
+
+// Before the host's own handlers, if it can be: ours then hold the lock for the shortest time.
+[[gnu::constructor]] void load()
+{
+    img_watch_forks(before_fork, after_fork_in_parent, after_fork_in_child);
 }
 
 // At the end of the process other threads may still be inside: then everything stays.
@@ -71,12 +79,16 @@ void after_fork_in_child() IMG_UNCHECKED_LOCKS
 
 img_call::img_call() IMG_UNCHECKED_LOCKS
 {
-    if (depth++ == 0) m_counter = library_lock.lock_shared();
+    if (depth++ > 0) return;
+    m_cancellation = img_defer_cancellation();
+    m_counter = library_lock.lock_shared();
 }
 
 img_call::~img_call() IMG_UNCHECKED_LOCKS
 {
-    if (--depth == 0) library_lock.unlock_shared(m_counter);
+    if (--depth > 0) return;
+    library_lock.unlock_shared(m_counter);
+    img_allow_cancellation(m_cancellation);
 }
 
 img_image_use::img_image_use(img_handle handle, img_purpose purpose) : m_handle(handle)
@@ -130,17 +142,12 @@ void img_publish_image(img_handle handle)
     slot_of(handle).opening.fetch_add(1);
 }
 
-img_pause::img_pause() IMG_UNCHECKED_LOCKS
+img_pause::img_pause() IMG_UNCHECKED_LOCKS : m_is_alone(depth == 0)
 {
-    if (depth == 0) library_lock.lock();
+    if (m_is_alone) library_lock.lock();
 }
 
 img_pause::~img_pause() IMG_UNCHECKED_LOCKS
 {
-    if (depth == 0) library_lock.unlock();
-}
-
-bool img_watch_calls_over_forks()
-{
-    return img_watch_forks(before_fork, after_fork_in_parent, after_fork_in_child);
+    if (m_is_alone) library_lock.unlock();
 }

@@ -33,6 +33,7 @@ public:
 
 private:
     std::uint32_t m_counter = 0;  // of the library's lock
+    int m_cancellation = 0;       // of the thread, before the call
 };
 
 enum class img_purpose : std::uint8_t { query, load, dump, close };
@@ -71,10 +72,11 @@ public:
     ~img_pause();
     img_pause(const img_pause &) = delete;
     img_pause &operator=(const img_pause &) = delete;
-};
 
-// Makes forks wait for the calls in progress, so that images are whole in the child. Returns false
-// when memory is short.
-bool img_watch_calls_over_forks();
+    bool is_alone() const { return m_is_alone; }
+
+private:
+    bool m_is_alone;
+};
 
 #endif

@@ -33,7 +33,6 @@ constexpr std::array<std::pair<const char *, std::int32_t (*)(const char *name)>
 
 img_mutex start_mutex;
 std::atomic<bool> initialised = false;
-bool watches_forks IMG_GUARDED_BY(start_mutex) = false;
 
 // Fills the tables. Types and methods that a test or a host has registered before stay.
 void register_all()
@@ -56,7 +55,6 @@ void img_library_init()
     const img_mutex_lock lock(start_mutex);
     if (initialised) return;  // uncounted: another thread was faster
     img_start_scratch();
-    if (!watches_forks) watches_forks = img_watch_calls_over_forks();
     register_all();
     // Without a pool this call fails as with no free handle, and the next one tries again.
     // Registering twice changes nothing.
@@ -67,6 +65,6 @@ std::int32_t img_mgr_cleanup()
 {
     const img_pause pause;
     img_free_handle_pool();
-    img_free_scratch();
+    if (pause.is_alone()) img_free_scratch();
     return 0;
 }

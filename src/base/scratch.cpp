@@ -101,7 +101,8 @@ store *stores IMG_GUARDED_BY(list_mutex) = nullptr;  // of all threads; the firs
 
 // The store of this thread; null: it has none.
 constinit thread_local store *own_store = nullptr;
-std::atomic<bool> is_stopped = false;  // the stores are gone, whatever own_store says
+constinit thread_local bool forks = false;  // this thread holds list_mutex for a fork
+std::atomic<bool> is_stopped = false;       // the stores are gone, whatever own_store says
 
 void enlist(store *added)
 {
@@ -115,6 +116,9 @@ void forget(store *ended)
 {
     {
         const img_mutex_lock lock(list_mutex);
+        store *listed = stores;
+        while (listed != nullptr && listed != ended) listed = listed->next;
+        if (listed == nullptr) return;  // uncounted: the process ends, and with it all stores
         (ended->previous != nullptr ? ended->previous->next : stores) = ended->next;
         if (ended->next != nullptr) ended->next->previous = ended->previous;
     }
@@ -139,7 +143,7 @@ store *find_store()
 store *need_store()
 {
     store *const found = find_store();
-    if (found != nullptr || is_stopped) return found;  // uncounted: as above
+    if (found != nullptr || is_stopped || forks) return found;  // uncounted: as above
     auto *const made = new (std::nothrow) store;
     if (made == nullptr) return nullptr;
     if (!img_set_thread_object(made)) {
@@ -197,10 +201,12 @@ void img_stop_scratch()
 void img_scratch_before_fork() IMG_UNCHECKED_LOCKS
 {
     list_mutex.lock();
+    forks = true;
 }
 
 void img_scratch_after_fork(bool in_child) IMG_UNCHECKED_LOCKS
 {
+    forks = false;
     list_mutex.unlock();
     if (!in_child) return;  // uncounted: children of the tests end without a count
     // uncounted: the same

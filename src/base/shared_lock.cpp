@@ -19,6 +19,12 @@ std::uint32_t number_of_thread()
     return number - 1;
 }
 
+// Turns begin again after the last number.
+std::int32_t next_turn(std::int32_t turn)
+{
+    return static_cast<std::int32_t>(static_cast<std::uint32_t>(turn) + 1);
+}
+
 }  // namespace
 
 void img_mutex::lock()
@@ -42,8 +48,8 @@ void img_shared_lock::take_turn()
 
 void img_shared_lock::pass_turn()
 {
-    const std::int32_t next = m_serving.fetch_add(1) + 1;
-    if (m_next.load() != next) img_wake_waiting(m_serving);
+    const std::int32_t mine = m_serving.fetch_add(1);
+    if (m_next.load() != next_turn(mine)) img_wake_waiting(m_serving);
 }
 
 std::uint32_t img_shared_lock::lock_shared()
@@ -89,7 +95,7 @@ void img_shared_lock::unlock()
 bool img_shared_lock::try_lock()
 {
     std::int32_t turn = m_serving.load();
-    if (!m_next.compare_exchange_strong(turn, turn + 1)) return false;
+    if (!m_next.compare_exchange_strong(turn, next_turn(turn))) return false;
     m_has_writer.store(1);
     const bool is_free = std::ranges::all_of(
         m_counters, [](const counter &each) { return each.readers.load() == 0; });

@@ -10,9 +10,14 @@ void img_wait_for_change(const std::atomic<std::int32_t> &value, std::int32_t ol
 // Wakes the threads that wait for a change of `value`. Keeps errno.
 void img_wake_waiting(const std::atomic<std::int32_t> &value);
 
+// Puts off a cancellation of this thread (pthread_cancel), which would leave locks behind. Returns
+// what img_allow_cancellation needs to put it back.
+int img_defer_cancellation();
+void img_allow_cancellation(int state);
+
 // Calls `before` in a thread that forks, then `in_parent` and `in_child` in the two processes.
-// Holds until the library is unloaded. Returns false when memory is short.
-bool img_watch_forks(void (*before)(), void (*in_parent)(), void (*in_child)());
+// Holds until the library is unloaded.
+void img_watch_forks(void (*before)(), void (*in_parent)(), void (*in_child)());
 
 // Has `at_end` called with the object of each thread that ends after img_set_thread_object gave it
 // one. Does nothing when that is so already. Where the process has no room for it, no object can be

@@ -39,9 +39,21 @@ void img_wake_waiting(const std::atomic<std::int32_t> &value)
     futex(value, FUTEX_WAKE_PRIVATE, INT_MAX);
 }
 
-bool img_watch_forks(void (*before)(), void (*in_parent)(), void (*in_child)())
+int img_defer_cancellation()
 {
-    return ::pthread_atfork(before, in_parent, in_child) == 0;
+    int state = PTHREAD_CANCEL_ENABLE;
+    ::pthread_setcancelstate(PTHREAD_CANCEL_DISABLE, &state);
+    return state;
+}
+
+void img_allow_cancellation(int state)
+{
+    ::pthread_setcancelstate(state, nullptr);
+}
+
+void img_watch_forks(void (*before)(), void (*in_parent)(), void (*in_child)())
+{
+    ::pthread_atfork(before, in_parent, in_child);
 }
 
 void img_watch_thread_ends(void (*at_end)(void *object))

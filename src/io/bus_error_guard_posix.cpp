@@ -111,6 +111,20 @@ bool is_sent_by_a_program(const siginfo_t *info)
     return info->si_code <= 0;
 }
 
+// Maps over a mapping, in its place.
+bool map_fixed(std::uint8_t *begin, std::size_t size, int flags, int fd)
+{
+#ifdef IMG_THREAD_SANITIZER
+    AnnotateIgnoreWritesBegin(__FILE__, __LINE__);
+#endif
+    const void *const bytes = ::mmap(begin, size, PROT_READ, flags | MAP_FIXED, fd, 0);
+#ifdef IMG_THREAD_SANITIZER
+    AnnotateIgnoreWritesEnd(__FILE__, __LINE__);
+#endif
+    // unreachable: a failure; what replaces a mapping finds room
+    return bytes != MAP_FAILED;
+}
+
 // Replaces the mapping in which a bus error was met. Returns false when it was met elsewhere.
 bool replace_mapping(const siginfo_t *info)
 {
@@ -123,9 +137,8 @@ bool replace_mapping(const siginfo_t *info)
     if (hit == nullptr) return false;
     // A host that locks its memory has a limit on it: the zero pages count in addition.
     ::munlock(hit->begin, hit->size);
-    const bool has_zeros = img_map_again(hit->begin, hit->size, MAP_PRIVATE | MAP_ANONYMOUS, -1);
-    hit->cuts.fetch_add(1);
-    return has_zeros;
+    hit->cuts.fetch_add(1);  // before a thread can read a zero
+    return map_fixed(hit->begin, hit->size, MAP_PRIVATE | MAP_ANONYMOUS, -1);
 }
 
 // Returns true for a SIGBUS sent by a program that waits until this thread has read.
@@ -208,6 +221,10 @@ void leave_to_host(int signal, siginfo_t *info, void *context)
             }
         }
     }
+    if ((static_cast<unsigned>(host.sa_flags) & SA_NODEFER) != 0) {
+        const sigset_t set = bus_errors();
+        ::pthread_sigmask(SIG_UNBLOCK, &set, nullptr);
+    }
     const bool sent_by_a_program = is_sent_by_a_program(info);
     const bool is_default = host.sa_handler == SIG_DFL;
     const bool is_ignored = host.sa_handler == SIG_IGN;
@@ -239,7 +256,7 @@ bool install()
     struct sigaction installed, ours = {};
     ::sigaction(SIGBUS, nullptr, &installed);
     ours.sa_sigaction = on_bus_error;
-    ours.sa_flags = SA_SIGINFO | SA_NODEFER | SA_ONSTACK | SA_RESTART;
+    ours.sa_flags = SA_SIGINFO | SA_ONSTACK | SA_RESTART;  // SIGBUS is blocked in the handler
     while (!is_ours(installed)) {
         const std::size_t level = recorded_level(installed);
         if (level == host_actions.size()) return false;
@@ -299,17 +316,12 @@ void use_unblocked(const sigset_t &host_mask, const std::uint8_t *bytes, img_io_
 
 }  // namespace
 
-bool img_map_again(std::uint8_t *begin, std::size_t size, int flags, int fd)
+bool img_map_again(img_guarded_mapping *mapping, int fd, std::uint32_t *cuts)
 {
-#ifdef IMG_THREAD_SANITIZER
-    AnnotateIgnoreWritesBegin(__FILE__, __LINE__);
-#endif
-    const void *const bytes = ::mmap(begin, size, PROT_READ, flags | MAP_FIXED, fd, 0);
-#ifdef IMG_THREAD_SANITIZER
-    AnnotateIgnoreWritesEnd(__FILE__, __LINE__);
-#endif
-    // unreachable: in the handler, where anonymous pages replace a mapping and find room
-    return bytes != MAP_FAILED;
+    const blocked_bus_errors blocked;
+    const spin_lock lock;
+    *cuts = mapping->cuts;
+    return map_fixed(mapping->begin, mapping->size, MAP_SHARED, fd);
 }
 
 void img_guard_mapping(img_guarded_mapping *mapping)

@@ -28,8 +28,9 @@ struct img_guarded_mapping {
 void img_guard_mapping(img_guarded_mapping *mapping);
 void img_unguard_mapping(img_guarded_mapping *mapping);
 
-// Replaces a mapping in its place, while others may be reading it. Returns false on failure.
-bool img_map_again(std::uint8_t *begin, std::size_t size, int flags, int fd);
+// Maps the file open on `fd` again in the place of a mapping that was cut, while others may be
+// reading it. Sets `*cuts` to the count at which it is whole. Returns false on failure.
+bool img_map_again(img_guarded_mapping *mapping, int fd, std::uint32_t *cuts);
 
 // Calls `use(arg, bytes)`, which reads `bytes` inside of `mapping`, on any number of threads at the
 // same time. Returns true when no thread met a bus error in the mapping since it had `cuts` of

@@ -138,12 +138,12 @@ img_file_mapping::view *img_file_mapping::map_up_to(int fd, std::int64_t end, co
     }
     view &chosen = m_views[img_count(index)];
     const bool is_new = chosen.begin == nullptr;
-    const std::uint32_t cuts = chosen.cuts;
+    std::uint32_t cuts = chosen.cuts;
     if (!is_new && cuts == chosen.whole_at) return &chosen;
     const std::size_t size = std::size_t{1} << static_cast<std::uint32_t>(SMALLEST + index);
     if (!is_new) {
         // unreachable: a mapping that replaces another one finds room
-        if (!img_map_again(chosen.begin, size, MAP_SHARED, fd)) return nullptr;
+        if (!img_map_again(&chosen, fd, &cuts)) return nullptr;
         chosen.whole_at = cuts;
         return &chosen;
     }
@@ -178,12 +178,13 @@ bool img_file_mapping::lend(int fd, std::int32_t offset, std::int32_t count, boo
 {
     const std::int64_t end = std::int64_t{offset} + count;
     if (m_cannot_map || offset < 0 || count < 1) return false;
+    const bool has_view = m_view.load(std::memory_order_acquire) != NO_VIEW;
     status before{.change = m_settled_change.load(std::memory_order_acquire),
                   .length = m_settled_length,
                   .has_holes = m_settled_has_holes,
                   .device = m_device,
                   .inode = m_inode};
-    const bool is_known = discards && before.change != 0 && end <= before.length;
+    const bool is_known = discards && has_view && before.change != 0 && end <= before.length;
     if (!is_known && (!settled_status(fd, &before) || end > before.length)) return false;
     const view *const mapped = view_up_to(fd, end, before);
     // Reading a hole of a file in memory would take memory for it.
@@ -195,6 +196,7 @@ bool img_file_mapping::lend(int fd, std::int32_t offset, std::int32_t count, boo
         ask_for_status(fd, &after) && is_mapped_file(after) && after.change == before.change &&
         after.length == before.length)
         return true;
-    m_settled_change = 0;
-    return false;
+    forget_status();
+    // What was known may have been out of date.
+    return is_known && lend(fd, offset, count, false, use, arg);
 }

@@ -22,9 +22,12 @@ public:
     // Calls `use` with the bytes [offset, offset + count) of the file open on `fd`. Returns true
     // when the file had these bytes until `use` returned. False: the bytes cannot be lent, or were
     // not those of the file; `use` may have been called, and its result must be discarded.
-    // `discards` false: `use` is not called where the file is known to have changed before.
+    // `discards` false: `use` is called once at most, and not where the file is known to have
+    // changed before.
     bool lend(int fd, std::int32_t offset, std::int32_t count, bool discards, img_io_use_fn use,
               void *arg);
+    // The file is about to be changed.
+    void forget_status() { m_settled_change = 0; }
     // Ends the mappings, alone. The next loan maps the file again.
     void drop();
 

@@ -17,8 +17,8 @@
 //
 // The library holds the lock of the image, and its own against forks, while an operation runs. An
 // operation must not call the library for the image that it works for, nor for images whose
-// operations may call back for that one; must not fork; and must not wait for a thread that does
-// one of these, or that closes or writes the image. Calls for other images are allowed.
+// operations may call back for that one; must not fork; and must not wait for another thread that
+// may be calling the library. Calls for other images are allowed.
 #ifndef IMG_IO_METHOD_H
 #define IMG_IO_METHOD_H
 
@@ -89,13 +89,14 @@ struct img_io_method {
     // Reads as `read` does, but from `offset`, 0 to 2^31 - 1. Null: the library seeks and reads,
     // for one thread at a time.
     img_io_read_at_fn read_at;
-    // Calls `use` at most once with the bytes [offset, offset + count) of the file where they lie
+    // Calls `use` with the bytes [offset, offset + count) of the file where they lie
     // in memory: in a mapping, or in a buffer of the method's own. The library does not compare
     // them with the file's length; an offset below 0 or a count below 1 is refused. Returns 0 when
     // `use` was called and the file had all of these bytes from before the call until `use`
     // returned. Else -1, quietly: a refusal is no failure. The library then makes the ordinary
-    // calls, and their results count. `discards` 0: `use` is not called with bytes that the file
-    // is known not to have any more; not 0: it may be, since the library discards what `use` did.
+    // calls, and their results count. `discards` 0: `use` is called once at most, and not with
+    // bytes that the file is known not to have any more; not 0: both may be, since the library
+    // discards what `use` did before.
     // Null: nothing is lent.
     img_io_lend_fn lend;
     // 1: the library may merge the transfers of several lines or tiles into one call and split one

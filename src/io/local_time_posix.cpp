@@ -1,10 +1,19 @@
 // The local time of a POSIX system. Read local_time.h first.
 #include "io/local_time.h"
 
+#include "base/shared_lock.h"
+
 #include <ctime>
+
+namespace {
+
+img_mutex time_zone;
+
+}  // namespace
 
 std::array<std::uint8_t, 6> img_local_time()
 {
+    const img_mutex_lock lock(time_zone);
     const std::time_t now = std::time(nullptr);
     std::tm local;
     ::tzset();  // localtime_r need not notice that the host has changed its time zone

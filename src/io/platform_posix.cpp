@@ -220,6 +220,7 @@ std::int32_t img_platform_write(std::int32_t fd, const void *buffer, std::uint32
     open_file *const file = find_file(fd);
     if (file == nullptr) return -1;
     file->head.length = -1;
+    file->mapping.forget_status();
     return transfer_whole(fd, &file->position, nullptr, static_cast<const std::byte *>(buffer),
                           count);
 }

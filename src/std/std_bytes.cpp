@@ -133,7 +133,11 @@ img_scratch img_std_between(const img_desc *desc, std::size_t size)
 {
     constexpr std::size_t small_region = 16384;
     const bool is_in_a_lent_file = !desc->mem_image && desc->io_method->lend != nullptr;
-    return is_in_a_lent_file && size <= small_region ? img_take_scratch(size) : nullptr;
+    if (!is_in_a_lent_file || size > small_region) return nullptr;
+    const int error = errno;
+    img_scratch between = img_take_scratch(size);
+    if (!between) errno = error;  // it can be done without
+    return between;
 }
 
 bool img_std_lend(const img_desc *desc, std::int64_t offset, std::int64_t count, bool discards,
