@@ -27,7 +27,7 @@ protected:
     {
         hosts_errors = 0;
         m_plain.sa_handler = [](int) { mend_hosts_page(); };
-        m_informed.sa_flags = SA_SIGINFO;
+        m_informed.sa_flags = SA_SIGINFO | SA_NODEFER;
         m_informed.sa_sigaction = [](int, siginfo_t *info, void *context) {
             EXPECT_TRUE(info->si_addr == hosts_page && context != nullptr);
             mend_hosts_page();

@@ -117,6 +117,7 @@ void forget(store *ended)
     {
         const img_mutex_lock lock(list_mutex);
         store *listed = stores;
+        // uncounted: as below
         while (listed != nullptr && listed != ended) listed = listed->next;
         if (listed == nullptr) return;  // uncounted: the process ends, and with it all stores
         (ended->previous != nullptr ? ended->previous->next : stores) = ended->next;

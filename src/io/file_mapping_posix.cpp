@@ -10,6 +10,7 @@
 #include <algorithm>
 #include <bit>
 #include <ctime>
+#include <utility>
 
 #include <sys/mman.h>
 #include <sys/stat.h>
@@ -99,7 +100,7 @@ bool img_file_mapping::settled_status(int fd, status *found)
 // False when the host has put another file under the descriptor.
 bool img_file_mapping::is_mapped_file(const status &found) const
 {
-    return found.device == m_device && found.inode == m_inode;
+    return std::pair(found.device, found.inode) == std::pair(m_device.load(), m_inode.load());
 }
 
 // Returns a mapping that reaches `end`, which lies in the file, and is whole; null when the file
@@ -173,30 +174,38 @@ void img_file_mapping::drop()
     m_has_fine_timestamps = m_cannot_map = false;
 }
 
-bool img_file_mapping::lend(int fd, std::int32_t offset, std::int32_t count, bool discards,
-                            img_io_use_fn use, void *arg)
+// Lends bytes of a file that had the status `before` at some time; false if it has another one.
+bool img_file_mapping::lend_since(const status &before, int fd, std::int32_t offset,
+                                  std::int64_t end, img_io_use_fn use, void *arg)
 {
-    const std::int64_t end = std::int64_t{offset} + count;
-    if (m_cannot_map || offset < 0 || count < 1) return false;
-    const bool has_view = m_view.load(std::memory_order_acquire) != NO_VIEW;
-    status before{.change = m_settled_change.load(std::memory_order_acquire),
-                  .length = m_settled_length,
-                  .has_holes = m_settled_has_holes,
-                  .device = m_device,
-                  .inode = m_inode};
-    const bool is_known = discards && has_view && before.change != 0 && end <= before.length;
-    if (!is_known && (!settled_status(fd, &before) || end > before.length)) return false;
+    if (end > before.length) return false;
     const view *const mapped = view_up_to(fd, end, before);
     // Reading a hole of a file in memory would take memory for it.
     if (mapped == nullptr || !is_mapped_file(before) || (m_is_in_memory && before.has_holes))
         return false;
-
     status after;
     if (img_use_guarded(*mapped, mapped->whole_at, mapped->begin + offset, use, arg) &&
         ask_for_status(fd, &after) && is_mapped_file(after) && after.change == before.change &&
         after.length == before.length)
         return true;
     forget_status();
-    // What was known may have been out of date.
-    return is_known && lend(fd, offset, count, false, use, arg);
+    return false;
+}
+
+bool img_file_mapping::lend(int fd, std::int32_t offset, std::int32_t count, bool discards,
+                            img_io_use_fn use, void *arg)
+{
+    const std::int64_t end = std::int64_t{offset} + count;
+    if (m_cannot_map || offset < 0 || count < 1) return false;
+    // The identity of the file is known once it is mapped.
+    if (discards && m_view.load(std::memory_order_acquire) != NO_VIEW) {
+        const status known{.change = m_settled_change.load(std::memory_order_acquire),
+                           .length = m_settled_length,
+                           .has_holes = m_settled_has_holes,
+                           .device = m_device,
+                           .inode = m_inode};
+        if (known.change != 0 && lend_since(known, fd, offset, end, use, arg)) return true;
+    }
+    status before;
+    return settled_status(fd, &before) && lend_since(before, fd, offset, end, use, arg);
 }

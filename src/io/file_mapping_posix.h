@@ -49,6 +49,8 @@ private:
     bool settled_status(int fd, status *found);
     bool would_show_changes(img_file_time change) const;
     bool is_mapped_file(const status &found) const;
+    bool lend_since(const status &before, int fd, std::int32_t offset, std::int64_t end,
+                    img_io_use_fn use, void *arg);
     view *view_up_to(int fd, std::int64_t end, const status &now);
     view *map_up_to(int fd, std::int64_t end, const status &now);
 
