@@ -1,4 +1,4 @@
-// Tests of threads_posix.cpp: what is left of threads, forks and the library itself.
+// Tests of threads_posix.cpp: threads that end and the unloaded library leave nothing behind.
 #include "base/threads.h"
 
 #include "imgfile/img.h"

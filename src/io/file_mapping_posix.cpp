@@ -83,7 +83,8 @@ bool img_file_mapping::would_show_changes(img_file_time change) const
     return change < time_of(now) - (counts_seconds ? 2 * SECOND : 20 * MILLISECOND);
 }
 
-// Asks for a status that a later change would change. Returns false when there is none yet.
+// Asks for a status that every later change alters. Returns false when the last change is too
+// recent.
 bool img_file_mapping::settled_status(int fd, status *found)
 {
     if (!ask_for_status(fd, found)) return false;
