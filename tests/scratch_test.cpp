@@ -3,6 +3,7 @@
 
 #include "api/library.h"
 #include "imgfile/img.h"
+#include "io/io_method.h"
 #include "support/fault_memory.h"
 
 #include <gtest/gtest.h>
@@ -22,7 +23,9 @@ TEST(Scratch, KeepsALittleOfWhatWasTaken)
         }
         return shortage.requested;
     };
-    for (int i = 0; i < 2; ++i) EXPECT_GE(fresh_bytes({1}), page);  // nothing is kept yet
+    const bool is_fresh = img_io_method_count == 0;  // other tests have not used the library
+    for (int i = 0; is_fresh && i < 2; ++i)
+        EXPECT_GE(fresh_bytes({1}), page);  // nothing is kept yet
     img_library_init();
     fresh_bytes({1});  // makes the store of this thread
     img_free_scratch();
