@@ -209,7 +209,8 @@ TEST_F(System, DeliversNothingForeignFromAFileThatOthersChange)
         const bytes content = live(m_file, image).file;
         const img_handle handle = open_test_file(m_file, IMG_OPEN_READ_WRITE);
         const int fd = ::open(m_file.c_str(), O_RDWR);
-        for (auto i = static_cast<std::size_t>(rounds(5000)), step = i; i > 0; --i, step += 97) {
+        for (std::size_t i = static_cast<std::size_t>(rounds(5000)), step = 97; i > 0;
+             --i, step += 97) {
             EXPECT_EQ(::ftruncate(fd, static_cast<off_t>(step % content.size())), 0);
             EXPECT_NE(::pwrite(fd, &content[0], step % 3 * content.size() / 2, 0), -1);
             const image_line line = lines_of(image)[random.below(10)];
