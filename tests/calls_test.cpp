@@ -259,7 +259,7 @@ TEST_F(Calls, FindTheImageOrNone)
     std::atomic<int> seen = 0;
     run_threads(5, [&](int thread) {
         if (thread == 0) {
-            for (int i = rounds(20'000); i > 0 || seen < 100; --i) {
+            for (int i = rounds(2'000); i > 0 || seen < 100; --i) {
                 const img_handle image =
                     img_openfile(names[static_cast<std::size_t>(i % 2)].c_str(), 0);
                 EXPECT_EQ(image, 0);

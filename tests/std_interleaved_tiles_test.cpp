@@ -14,3 +14,18 @@ TEST(InterleavedTiles, FollowTheBandMapAndSkipMissingPlanes)
     EXPECT_EQ(merged, (bytes{1, 2, 3, 4, 77, 77, 7, 8, 9, 10, 77, 77}));
     EXPECT_EQ(band0, (bytes{3, 4, 9, 10}));
 }
+
+// The file may end anywhere in a tile. Each of its bytes goes to a plane, and nothing else does.
+TEST(InterleavedTiles, AreSplitToTheByteInWhichTheFileEnds)
+{
+    const bytes tile{1, 2, 3, 4, 5, 6, 7, 8, 9, 10, 11, 12};
+    for (std::size_t length = 0; length <= tile.size(); ++length) {
+        bytes band0(6), band1(6), merged(12);
+        img_std_split_bytes(tile.data(), length, 2, 2, {0, 1}, {band0.data(), band1.data()});
+        img_std_merge_tile(2, {0, 1}, {band0.data(), band1.data()}, 3, 1, 2, merged.data());
+        bytes expected = tile;
+        std::fill(expected.begin() + static_cast<std::ptrdiff_t>(length), expected.end(),
+                  std::uint8_t{0});
+        EXPECT_EQ(merged, expected);
+    }
+}

@@ -8,7 +8,7 @@ namespace {
 
 class TiledWrites : public FileTest {
 protected:
-    // Opens an image of two tiles, of which the file holds the first: all 9.
+    // Opens an image of two tiles. The file ends after the first, whose samples are all 9.
     img_handle open_half(const std::string &name)
     {
         const img_handle handle = create_test_file(name, {8, 16, 1, 1, 8, 8, IMG_LAYOUT_TILED});

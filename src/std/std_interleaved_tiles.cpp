@@ -5,18 +5,22 @@
 #include "base/count.h"
 #include "std/std_samples.h"
 
+#include <algorithm>
+
 void img_std_split_bytes(const std::uint8_t *tile, std::size_t length, std::int32_t nbytes,
                          std::int32_t nbands, const img_std_band_map &band_map,
                          const img_std_planes &planes)
 {
     const std::size_t width = img_count(nbytes);
     const std::size_t pixel = img_count(nbands) * width;
+    const std::size_t pixels = length / pixel;
     for (std::size_t position = 0; position < img_count(nbands); ++position) {
         std::uint8_t *const plane = planes[img_count(band_map[position])];
-        const std::size_t sample_end = (position + 1) * width;
-        if (plane == nullptr || length < sample_end) continue;
-        img_std_copy_samples(tile + position * width, pixel, plane, width,
-                             (length - sample_end) / pixel + 1, nbytes, false);
+        if (plane == nullptr) continue;
+        const std::size_t first = position * width;
+        img_std_copy_samples(tile + first, pixel, plane, width, pixels, nbytes, false);
+        const std::uint8_t *const last = tile + std::min(pixels * pixel + first, length);
+        std::copy_n(last, std::min(img_count(tile + length - last), width), plane + pixels * width);
     }
 }
 
