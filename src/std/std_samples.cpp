@@ -30,14 +30,50 @@ void copy_spaced(const std::uint8_t *source, std::size_t source_step, std::uint8
         std::memcpy(target + i * target_step, source + i * source_step, Nbytes);
 }
 
-// Prefetches bytes that are read soon. Rows on pages of their own are out of reach of the
-// processor's own prefetching.
-void prefetch(const std::uint8_t *bytes, std::size_t count)
+// Copies `count` bytes, of which there is at least one block, in blocks that are vectors. The last
+// one may overlap the one before.
+template <std::size_t Block>
+inline void copy_blocks(const std::uint8_t *source, std::uint8_t *target, std::size_t count)
+{
+    const std::size_t last = count - Block;
+    for (std::size_t i = 0; i < last; i += Block) std::memcpy(target + i, source + i, Block);
+    std::memcpy(target + last, source + last, Block);
+}
+
+// Rows of at most so many bytes are copied without a call.
+constexpr std::size_t short_row = 256;
+
+inline void copy_short_row(const std::uint8_t *source, std::uint8_t *target, std::size_t count)
+{
+    if (count >= 64)
+        copy_blocks<64>(source, target, count);
+    else if (count >= 16)
+        copy_blocks<16>(source, target, count);
+    else if (count >= 8)
+        copy_blocks<8>(source, target, count);
+    else
+        std::memcpy(target, source, count);
+}
+
+// Calls `copy(source, target)` for each row, and prefetches the rows that follow soon. Rows on
+// pages of their own are out of reach of the processor's own prefetching.
+template <typename Copy>
+inline void copy_each_row(const img_std_rows &rows, std::uint8_t *target, std::size_t target_pitch,
+                          std::size_t nrows, std::size_t row_length, Copy copy)
 {
     constexpr std::size_t cache_line = 64;
-    constexpr std::size_t most = 2048;
-    for (std::size_t offset = 0; offset < std::min(count, most); offset += cache_line)
-        __builtin_prefetch(bytes + offset);
+    constexpr std::size_t bytes_ahead = 4096;
+    constexpr std::size_t most_rows_ahead = 16;
+    const std::size_t ahead =
+        std::clamp<std::size_t>(bytes_ahead / (row_length + 1), 1, most_rows_ahead);
+    const std::size_t prefetched = std::min(row_length, bytes_ahead / 2);
+    for (std::size_t row = 0; row < nrows; ++row) {
+        const std::uint8_t *const source = rows.first + row * rows.pitch;
+        if (row + ahead < nrows)
+            for (std::size_t i = 0; i < prefetched; i += cache_line)
+                __builtin_prefetch(source + ahead * rows.pitch + i);
+        copy(source, target + row * target_pitch);
+    }
 }
 
 }  // namespace
@@ -85,13 +121,16 @@ void img_std_copy_rows(const img_std_rows &rows, std::uint8_t *target, std::size
         nrows = std::min<std::size_t>(nrows, 1);
     }
     const std::size_t row_length = rows.step * nsamps;
-    constexpr std::size_t bytes_ahead = 4096;
-    constexpr std::size_t most_rows_ahead = 16;
-    const std::size_t ahead =
-        std::clamp<std::size_t>(bytes_ahead / (row_length + 1), 1, most_rows_ahead);
-    for (std::size_t row = 0; row < nrows; ++row) {
-        if (row + ahead < nrows) prefetch(rows.first + (row + ahead) * rows.pitch, row_length);
-        img_std_copy_samples(rows.first + row * rows.pitch, rows.step, target + row * target_pitch,
-                             width, nsamps, nbytes, exchange);
+    if (rows.step == width && !exchange && row_length <= short_row) {
+        copy_each_row(rows, target, target_pitch, nrows, row_length,
+                      [row_length](const std::uint8_t *source, std::uint8_t *row) {
+                          copy_short_row(source, row, row_length);
+                      });
+    } else {
+        copy_each_row(rows, target, target_pitch, nrows, row_length,
+                      [&](const std::uint8_t *source, std::uint8_t *row) {
+                          img_std_copy_samples(source, rows.step, row, width, nsamps, nbytes,
+                                               exchange);
+                      });
     }
 }
