@@ -19,20 +19,20 @@ bool is_stretch_width(std::int32_t bits)
     return bits >= 1 && bits <= MAX_BITS;
 }
 
-// Counts every fourth sample of each line. Samples without a counter are counted as the last one
-// and taken off again: a branch would be mispredicted where many lie beyond the stated bits.
+// Counters behind the histogram, for samples beyond the stated bits: a branch would be
+// mispredicted, and one counter for all of them would be waited for at each sample.
+constexpr std::size_t SPARE_COUNTERS = 4;
+
+// Counts every fourth sample of each line in a histogram of `size` counters and the spare ones.
 template <typename Sample>
 void count_samples(const std::uint8_t *buffer, const img_buffer_def &def, std::uint32_t *histogram,
                    std::size_t size)
 {
     constexpr std::size_t step = 4;
-    const std::size_t last = size - 1;
-    std::uint32_t beyond = 0;
-    const auto count = [&beyond, histogram, last](const std::uint8_t *sample) {
+    const auto count = [histogram, size](const std::uint8_t *sample, std::size_t spare) {
         Sample value;
         std::memcpy(&value, sample, sizeof value);
-        ++histogram[std::min<std::size_t>(value, last)];
-        beyond += value > last ? 1 : 0;
+        ++histogram[std::min<std::size_t>(value, size + spare)];
     };
     const auto line_length = img_count(def.stride) * sizeof(Sample);
     const auto nlines = img_count(std::max(def.nlines, 0));
@@ -41,14 +41,13 @@ void count_samples(const std::uint8_t *buffer, const img_buffer_def &def, std::u
         const std::uint8_t *sample = buffer + line * line_length;
         std::size_t left = ncounted;
         for (; left >= 4; left -= 4, sample += 4 * step * sizeof(Sample)) {
-            count(sample);
-            count(sample + step * sizeof(Sample));
-            count(sample + 2 * step * sizeof(Sample));
-            count(sample + 3 * step * sizeof(Sample));
+            count(sample, 0);
+            count(sample + step * sizeof(Sample), 1);
+            count(sample + 2 * step * sizeof(Sample), 2);
+            count(sample + 3 * step * sizeof(Sample), 3);
         }
-        for (; left > 0; --left, sample += step * sizeof(Sample)) count(sample);
+        for (; left > 0; --left, sample += step * sizeof(Sample)) count(sample, 0);
     }
-    histogram[last] -= beyond;
 }
 
 struct cut {
@@ -123,10 +122,10 @@ std::int32_t img_chain_create_stretch_lut_from_buffer(const std::uint8_t *buffer
                                    .size = static_cast<std::int32_t>(size),
                                    .lut = lut,
                                    .owned = 0};
-    const img_scratch counters = img_take_scratch(size * sizeof(std::uint32_t));
+    const img_scratch counters = img_take_scratch((size + SPARE_COUNTERS) * sizeof(std::uint32_t));
     if (!counters) return img_fail_errno("img_chain_create_stretch_lut_from_buffer:calloc");
     auto *const histogram = reinterpret_cast<std::uint32_t *>(counters.get());
-    std::fill_n(histogram, size, 0U);
+    std::fill_n(histogram, size + SPARE_COUNTERS, 0U);
     if (def->nbytes == 2)
         count_samples<std::uint16_t>(buffer, *def, histogram, size);
     else
