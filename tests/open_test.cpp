@@ -125,3 +125,41 @@ TEST_F(Open, GivesImagesOfOneByteIdentityTablesAndThoseOfTwoTheStretch)
             img_closefile(seen.result);
         }
 }
+
+TEST_F(Open, RawImagesShowStoredSamplesAndNeedNoHandle)
+{
+    const img_io_method *const fault = img_lookup_io_method("fault");
+    std::vector<img_raw_image> images;
+    const std::uint16_t sample = 0x1234;
+    for (int i = 0; i < IMG_MAX_HANDLES + 5; ++i) {
+        const std::string name = m_folder / ("@" + std::to_string(i));
+        images.push_back(img_create_raw(name.c_str(), i == 0 ? fault : nullptr, 3, 5, 1,
+                                        IMG_TYPE_VITEC, 0, 0, 2));
+        ASSERT_TRUE(images.back());
+        EXPECT_EQ(img_write_raw(images.back().get(), 2, 4, 1, 1, 0,
+                                reinterpret_cast<const std::uint8_t *>(&sample), 1),
+                  0);
+    }
+    images.clear();
+    const std::string name = m_folder / "@7";
+    images.push_back(img_open_raw(name.c_str(), nullptr, IMG_OPEN_READ_ONLY));
+    std::array<std::uint16_t, 2> stored{};
+    EXPECT_EQ(img_read_raw(images[0].get(), 2, 3, 1, 2, 0,
+                           reinterpret_cast<std::uint8_t *>(stored.data()), 2),
+              0);
+    EXPECT_EQ(stored, (std::array<std::uint16_t, 2>{0, sample}));
+
+    const auto fails = [](const img_raw_image &image, int error) {
+        EXPECT_TRUE(!image && errno == error) << errno;
+    };
+    fails(img_open_raw((m_folder / "").c_str(), nullptr, IMG_OPEN_READ_ONLY), EINVAL);
+    fails(img_create_raw(m_file.c_str(), nullptr, 3, 5, 1, IMG_TYPE_HELAVA, 0, 0, 2), EINVAL);
+    fails(img_create_raw(m_file.c_str(), nullptr, 3, 5, 1, IMG_NO_TYPE, 0, 0, 1), EINVAL);
+    fails(img_create_raw((m_folder / "no/scene").c_str(), nullptr, 3, 5, 1, 0, 0, 0, 1), ENOENT);
+    for (const int nth : {1, 2}) {
+        memory_arm(nth);
+        fails(img_open_raw(name.c_str(), nullptr, IMG_OPEN_READ_ONLY), ENOMEM);
+        memory_arm(nth);
+        fails(img_create_raw(name.c_str(), nullptr, 3, 5, 1, 0, 0, 0, 1), ENOMEM);
+    }
+}

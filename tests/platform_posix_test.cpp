@@ -99,7 +99,7 @@ TEST_F(Platform, AsksForTheHeadOfAFileOnce)
     std::filesystem::resize_file(m_file, 100);
     expect(0, 100, bytes(content.begin(), content.begin() + 100));
     img_platform_close(fd);
-    std::vector<std::int32_t> all(65);
+    std::vector<std::int32_t> all(IMG_MAX_PLATFORM_FILES + 1);
     for (std::int32_t &each : all) each = img_platform_open(m_file.c_str(), 0, 0);
     EXPECT_EQ(std::pair(all.back(), errno), (std::pair{-1, EMFILE}));
     for (const std::int32_t each : all) img_platform_close(each);

@@ -209,6 +209,14 @@ struct new_geometry {
     std::int32_t nlines, nsamps, nbands, type, tile_nsamps, tile_nlines, nbytes;
 };
 
+void set_geometry(img_desc *desc, const new_geometry &geometry)
+{
+    desc->type = geometry.type;
+    img_set_image_params(desc, geometry.nlines, geometry.nsamps, geometry.tile_nsamps,
+                         geometry.tile_nlines, geometry.nbands, geometry.nbytes, /*nbits=*/-1,
+                         IMG_LAYOUT_DEFAULT, /*lut_size=*/0, nullptr, nullptr, nullptr);
+}
+
 img_handle create_image(const image_name &name, new_geometry geometry)
 {
     const img_call call;
@@ -222,16 +230,25 @@ img_handle create_image(const image_name &name, new_geometry geometry)
 
     img_desc *const desc = allocate_image(name, CREATE_FLAGS);
     if (desc == nullptr) return -1;
-    desc->type = geometry.type;
-    img_set_image_params(desc, geometry.nlines, geometry.nsamps, geometry.tile_nsamps,
-                         geometry.tile_nlines, geometry.nbands, geometry.nbytes, /*nbits=*/-1,
-                         IMG_LAYOUT_DEFAULT, /*lut_size=*/0, nullptr, nullptr, nullptr);
+    set_geometry(desc, geometry);
     if (img_init_luts(desc) == -1) return release_without_memory(desc);
     if (type.create == nullptr || type.create(desc) == -1) {
         release_image(desc, 0);
         return img_fail("img_createfile: could not create %s!\n", name.text);
     }
     return finish_opening(desc);
+}
+
+// Returns the record of an image without a handle, or null with errno set.
+img_raw_image new_raw_record(const char *filename, const img_io_method *method, std::int32_t flags)
+{
+    img_library_init();
+    img_raw_image image(new_record(/*handle=*/-1, flags | IMG_OPEN_BINARY));
+    if (image &&
+        give_name(image.get(), {.text = filename, .is_plain = true, .method = method}) == 0)
+        return image;
+    errno = ENOMEM;
+    return nullptr;
 }
 
 }  // namespace
@@ -295,4 +312,56 @@ std::int32_t img_closefile(img_handle handle)
     // Only now may another image get the handle.
     img_give_back_handle(handle);
     return 0;
+}
+
+void img_raw_close::operator()(img_desc *desc) const
+{
+    const img_call call;
+    if (img_type_of(desc).close != nullptr) img_type_of(desc).close(desc);
+    delete desc;
+}
+
+img_raw_image img_open_raw(const char *filename, const img_io_method *method, std::int32_t flags)
+{
+    const img_call call;
+    img_raw_image image = new_raw_record(filename, method, flags);
+    if (!image || open_as_some_type(image.get())) return image;
+    image.reset();
+    errno = INVALID_ARGUMENT;
+    return nullptr;
+}
+
+img_raw_image img_create_raw(const char *filename, const img_io_method *method, std::int32_t nlines,
+                             std::int32_t nsamps, std::int32_t nbands, std::int32_t type,
+                             std::int32_t tile_nsamps, std::int32_t tile_nlines,
+                             std::int32_t nbytes)
+{
+    const img_call call;
+    img_raw_image image = new_raw_record(filename, method, CREATE_FLAGS);
+    if (!image) return nullptr;
+    set_geometry(image.get(), {nlines, nsamps, nbands, type, tile_nsamps, tile_nlines, nbytes});
+    errno = 0;
+    const img_type_desc &type_of_file = img_type_of(image.get());
+    if (type_of_file.create != nullptr && type_of_file.create(image.get()) != -1) return image;
+    const int error = errno != 0 ? errno : INVALID_ARGUMENT;
+    image.reset();
+    errno = error;
+    return nullptr;
+}
+
+std::int32_t img_read_raw(img_desc *desc, std::int32_t line, std::int32_t samp, std::int32_t nlines,
+                          std::int32_t nsamps, std::int32_t band, std::uint8_t *buffer,
+                          std::int32_t stride)
+{
+    const img_call call;
+    return img_type_of(desc).read(desc, line, samp, nlines, nsamps, band, buffer, stride);
+}
+
+std::int32_t img_write_raw(img_desc *desc, std::int32_t line, std::int32_t samp,
+                           std::int32_t nlines, std::int32_t nsamps, std::int32_t band,
+                           const std::uint8_t *buffer, std::int32_t stride)
+{
+    const img_call call;
+    return img_type_of(desc).write(desc, line, samp, nlines, nsamps, band, buffer, stride,
+                                   /*fill=*/nullptr);
 }

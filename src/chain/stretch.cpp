@@ -19,8 +19,9 @@ bool is_stretch_width(std::int32_t bits)
     return bits >= 1 && bits <= MAX_BITS;
 }
 
-// Counters behind the histogram, for samples beyond the stated bits: a branch would be
-// mispredicted, and one counter for all of them would be waited for at each sample.
+// Samples beyond the stated bits are counted behind the histogram, for a branch would be
+// mispredicted. They take turns with four counters: with one, each increment would wait for the one
+// before.
 constexpr std::size_t SPARE_COUNTERS = 4;
 
 // Counts every fourth sample of each line in a histogram of `size` counters and the spare ones.
@@ -29,6 +30,7 @@ void count_samples(const std::uint8_t *buffer, const img_buffer_def &def, std::u
                    std::size_t size)
 {
     constexpr std::size_t step = 4;
+    constexpr std::size_t pitch = step * sizeof(Sample);
     const auto count = [histogram, size](const std::uint8_t *sample, std::size_t spare) {
         Sample value;
         std::memcpy(&value, sample, sizeof value);
@@ -38,15 +40,16 @@ void count_samples(const std::uint8_t *buffer, const img_buffer_def &def, std::u
     const auto nlines = img_count(std::max(def.nlines, 0));
     const auto ncounted = (img_count(std::max(def.nsamps, 0)) + step - 1) / step;
     for (std::size_t line = 0; line < nlines; ++line) {
-        const std::uint8_t *sample = buffer + line * line_length;
-        std::size_t left = ncounted;
-        for (; left >= 4; left -= 4, sample += 4 * step * sizeof(Sample)) {
+        const std::uint8_t *const first = buffer + line * line_length;
+        std::size_t i = 0;
+        for (; i + 4 <= ncounted; i += 4) {
+            const std::uint8_t *const sample = first + i * pitch;
             count(sample, 0);
-            count(sample + step * sizeof(Sample), 1);
-            count(sample + 2 * step * sizeof(Sample), 2);
-            count(sample + 3 * step * sizeof(Sample), 3);
+            count(sample + pitch, 1);
+            count(sample + 2 * pitch, 2);
+            count(sample + 3 * pitch, 3);
         }
-        for (; left > 0; --left, sample += step * sizeof(Sample)) count(sample, 0);
+        for (; i < ncounted; ++i) count(first + i * pitch, 0);
     }
 }
 

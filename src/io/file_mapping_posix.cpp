@@ -175,7 +175,8 @@ void img_file_mapping::drop()
     m_has_fine_timestamps = m_cannot_map = false;
 }
 
-// Lends bytes of a file that had the status `before` at some time; false if it has another one.
+// Lends bytes if the file has the status `before`, seen earlier, until `use` has returned. False as
+// for lend().
 bool img_file_mapping::lend_since(const status &before, int fd, std::int32_t offset,
                                   std::int64_t end, img_io_use_fn use, void *arg)
 {
@@ -198,7 +199,7 @@ bool img_file_mapping::lend(int fd, std::int32_t offset, std::int32_t count, boo
 {
     const std::int64_t end = std::int64_t{offset} + count;
     if (m_cannot_map || offset < 0 || count < 1) return false;
-    // The identity of the file is known once it is mapped.
+    // The identity of the file is known once it is mapped. A refusal may be out of date, too.
     if (discards && m_view.load(std::memory_order_acquire) != NO_VIEW) {
         const status known{.change = m_settled_change.load(std::memory_order_acquire),
                            .length = m_settled_length,

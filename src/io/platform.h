@@ -15,7 +15,7 @@
 #include <cstddef>
 #include <cstdint>
 
-inline constexpr std::size_t IMG_MAX_PLATFORM_FILES = 64;
+inline constexpr std::size_t IMG_MAX_PLATFORM_FILES = 1024;
 
 std::int32_t img_platform_open(const char *filename, std::int32_t oflags, std::int32_t mode);
 std::int32_t img_platform_close(std::int32_t fd);

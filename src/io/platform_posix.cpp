@@ -43,13 +43,21 @@ constexpr std::int32_t RESERVED = -1;      // an entry that an open fills in
 std::array<std::atomic<std::int32_t>, IMG_MAX_PLATFORM_FILES> descriptors{};
 std::array<open_file, IMG_MAX_PLATFORM_FILES> open_files;  // entry i belongs to descriptors[i]
 
+// The entry of a descriptor is the first free one from this index on.
+std::size_t first_index(std::int32_t fd)
+{
+    return static_cast<std::size_t>(fd) % descriptors.size();
+}
+
 // Returns the index of a descriptor of an open file; the number of entries if it has none.
 std::size_t find_index(std::int32_t fd)
 {
-    std::size_t index = 0;
-    while (index < descriptors.size() && descriptors[index].load(std::memory_order_acquire) != fd)
-        ++index;
-    return index;
+    std::size_t index = first_index(fd);
+    for (std::size_t i = 0; i < descriptors.size(); ++i) {
+        if (descriptors[index].load(std::memory_order_acquire) == fd) return index;
+        index = (index + 1) % descriptors.size();
+    }
+    return descriptors.size();
 }
 
 // Returns the open file of a descriptor, or null with errno set.
@@ -61,12 +69,15 @@ open_file *find_file(std::int32_t fd)
     return nullptr;
 }
 
-// Returns the index of a free entry, which is reserved; the number of entries if none is free.
-std::size_t reserve_entry()
+// Returns the index of the entry for a descriptor, which is reserved; the number of entries if none
+// is free.
+std::size_t reserve_entry(std::int32_t fd)
 {
-    for (std::size_t index = 0; index < descriptors.size(); ++index) {
+    std::size_t index = first_index(fd);
+    for (std::size_t i = 0; i < descriptors.size(); ++i) {
         std::int32_t free = NO_DESCRIPTOR;
         if (descriptors[index].compare_exchange_strong(free, RESERVED)) return index;
+        index = (index + 1) % descriptors.size();
     }
     return descriptors.size();
 }
@@ -179,7 +190,7 @@ std::int32_t img_platform_open(const char *filename, std::int32_t oflags, std::i
     struct stat status;
     if (::fstat(fd, &status) == -1) return close_and_fail(fd, errno);
     if (!S_ISREG(status.st_mode) && !S_ISBLK(status.st_mode)) return close_and_fail(fd, EINVAL);
-    const std::size_t index = reserve_entry();
+    const std::size_t index = reserve_entry(fd);
     if (index == open_files.size()) return close_and_fail(fd, EMFILE);
     open_file &file = open_files[index];  // field by field: its head need not be cleared
     file.fd = fd;

@@ -23,8 +23,8 @@ void img_std_merge_tile(std::int32_t nbands, const img_std_band_map &band_map,
                         const img_std_const_planes &planes, std::int32_t tile_nsamps,
                         std::int32_t tile_nlines, std::int32_t nbytes, std::uint8_t *tile);
 
-// Splits the first `length` bytes of a tile, the file's last one. Of a two-byte sample in which the
-// file ends, the first byte is copied: a write of another band stores it again.
+// Splits a tile of which only the first `length` bytes are there. Where they end inside a two-byte
+// sample, its first byte is copied, too: a write of another band stores it again.
 void img_std_split_bytes(const std::uint8_t *tile, std::size_t length, std::int32_t nbytes,
                          std::int32_t nbands, const img_std_band_map &band_map,
                          const img_std_planes &planes);

@@ -30,8 +30,8 @@ void copy_spaced(const std::uint8_t *source, std::size_t source_step, std::uint8
         std::memcpy(target + i * target_step, source + i * source_step, Nbytes);
 }
 
-// Copies `count` bytes, of which there is at least one block, in blocks that are vectors. The last
-// one may overlap the one before.
+// Copies `count` bytes, at least `Block`, in blocks of that size: each is one vector move or a few.
+// The last block may overlap the one before.
 template <std::size_t Block>
 inline void copy_blocks(const std::uint8_t *source, std::uint8_t *target, std::size_t count)
 {
@@ -40,8 +40,8 @@ inline void copy_blocks(const std::uint8_t *source, std::uint8_t *target, std::s
     std::memcpy(target + last, source + last, Block);
 }
 
-// Rows of at most so many bytes are copied without a call.
-constexpr std::size_t short_row = 256;
+// Rows of 8 to so many bytes are copied without a call.
+constexpr std::size_t SHORT_ROW = 256;
 
 inline void copy_short_row(const std::uint8_t *source, std::uint8_t *target, std::size_t count)
 {
@@ -121,7 +121,7 @@ void img_std_copy_rows(const img_std_rows &rows, std::uint8_t *target, std::size
         nrows = std::min<std::size_t>(nrows, 1);
     }
     const std::size_t row_length = rows.step * nsamps;
-    if (rows.step == width && !exchange && row_length <= short_row) {
+    if (rows.step == width && !exchange && row_length <= SHORT_ROW) {
         copy_each_row(rows, target, target_pitch, nrows, row_length,
                       [row_length](const std::uint8_t *source, std::uint8_t *row) {
                           copy_short_row(source, row, row_length);

@@ -148,6 +148,7 @@ std::int32_t read_interleaved(img_desc *desc, std::int32_t first_tile, std::int3
     if (got == length) return 0;
     img_std_planes planes{};  // of the tile in which the file ends
     planes[img_count(band)] = buffer;
+    if (mode.missed == nullptr) left -= left % img_count(desc->nbytes);  // half of a sample
     img_std_split_bytes(pixels, left, desc->nbytes, desc->nbands, desc->band_map, planes);
     return -1;
 }

@@ -51,7 +51,7 @@ int __wrap_open(const char *name, int flags, mode_t mode)
 
 ssize_t __wrap_pread(int fd, void *buffer, std::size_t count, off_t position)
 {
-    ++host.reads;
+    ++ordinary_reads;
     return interruptible(
         count, [=](std::size_t part) { return __real_pread(fd, buffer, part, position); });
 }

@@ -18,12 +18,13 @@ struct fault_host {
     int writes_left = 0;       // the process ends at the last of them; 0: it does not
     bool half_done = false;    // that one moves half of what it should
     int last_words = 0;        // what the process returns then
-    int reads = 0;         // ordinary reads so far
     int seconds_later = 1;     // than it is: what others wrote a moment ago counts as old
     std::function<void()> after_sigaction = nullptr;  // called once
     long stamp = 0, now = 0;  // of all files, and of the clock, in nanoseconds; 0: as it is
 };
 inline fault_host host;
+
+inline thread_local int ordinary_reads = 0;  // of the library, in this thread
 
 // Returns what `action` does with a resource of the process limited.
 template <typename Action>

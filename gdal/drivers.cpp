@@ -1,0 +1,344 @@
+// Opening, creating and copying images for GDAL. Read drivers.h and image_dataset.h first.
+#include "drivers.h"
+
+#include "image_dataset.h"
+#include "library_messages.h"
+#include "storage.h"
+
+#include "base/img_desc.h"
+#include "formats/vitec.h"
+#include "std/std.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <memory>
+#include <string>
+
+namespace {
+
+constexpr int DEFAULT_TILE = 256;
+constexpr int ROWS_OF_A_COPY = 1 << 22;  // bytes of untiled lines that are copied at a time
+
+// Ends `filename` on request, so that work that failed leaves no file.
+class unfinished_file {
+public:
+    explicit unfinished_file(std::string filename) : m_filename(std::move(filename)) {}
+    ~unfinished_file()
+    {
+        if (!m_filename.empty()) VSIUnlink(m_filename.c_str());
+    }
+    unfinished_file(const unfinished_file &) = delete;
+    unfinished_file &operator=(const unfinished_file &) = delete;
+
+    void keep() { m_filename.clear(); }
+
+private:
+    std::string m_filename;
+};
+
+std::nullptr_t fail(const image_format &format, const char *filename, CPLErrorNum number,
+                    const std::string &text)
+{
+    CPLError(CE_Failure, number, "%s: %s: %s", format.name, filename, text.c_str());
+    return nullptr;
+}
+
+// --- Opening ---
+
+std::unique_ptr<image_dataset> open_image(const image_format &format, const char *filename,
+                                          GDALAccess access)
+{
+    const library_messages messages;
+    const bool updates = access == GA_Update;
+    // A file opened for writing is completed when it is closed: look at it before.
+    img_raw_image image = img_open_raw(filename, storage_of(filename), IMG_OPEN_READ_ONLY);
+    if (!image || image->type != format.type)
+        return fail(format, filename, CPLE_OpenFailed,
+                    "has a header that describes no readable image");
+    if (image->nlines == 0 || image->nsamps == 0 || image->nbands == 0)
+        return fail(format, filename, CPLE_OpenFailed, "is an image without samples");
+    if (updates) {
+        if (image->std_file->veof < whole_length(*image))
+            return fail(format, filename, CPLE_OpenFailed,
+                        "is truncated, and cannot be opened for update");
+        errno = 0;
+        image = img_open_raw(filename, storage_of(filename), IMG_OPEN_READ_WRITE);
+        if (!image) return fail(format, filename, CPLE_OpenFailed, "cannot be opened for update");
+    }
+    return std::make_unique<image_dataset>(format.name, filename, std::move(image), access);
+}
+
+GDALDataset *open_format(const image_format &format, GDALOpenInfo *info)
+{
+    if (info->fpL == nullptr || format.identify(info) == FALSE) return nullptr;
+    std::unique_ptr<image_dataset> dataset = open_image(format, info->pszFilename, info->eAccess);
+    if (!dataset) return nullptr;
+    dataset->load_side_files(info);
+    return dataset.release();
+}
+
+GDALDataset *open_vitec(GDALOpenInfo *info)
+{
+    return open_format(vitec_format, info);
+}
+
+GDALDataset *open_helava(GDALOpenInfo *info)
+{
+    return open_format(helava_format, info);
+}
+
+// --- Creating ---
+
+// Width and height of tiles; 0: none.
+struct tiling {
+    int width = 0, height = 0;
+};
+
+bool read_side(const image_format &format, const char *filename, char **options, const char *key,
+               int *side)
+{
+    const char *const stated = CSLFetchNameValue(options, key);
+    if (stated == nullptr) return true;
+    *side = std::atoi(stated);
+    if (img_vitec_is_tile_size(*side)) return true;
+    fail(format, filename, CPLE_IllegalArg,
+         std::string(key) + "=" + stated + ": tiles have powers of two from " +
+             std::to_string(IMG_VITEC_MIN_TILE) + " to " + std::to_string(IMG_VITEC_MAX_TILE));
+    return false;
+}
+
+// Reads the creation options. Returns false after an error.
+bool read_options(const image_format &format, const char *filename, char **options, tiling *tiles)
+{
+    if (!format.has_tiles) return true;
+    const bool has_side = CSLFetchNameValue(options, "BLOCKXSIZE") != nullptr ||
+                          CSLFetchNameValue(options, "BLOCKYSIZE") != nullptr;
+    if (!CPLFetchBool(options, "TILED", has_side)) return true;
+    *tiles = {DEFAULT_TILE, DEFAULT_TILE};
+    return read_side(format, filename, options, "BLOCKXSIZE", &tiles->width) &&
+           read_side(format, filename, options, "BLOCKYSIZE", &tiles->height);
+}
+
+// Returns what the format cannot hold; empty if it holds the image.
+std::string refusal(const image_format &format, int nbands, GDALDataType type)
+{
+    if (nbands < 1) return "holds at least one band";
+    if (nbands > format.most_bands)
+        return "holds at most " + std::to_string(format.most_bands) + " bands, not " +
+               std::to_string(nbands);
+    if (type == GDT_Byte || (type == GDT_UInt16 && format.has_two_bytes)) return "";
+    return std::string("holds samples of type ") +
+           (format.has_two_bytes ? "Byte and UInt16" : "Byte") + ", not " +
+           GDALGetDataTypeName(type);
+}
+
+// Creates a file of zeros in its full length. Returns false after an error; no file is left then.
+bool create_file(const image_format &format, const char *filename, int nsamps, int nlines,
+                 int nbands, GDALDataType type, char **options)
+{
+    if (const std::string reason = refusal(format, nbands, type); !reason.empty())
+        return fail(format, filename, CPLE_NotSupported, "the format " + reason) != nullptr;
+    tiling tiles;
+    if (!read_options(format, filename, options, &tiles)) return false;
+    const int nbytes = GDALGetDataTypeSizeBytes(type);
+    const auto padded = [](std::int64_t extent, int side) {
+        return side == 0 ? extent : (extent + side - 1) / side * side;
+    };
+    if (padded(nlines, tiles.height) * padded(nsamps, tiles.width) >
+        INT32_MAX / nbytes / nbands - IMG_VITEC_DATA_OFFSET)
+        return fail(format, filename, CPLE_NotSupported, "the file would have 2 GiB or more") !=
+               nullptr;
+
+    const library_messages messages;
+    unfinished_file file(filename);
+    errno = 0;
+    img_raw_image image = img_create_raw(filename, storage_of(filename), nlines, nsamps, nbands,
+                                         format.type, tiles.width, tiles.height, nbytes);
+    if (!image)
+        return fail(format, filename, CPLE_OpenFailed,
+                    "cannot be created: " + std::string(std::strerror(errno))) != nullptr;
+    const std::int64_t expected = whole_length(*image);
+    take_close_error();
+    image.reset();  // completes the file
+    VSIStatBufL status;
+    if (take_close_error() != 0 || VSIStatL(filename, &status) != 0 || status.st_size != expected)
+        return fail(format, filename, CPLE_FileIO, "cannot be created: not enough room") != nullptr;
+    file.keep();
+    return true;
+}
+
+std::unique_ptr<image_dataset> create_image(const image_format &format, const char *filename,
+                                            int nsamps, int nlines, int nbands, GDALDataType type,
+                                            char **options)
+{
+    if (!create_file(format, filename, nsamps, nlines, nbands, type, options)) return nullptr;
+    std::unique_ptr<image_dataset> dataset = open_image(format, filename, GA_Update);
+    if (dataset) dataset->SetDescription(filename);
+    return dataset;
+}
+
+GDALDataset *create_vitec(const char *filename, int nsamps, int nlines, int nbands,
+                          GDALDataType type, char **options)
+{
+    return create_image(vitec_format, filename, nsamps, nlines, nbands, type, options).release();
+}
+
+GDALDataset *create_helava(const char *filename, int nsamps, int nlines, int nbands,
+                           GDALDataType type, char **options)
+{
+    return create_image(helava_format, filename, nsamps, nlines, nbands, type, options).release();
+}
+
+// --- Copying ---
+
+// Something of the source that the copy will not have: an error where the caller is strict, else a
+// warning. Returns false when the copy must not be made.
+bool accept_loss(const image_format &format, const char *filename, bool is_strict,
+                 const std::string &what)
+{
+    CPLError(is_strict ? CE_Failure : CE_Warning, CPLE_NotSupported, "%s: %s: %s", format.name,
+             filename, what.c_str());
+    return !is_strict;
+}
+
+// Returns the type in which the source is stored, GDT_Unknown after an error.
+GDALDataType stored_type(const image_format &format, const char *filename, GDALDataset *source,
+                         bool is_strict)
+{
+    GDALDataType type = source->GetRasterBand(1)->GetRasterDataType();
+    for (int band = 2; band <= source->GetRasterCount(); ++band)
+        type = GDALDataTypeUnion(type, source->GetRasterBand(band)->GetRasterDataType());
+    if (refusal(format, 1, type).empty()) return type;
+    const GDALDataType nearest = format.has_two_bytes ? GDT_UInt16 : GDT_Byte;
+    const std::string what = std::string("samples of type ") + GDALGetDataTypeName(type) +
+                             " are stored as " + GDALGetDataTypeName(nearest);
+    return accept_loss(format, filename, is_strict, what) ? nearest : GDT_Unknown;
+}
+
+bool accept_source(const image_format &format, const char *filename, GDALDataset *source,
+                   bool is_strict)
+{
+    for (int band = 1; band <= source->GetRasterCount(); ++band) {
+        GDALRasterBand *const each = source->GetRasterBand(band);
+        if (each->GetColorTable() != nullptr &&
+            !accept_loss(format, filename, is_strict, "the colour table is not kept"))
+            return false;
+        if ((each->GetMaskFlags() & ~(GMF_ALL_VALID | GMF_NODATA | GMF_ALPHA | GMF_PER_DATASET)) !=
+                0 ||
+            each->GetMaskFlags() == GMF_PER_DATASET) {
+            if (!accept_loss(format, filename, is_strict, "the mask is not kept")) return false;
+            break;
+        }
+    }
+    return true;
+}
+
+// Copies all samples, one row of blocks at a time. Returns false after an error or a cancel.
+bool copy_samples(GDALDataset *source, image_dataset *copy, GDALDataType type,
+                  GDALProgressFunc progress, void *progress_data)
+{
+    const img_desc &image = copy->desc();
+    const std::int64_t line = std::int64_t{image.nsamps} * image.nbytes;
+    const int height =
+        img_is_tiled(&image)
+            ? image.tile_nlines
+            : static_cast<int>(std::clamp<std::int64_t>(ROWS_OF_A_COPY / line, 1, image.nlines));
+    const sample_buffer rows =
+        new_samples(std::min(height, image.nlines), image.nsamps, image.nbytes);
+    if (!rows) return false;
+    for (int first = 0; first < image.nlines; first += height) {
+        const int count = std::min(height, image.nlines - first);
+        for (int band = 0; band < image.nbands; ++band)
+            if (source->GetRasterBand(band + 1)->RasterIO(GF_Read, 0, first, image.nsamps, count,
+                                                          rows.get(), image.nsamps, count, type, 0,
+                                                          0, nullptr) != CE_None ||
+                copy->write(band, first, 0, count, image.nsamps, rows.get(), image.nsamps) !=
+                    CE_None)
+                return false;
+        if (progress(static_cast<double>(first + count) / image.nlines, "", progress_data) ==
+            FALSE) {
+            CPLError(CE_Failure, CPLE_UserInterrupt, "User terminated");
+            return false;
+        }
+    }
+    return true;
+}
+
+GDALDataset *copy_image(const image_format &format, const char *filename, GDALDataset *source,
+                        int strict, char **options, GDALProgressFunc progress, void *progress_data)
+{
+    const bool is_strict = strict != FALSE;
+    const int nbands = source->GetRasterCount();
+    if (progress == nullptr) progress = GDALDummyProgress;
+    if (const std::string reason = refusal(format, nbands, GDT_Byte); !reason.empty())
+        return fail(format, filename, CPLE_NotSupported, "the format " + reason);
+    const GDALDataType type = stored_type(format, filename, source, is_strict);
+    if (type == GDT_Unknown || !accept_source(format, filename, source, is_strict) ||
+        progress(0.0, "", progress_data) == FALSE)
+        return nullptr;
+    std::unique_ptr<image_dataset> copy =
+        create_image(format, filename, source->GetRasterXSize(), source->GetRasterYSize(), nbands,
+                     type, options);
+    if (!copy) return nullptr;
+    unfinished_file file(filename);
+    if (!copy_samples(source, copy.get(), type, progress, progress_data)) {
+        copy.reset();
+        return nullptr;
+    }
+    copy->CloneInfo(source, GCIF_PAM_DEFAULT);
+    file.keep();
+    return copy.release();
+}
+
+GDALDataset *copy_to_vitec(const char *filename, GDALDataset *source, int strict, char **options,
+                           GDALProgressFunc progress, void *progress_data)
+{
+    return copy_image(vitec_format, filename, source, strict, options, progress, progress_data);
+}
+
+GDALDataset *copy_to_helava(const char *filename, GDALDataset *source, int strict, char **options,
+                            GDALProgressFunc progress, void *progress_data)
+{
+    return copy_image(helava_format, filename, source, strict, options, progress, progress_data);
+}
+
+constexpr char VITEC_OPTIONS[] =
+    "<CreationOptionList>"
+    "  <Option name='TILED' type='boolean' default='NO' description='Store the image in tiles'/>"
+    "  <Option name='BLOCKXSIZE' type='int' default='256' description='Width of a tile, a power of "
+    "two from 8 to 32768; sets TILED'/>"
+    "  <Option name='BLOCKYSIZE' type='int' default='256' description='Height of a tile, a power "
+    "of "
+    "two from 8 to 32768; sets TILED'/>"
+    "</CreationOptionList>";
+
+}  // namespace
+
+void register_format(const image_format &format)
+{
+    if (GDALGetDriverByName(format.name) != nullptr) return;
+    const bool is_vitec = &format == &vitec_format;
+    auto driver = std::make_unique<GDALDriver>();
+    driver->SetDescription(format.name);
+    driver->SetMetadataItem(GDAL_DMD_LONGNAME, format.long_name);
+    driver->SetMetadataItem(GDAL_DCAP_RASTER, "YES");
+    driver->SetMetadataItem(GDAL_DCAP_VIRTUALIO, "YES");
+    driver->SetMetadataItem(GDAL_DMD_CREATIONDATATYPES, is_vitec ? "Byte UInt16" : "Byte");
+    // Other formats have files of the name .img: theirs is the ending of an output file.
+    if (!is_vitec) driver->SetMetadataItem(GDAL_DMD_EXTENSION, "d");
+    if (is_vitec) driver->SetMetadataItem(GDAL_DMD_CREATIONOPTIONLIST, VITEC_OPTIONS);
+#ifdef GDAL_DCAP_UPDATE
+    driver->SetMetadataItem(GDAL_DCAP_UPDATE, "YES");
+#endif
+#ifdef GDAL_DMD_UPDATE_ITEMS
+    driver->SetMetadataItem(GDAL_DMD_UPDATE_ITEMS,
+                            "GeoTransform SRS GCPs NoData ColorInterpretation RasterValues "
+                            "DatasetMetadata BandMetadata");
+#endif
+    driver->pfnIdentify = format.identify;
+    driver->pfnOpen = is_vitec ? open_vitec : open_helava;
+    driver->pfnCreate = is_vitec ? create_vitec : create_helava;
+    driver->pfnCreateCopy = is_vitec ? copy_to_vitec : copy_to_helava;
+    GetGDALDriverManager()->RegisterDriver(driver.release());
+}

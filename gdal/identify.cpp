@@ -1,0 +1,79 @@
+// Telling whether a file is a VITec or a Helava image. GDAL asks for every file that any program
+// opens, so this must be quick, silent and sure: other formats have files of the same names. Read
+// drivers.h, formats/vitec.h and formats/helava.h first.
+#include "drivers.h"
+
+#include "formats/helava.h"
+#include "formats/vitec.h"
+
+#include <array>
+#include <cstring>
+#include <span>
+
+namespace {
+
+bool is_vitec_magic(std::uint32_t word)
+{
+    return word == IMG_VITEC_MAGIC || word == IMG_VITEC_SWAPPED_MAGIC;
+}
+
+bool is_helava_magic(std::uint32_t word)
+{
+    return word == IMG_HELAVA_MAGIC || word == IMG_HELAVA_SWAPPED_MAGIC;
+}
+
+// The version is looked at, too, if it lies in the bytes that GDAL has read already.
+int identify_vitec(GDALOpenInfo *info)
+{
+    if (info->nHeaderBytes < static_cast<int>(IMG_VITEC_FILE_BLOCK_SIZE)) return FALSE;
+    std::array<std::uint8_t, IMG_VITEC_FILE_BLOCK_SIZE> block;
+    std::memcpy(block.data(), info->pabyHeader, block.size());
+    const std::uint32_t magic = img_get_word(block, IMG_VITEC_AT_MAGIC);
+    if (!is_vitec_magic(magic)) return FALSE;
+    const bool swapped = magic == IMG_VITEC_SWAPPED_MAGIC;
+    if (swapped) img_swap_words(block, 0, IMG_VITEC_FILE_WORDS_END);
+    const std::int64_t version_offset =
+        std::int64_t{img_get_int(block, IMG_VITEC_AT_IMAGE_BLOCK_LINK)} + IMG_VITEC_LINK_BASE +
+        static_cast<std::int64_t>(IMG_VITEC_AT_VERSION);
+    if (version_offset < 0) return FALSE;
+    if (version_offset > info->nHeaderBytes - static_cast<int>(sizeof(std::uint32_t))) return TRUE;
+    std::uint32_t version;
+    std::memcpy(&version, info->pabyHeader + version_offset, sizeof version);
+    return (swapped ? img_swapped_word(version) : version) == IMG_VITEC_VERSION ? TRUE : FALSE;
+}
+
+// Files of this format begin with their samples. The end of a file is looked at where that takes no
+// request to a server, and where the name asks for it.
+int identify_helava(GDALOpenInfo *info)
+{
+    constexpr auto trailer_length = static_cast<int>(IMG_HELAVA_TRAILER_LENGTH);
+    if (info->fpL == nullptr || info->nHeaderBytes < trailer_length) return FALSE;
+    const bool is_near = std::strncmp(info->pszFilename, "/vsi", 4) != 0 ||
+                         std::strncmp(info->pszFilename, "/vsimem/", 8) == 0;
+    if (!is_near && !EQUAL(CPLGetExtension(info->pszFilename), "d")) return FALSE;
+    std::array<std::uint8_t, IMG_HELAVA_TRAILER_LENGTH> trailer;
+    if (VSIFSeekL(info->fpL, 0, SEEK_END) != 0) return FALSE;
+    const vsi_l_offset length = VSIFTellL(info->fpL);
+    const bool was_read = length >= trailer.size() &&
+                          VSIFSeekL(info->fpL, length - trailer.size(), SEEK_SET) == 0 &&
+                          VSIFReadL(trailer.data(), 1, trailer.size(), info->fpL) == trailer.size();
+    VSIRewindL(info->fpL);
+    return was_read && is_helava_magic(img_get_word(trailer, IMG_HELAVA_AT_MAGIC)) ? TRUE : FALSE;
+}
+
+}  // namespace
+
+const image_format vitec_format{.name = "VITec",
+                                .long_name = "VITec image (.img)",
+                                .type = IMG_TYPE_VITEC,
+                                .most_bands = IMG_VITEC_MAX_BANDS,
+                                .has_tiles = true,
+                                .has_two_bytes = true,
+                                .identify = identify_vitec};
+const image_format helava_format{.name = "Helava",
+                                 .long_name = "Helava image (.d)",
+                                 .type = IMG_TYPE_HELAVA,
+                                 .most_bands = 65535,
+                                 .has_tiles = false,
+                                 .has_two_bytes = false,
+                                 .identify = identify_helava};

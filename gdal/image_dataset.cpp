@@ -1,0 +1,274 @@
+// Moving samples between GDAL and an image. A request that neither resamples nor converts goes
+// straight to where the bytes lie, past GDAL's block cache; all others are GDAL's own, made of
+// blocks. Read image_dataset.h and api/open.h first.
+#include "image_dataset.h"
+
+#include "library_messages.h"
+#include "storage.h"
+
+#include "base/img_desc.h"
+#include "formats/helava.h"
+#include "std/std.h"
+#include "std/std_bytes.h"
+#include "std/std_offset.h"
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <cstring>
+#include <utility>
+
+namespace {
+
+// A window of so many bytes is read into memory of the call first, so that a failure leaves the
+// caller's alone. Larger ones ask for the length of the file first: that takes less time then.
+constexpr std::size_t SMALL_WINDOW = 16384;
+// Working memory of requests whose samples are spaced in the caller's buffer.
+constexpr std::size_t PIECE = std::size_t{1} << 20;
+
+bool is_exact(const GDALRasterIOExtraArg *extra, int samp, int line, int nsamps, int nlines)
+{
+    if (extra == nullptr || extra->bFloatingPointWindowValidity == FALSE) return true;
+    return extra->dfXOff == samp && extra->dfYOff == line && extra->dfXSize == nsamps &&
+           extra->dfYSize == nlines;
+}
+
+}  // namespace
+
+sample_buffer new_samples(int nlines, int nsamps, int nbytes)
+{
+    return sample_buffer(static_cast<GByte *>(
+        VSI_MALLOC3_VERBOSE(static_cast<std::size_t>(nlines), static_cast<std::size_t>(nsamps),
+                            static_cast<std::size_t>(nbytes))));
+}
+
+std::int64_t whole_length(const img_desc &desc)
+{
+    const img_std_file &file = *desc.std_file;
+    const std::int64_t trailer = desc.type == IMG_TYPE_HELAVA ? IMG_HELAVA_TRAILER_LENGTH : 0;
+    return file.data_offset + std::int64_t{file.band_size} * desc.nbands + trailer;
+}
+
+image_dataset::image_dataset(const char *driver_name, std::string filename, img_raw_image image,
+                             GDALAccess access)
+    : m_driver_name(driver_name), m_filename(std::move(filename)), m_image(std::move(image))
+{
+    eAccess = access;
+    nRasterXSize = m_image->nsamps;
+    nRasterYSize = m_image->nlines;
+    for (int band = 1; band <= m_image->nbands; ++band) SetBand(band, new image_band(this, band));
+    // Not through GDALPamDataset, which would write it to a side file.
+    if (m_image->nbands > 1) GDALDataset::SetMetadataItem("INTERLEAVE", "BAND", "IMAGE_STRUCTURE");
+}
+
+void image_dataset::load_side_files(GDALOpenInfo *info)
+{
+    SetDescription(info->pszFilename);
+    char **const siblings = info->GetSiblingFiles();
+    TryLoadXML(siblings);
+    oOvManager.Initialize(this, info->pszFilename, siblings);
+}
+
+image_dataset::~image_dataset()
+{
+    close_image();
+}
+
+CPLErr image_dataset::close_image()
+{
+    if (!m_image) return CE_None;
+    FlushCache(true);
+    take_close_error();
+    m_image.reset();
+    const int error = take_close_error();
+    if (error == 0 || eAccess == GA_ReadOnly) return CE_None;
+    CPLError(CE_Failure, CPLE_FileIO, "%s: %s: not all samples could be stored: %s",
+             m_driver_name.c_str(), m_filename.c_str(), std::strerror(error));
+    return CE_Failure;
+}
+
+// True when the file holds all that a read of the region needs, by its length as last seen.
+bool image_dataset::is_there(int band, int line, int samp, int nlines, int nsamps) const
+{
+    const img_desc *const image = m_image.get();
+    const img_std_file &file = *image->std_file;
+    if (file.veof >= whole_length(*image)) return true;
+    const int last_line = line + nlines - 1, last_samp = samp + nsamps - 1;
+    if (!img_is_tiled(image))
+        return img_std_line_offset(image, last_line, last_samp, band) + image->nbytes <= file.veof;
+    const std::int64_t last_tile =
+        std::int64_t{last_line / image->tile_nlines} * file.tiles_across +
+        last_samp / image->tile_nsamps;
+    return img_std_tile_offset(image, last_tile, band) + file.tile_size <= file.veof;
+}
+
+// Reports the first line of a region that the file does not hold, or why it cannot be read.
+void image_dataset::report_missing(int band, int line, int samp, int nlines, int nsamps)
+{
+    const std::string reason = library_messages::last();
+    int first = line, last = line + nlines - 1;
+    if (is_there(band, line, samp, nlines, nsamps)) {
+        CPLError(CE_Failure, CPLE_FileIO, "%s: %s: lines %d to %d of band %d cannot be read%s%s",
+                 m_driver_name.c_str(), m_filename.c_str(), first, last, band + 1,
+                 reason.empty() ? "" : ": ", reason.c_str());
+        return;
+    }
+    while (first < last) {
+        const int middle = first + (last - first) / 2;
+        if (is_there(band, middle, samp, 1, nsamps))
+            first = middle + 1;
+        else
+            last = middle;
+    }
+    CPLError(CE_Failure, CPLE_FileIO, "%s: %s: truncated: line %d of band %d is missing",
+             m_driver_name.c_str(), m_filename.c_str(), first, band + 1);
+}
+
+CPLErr image_dataset::read(int band, int line, int samp, int nlines, int nsamps, GByte *buffer,
+                           int stride)
+{
+    const library_messages messages;
+    img_desc *const image = m_image.get();
+    const std::size_t row =
+        static_cast<std::size_t>(nsamps) * static_cast<std::size_t>(image->nbytes);
+    const std::size_t pitch =
+        static_cast<std::size_t>(stride) * static_cast<std::size_t>(image->nbytes);
+    const bool is_small = row * static_cast<std::size_t>(nlines) <= SMALL_WINDOW;
+    bool done = false;
+    if (is_small) {
+        std::array<GByte, SMALL_WINDOW> samples;
+        done = is_there(band, line, samp, nlines, nsamps) &&
+               img_read_raw(image, line, samp, nlines, nsamps, band, samples.data(), nsamps) == 0;
+        for (std::size_t i = 0; done && i < static_cast<std::size_t>(nlines); ++i)
+            std::memcpy(buffer + i * pitch, samples.data() + i * row, row);
+    } else {
+        img_std_update_veof(image);
+        done = is_there(band, line, samp, nlines, nsamps) &&
+               img_read_raw(image, line, samp, nlines, nsamps, band, buffer, stride) == 0;
+    }
+    if (done) return CE_None;
+    img_std_update_veof(image);
+    report_missing(band, line, samp, nlines, nsamps);
+    return CE_Failure;
+}
+
+CPLErr image_dataset::write(int band, int line, int samp, int nlines, int nsamps,
+                            const GByte *buffer, int stride)
+{
+    const library_messages messages;
+    if (img_write_raw(m_image.get(), line, samp, nlines, nsamps, band, buffer, stride) == 0)
+        return CE_None;
+    const std::string reason = library_messages::last();
+    CPLError(CE_Failure, CPLE_FileIO, "%s: %s: lines %d to %d of band %d cannot be written%s%s",
+             m_driver_name.c_str(), m_filename.c_str(), line, line + nlines - 1, band + 1,
+             reason.empty() ? "" : ": ", reason.c_str());
+    return CE_Failure;
+}
+
+image_band::image_band(image_dataset *dataset, int band)
+{
+    const img_desc &image = dataset->desc();
+    poDS = dataset;
+    nBand = band;
+    eAccess = dataset->GetAccess();
+    eDataType = image.nbytes == 2 ? GDT_UInt16 : GDT_Byte;
+    nBlockXSize = img_is_tiled(&image) ? image.tile_nsamps : image.nsamps;
+    nBlockYSize = img_is_tiled(&image) ? image.tile_nlines : 1;
+}
+
+GDALColorInterp image_band::GetColorInterpretation()
+{
+    const GDALColorInterp stated = GDALPamRasterBand::GetColorInterpretation();
+    if (stated != GCI_Undefined) return stated;
+    const img_desc &image = images().desc();
+    if (image.nbands == 1) return GCI_GrayIndex;
+    if (image.nbands == 3 && image.nbytes == 1)
+        return static_cast<GDALColorInterp>(GCI_RedBand + nBand - 1);
+    return GCI_Undefined;
+}
+
+CPLErr image_band::IReadBlock(int block_x, int block_y, void *buffer)
+{
+    const int samp = block_x * nBlockXSize, line = block_y * nBlockYSize;
+    const int nsamps = std::min(nBlockXSize, nRasterXSize - samp);
+    const int nlines = std::min(nBlockYSize, nRasterYSize - line);
+    if (nsamps < nBlockXSize || nlines < nBlockYSize)
+        std::memset(buffer, 0,
+                    static_cast<std::size_t>(nBlockXSize) * static_cast<std::size_t>(nBlockYSize) *
+                        static_cast<std::size_t>(images().desc().nbytes));
+    return images().read(nBand - 1, line, samp, nlines, nsamps, static_cast<GByte *>(buffer),
+                         nBlockXSize);
+}
+
+CPLErr image_band::IWriteBlock(int block_x, int block_y, void *buffer)
+{
+    const int samp = block_x * nBlockXSize, line = block_y * nBlockYSize;
+    return images().write(nBand - 1, line, samp, std::min(nBlockYSize, nRasterYSize - line),
+                          std::min(nBlockXSize, nRasterXSize - samp),
+                          static_cast<const GByte *>(buffer), nBlockXSize);
+}
+
+CPLErr image_band::IRasterIO(GDALRWFlag direction, int samp, int line, int nsamps, int nlines,
+                             void *buffer, int buffer_nsamps, int buffer_nlines,
+                             GDALDataType buffer_type, GSpacing pixel_space, GSpacing line_space,
+                             GDALRasterIOExtraArg *extra)
+{
+    if (buffer_nsamps != nsamps || buffer_nlines != nlines || buffer_type != eDataType ||
+        !is_exact(extra, samp, line, nsamps, nlines))
+        return GDALPamRasterBand::IRasterIO(direction, samp, line, nsamps, nlines, buffer,
+                                            buffer_nsamps, buffer_nlines, buffer_type, pixel_space,
+                                            line_space, extra);
+    // Blocks that GDAL keeps are written first, and not kept beside what is written here.
+    if (eAccess == GA_Update && FlushCache(false) != CE_None) return CE_Failure;
+    const int nbytes = images().desc().nbytes;
+    const GSpacing stride = line_space / nbytes;
+    auto *const samples = static_cast<GByte *>(buffer);
+    const bool is_packed = pixel_space == nbytes && line_space % nbytes == 0 && stride >= nsamps &&
+                           stride * nlines <= INT32_MAX / nbytes;
+    CPLErr result = CE_None;
+    if (!is_packed)
+        result =
+            move_spaced(direction, samp, line, nsamps, nlines, samples, pixel_space, line_space);
+    else if (direction == GF_Read)
+        result =
+            images().read(nBand - 1, line, samp, nlines, nsamps, samples, static_cast<int>(stride));
+    else
+        result = images().write(nBand - 1, line, samp, nlines, nsamps, samples,
+                                static_cast<int>(stride));
+    if (result == CE_None && extra != nullptr && extra->pfnProgress != nullptr &&
+        extra->pfnProgress(1.0, "", extra->pProgressData) == FALSE)
+        return CE_Failure;
+    return result;
+}
+
+// Moves samples that are spaced in `buffer` by way of rows in which they are not.
+CPLErr image_band::move_spaced(GDALRWFlag direction, int samp, int line, int nsamps, int nlines,
+                               GByte *buffer, GSpacing pixel_space, GSpacing line_space)
+{
+    const int nbytes = images().desc().nbytes;
+    const std::size_t row = static_cast<std::size_t>(nsamps) * static_cast<std::size_t>(nbytes);
+    const int height =
+        static_cast<int>(std::clamp<std::size_t>(PIECE / row, 1, static_cast<std::size_t>(nlines)));
+    const sample_buffer rows = new_samples(height, nsamps, nbytes);
+    if (!rows) return CE_Failure;
+    for (int first = 0; first < nlines; first += height) {
+        const int count = std::min(height, nlines - first);
+        if (direction == GF_Read && images().read(nBand - 1, line + first, samp, count, nsamps,
+                                                  rows.get(), nsamps) != CE_None)
+            return CE_Failure;
+        for (int i = 0; i < count; ++i) {
+            GByte *const spaced = buffer + (first + i) * line_space;
+            GByte *const packed = rows.get() + static_cast<std::size_t>(i) * row;
+            if (direction == GF_Read)
+                GDALCopyWords64(packed, eDataType, nbytes, spaced, eDataType,
+                                static_cast<int>(pixel_space), nsamps);
+            else
+                GDALCopyWords64(spaced, eDataType, static_cast<int>(pixel_space), packed, eDataType,
+                                nbytes, nsamps);
+        }
+        if (direction == GF_Write && images().write(nBand - 1, line + first, samp, count, nsamps,
+                                                    rows.get(), nsamps) != CE_None)
+            return CE_Failure;
+    }
+    return CE_None;
+}

@@ -1,0 +1,72 @@
+// A VITec or Helava image as a GDAL data set. Samples are passed as they are stored: Byte or
+// UInt16.
+#ifndef GDAL_IMGFILE_IMAGE_DATASET_H
+#define GDAL_IMGFILE_IMAGE_DATASET_H
+
+#include "api/open.h"
+
+#include <gdal_pam.h>
+
+#include <memory>
+#include <string>
+
+// Memory for samples.
+struct sample_free {
+    void operator()(GByte *samples) const { VSIFree(samples); }
+};
+using sample_buffer = std::unique_ptr<GByte[], sample_free>;
+// Null after an error: memory is short.
+sample_buffer new_samples(int nlines, int nsamps, int nbytes);
+
+class image_dataset final : public GDALPamDataset {
+public:
+    // `driver_name` opens the messages of this data set.
+    image_dataset(const char *driver_name, std::string filename, img_raw_image image,
+                  GDALAccess access);
+    ~image_dataset() override;
+
+    // Takes up the side files of a file that is opened: metadata, overviews.
+    void load_side_files(GDALOpenInfo *info);
+    // Writes what waits in GDAL's cache, ends the image, and reports what could not be stored.
+    CPLErr close_image();
+
+    // Reads, or writes, a region inside the image. `buffer` has rows `stride` samples apart. A read
+    // that fails leaves `buffer` alone, unless the file was cut during the read.
+    CPLErr read(int band, int line, int samp, int nlines, int nsamps, GByte *buffer, int stride);
+    CPLErr write(int band, int line, int samp, int nlines, int nsamps, const GByte *buffer,
+                 int stride);
+
+    const img_desc &desc() const { return *m_image; }
+
+private:
+    bool is_there(int band, int line, int samp, int nlines, int nsamps) const;
+    void report_missing(int band, int line, int samp, int nlines, int nsamps);
+
+    std::string m_driver_name, m_filename;
+    img_raw_image m_image;
+};
+
+class image_band final : public GDALPamRasterBand {
+public:
+    image_band(image_dataset *dataset, int band);
+
+    GDALColorInterp GetColorInterpretation() override;
+
+protected:
+    CPLErr IReadBlock(int block_x, int block_y, void *buffer) override;
+    CPLErr IWriteBlock(int block_x, int block_y, void *buffer) override;
+    CPLErr IRasterIO(GDALRWFlag direction, int samp, int line, int nsamps, int nlines, void *buffer,
+                     int buffer_nsamps, int buffer_nlines, GDALDataType buffer_type,
+                     GSpacing pixel_space, GSpacing line_space,
+                     GDALRasterIOExtraArg *extra) override;
+
+private:
+    image_dataset &images() const { return *static_cast<image_dataset *>(poDS); }
+    CPLErr move_spaced(GDALRWFlag direction, int samp, int line, int nsamps, int nlines,
+                       GByte *buffer, GSpacing pixel_space, GSpacing line_space);
+};
+
+// Returns the bytes that a file of this geometry has.
+std::int64_t whole_length(const img_desc &desc);
+
+#endif
