@@ -2,6 +2,7 @@
 #   library       the shared library
 #   development   header, CMake package, pkg-config file, example, manual pages of section 3
 #   tool          the program, its completion, manual pages of sections 1 and 5
+#   gdal          the GDAL plugin (gdal/CMakeLists.txt)
 #   licence       LICENSE, which Debian packages replace by their own file
 # The CMake package and the pkg-config file name the same include folder, so that hosts write
 # #include <img.h>. Both still work after the tree is moved.

@@ -58,4 +58,17 @@ converts them from and to PNG, TIFF, PGM and PPM, makes previews and
 statistics, and compares images sample by sample.")
 endif()
 
+if(TARGET imgfile_gdal)
+    list(APPEND CPACK_COMPONENTS_ALL gdal)
+    set(CPACK_DEBIAN_GDAL_PACKAGE_NAME libgdal-imgfile)
+    set(CPACK_DEBIAN_GDAL_PACKAGE_SECTION libs)
+    set(CPACK_DEBIAN_GDAL_PACKAGE_SHLIBDEPS ON)
+    set(CPACK_DEBIAN_GDAL_DESCRIPTION
+"VITec and Helava raster images in GDAL, QGIS and rasterio
+A plugin with two drivers for GDAL: VITec (.img) and Helava (.d). With it,
+each program that uses GDAL reads, changes and writes images of these
+formats: QGIS, the GDAL commands, and the Python packages rasterio and
+rioxarray among them.")
+endif()
+
 include(CPack)

@@ -20,7 +20,8 @@ version=$(sed -n 's/^ *VERSION //p' "$source/CMakeLists.txt")
 libraries=usr/lib/$(dpkg-architecture -q DEB_HOST_MULTIARCH)
 functions=$(sed -n 's/^IMG_EXPORT .*[ *]\(img_[a-z_]*\)(.*/\1/p' "$source/include/imgfile/img.h")
 set -- once/*
-expect 'number of packages' 3 $#
+has_plugin=$(grep -c 'CPACK_COMPONENTS_ALL .*gdal' "$build/CPackConfig.cmake")
+expect 'number of packages' $((3 + has_plugin)) $#
 
 # Looks at one package and unpacks it into root/. The names of its files are standard input.
 look() {  # PACKAGE FIELDS CONTROL_FILES
@@ -54,6 +55,13 @@ usr/bin/imgfile
 usr/share/bash-completion/completions/imgfile
 $(printf '%s\n' "$source"/tools/imgfile/man/*.1 "$source"/docs/man/*.5 | sed 's|.*/\(.*\.\(.\)\)$|usr/share/man/man\2/\1.gz|')
 END
+if [ "$has_plugin" = 1 ]; then
+    look libgdal-imgfile 'libs same' 'control md5sums' <<END
+$libraries/gdalplugins/gdal_IMGFILE.so
+END
+    expect 'needs of libgdal-imgfile' 'libc6 libgcc-s1 libgdalN libstdc++6' \
+        "$(sed 's/ ([^)]*),*//g; s/libgdal[0-9]*/libgdalN/' libgdal-imgfile.needs)"
+fi
 expect 'needs of libimgfile0' 'libc6 libgcc-s1 libstdc++6' "$(sed 's/ ([^)]*),*//g' libimgfile0.needs)"
 expect 'needs of libimgfile-dev' "libimgfile0 (= $version)" "$(cat libimgfile-dev.needs)"
 expect 'needs of the program: the library' '' "$(grep libimgfile imgfile.needs || true)"
@@ -64,7 +72,7 @@ if command -v lintian >/dev/null; then
     lintian --allow-root --fail-on error,warning once/* || failed=1
 fi
 
-# All three in one tree.
+# All in one tree.
 for function in $functions; do
     ! command -v man >/dev/null ||
         man --warnings -M root/usr/share/man 3 "$function" 2>&1 | grep -q "^ *$function(" ||
