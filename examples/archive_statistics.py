@@ -59,8 +59,7 @@ def facts_of(counts):
 
 def measure(path):
     """Returns the rows of an image, one for each band."""
-    image = gdal.OpenEx(path, gdal.OF_RASTER | gdal.OF_VERBOSE_ERROR, allowed_drivers=DRIVERS,
-                        sibling_files=[])
+    image = gdal.OpenEx(path, gdal.OF_RASTER | gdal.OF_VERBOSE_ERROR, allowed_drivers=DRIVERS)
     size = {"file": path, "lines": image.RasterYSize, "samples": image.RasterXSize}
     return [{**size, "band": band, **facts_of(count_values(image.GetRasterBand(band + 1)))}
             for band in range(image.RasterCount)]
@@ -69,7 +68,8 @@ def measure(path):
 def measure_all(paths):
     """Returns the rows of all images, and for each damaged one its path and what is wrong."""
     gdal.UseExceptions()
-    gdal.SetConfigOption("GDAL_PAM_ENABLED", "NO")  # side files hold nothing that is needed here
+    gdal.SetConfigOption("GDAL_PAM_ENABLED", "NO")  # side files are not needed, nor looked for
+    gdal.SetConfigOption("GDAL_DISABLE_READDIR_ON_OPEN", "EMPTY_DIR")
     rows, faults = [], []
     for path in paths:
         try:
