@@ -2,7 +2,7 @@
 #   library       the shared library
 #   development   header, CMake package, pkg-config file, example, manual pages of section 3
 #   tool          the program, its completion, manual pages of sections 1 and 5
-#   gdal          the GDAL plugin (gdal/CMakeLists.txt)
+#   gdal          the GDAL plugin (gdal/CMakeLists.txt) and its example
 #   licence       LICENSE, which Debian packages replace by their own file
 # The CMake package and the pkg-config file name the same include folder, so that hosts write
 # #include <img.h>. Both still work after the tree is moved.
@@ -53,6 +53,10 @@ install(FILES ${PROJECT_SOURCE_DIR}/README.md
     DESTINATION ${CMAKE_INSTALL_DOCDIR} COMPONENT development)
 install(FILES ${PROJECT_SOURCE_DIR}/examples/smallest_host.c
     DESTINATION ${CMAKE_INSTALL_DOCDIR}/examples COMPONENT development)
+if(IMGFILE_BUILD_GDAL)
+    install(FILES ${PROJECT_SOURCE_DIR}/examples/archive_statistics.py
+        DESTINATION ${CMAKE_INSTALL_DOCDIR}/examples COMPONENT gdal)
+endif()
 
 if(TARGET imgfile_tool)
     set(tool_dir ${PROJECT_SOURCE_DIR}/tools/imgfile)
