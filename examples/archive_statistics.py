@@ -1,9 +1,9 @@
 #!/usr/bin/python3
 """Statistics of all VITec and Helava images of an archive, computed by a Dask cluster.
 
-The numbers are those of `imgfile stats --json`, to the last digit. The images are read through GDAL,
-so every worker needs the plugin of this project, and the archive under the same name: a folder, or
-any path of GDAL (/vsis3/bucket/scenes). Debian packages: libgdal-imgfile, python3-gdal,
+The numbers are those of `imgfile stats --json`, to the last digit. The images are read through
+GDAL, so every worker needs the plugin of this project, and the archive under the same name: a
+folder, or any path of GDAL (/vsis3/bucket/scenes). Debian packages: libgdal-imgfile, python3-gdal,
 python3-numpy, python3-distributed, python3-matplotlib.
 """
 
@@ -170,7 +170,7 @@ def parse_arguments():
         "processes or machines. The exit status is 0, or 1 if an image is damaged: its name is "
         "printed, and all others are in the table.")
     parser.add_argument("archive", nargs="+",
-                        help="a folder or an image; any path that GDAL can list, such as /vsis3/...")
+                        help="a folder or an image; also a path of GDAL, such as /vsis3/...")
     parser.add_argument("--table", required=True, metavar="FILE",
                         help="the table to write, one row for each band: .csv or .parquet")
     parser.add_argument("--picture", metavar="FILE.png",

@@ -59,7 +59,7 @@ def open_layer(path):
 
 
 def show(layers):
-    """Makes a window of the layer panel, the map, and a line about the first layer, which is on top."""
+    """Makes a window of the layer panel, the map, and a line about the first layer, the top one."""
     project = QgsProject.instance()
     for layer in reversed(layers):  # the project puts each on top
         project.addMapLayer(layer)
@@ -100,7 +100,8 @@ def main():
     window = show([open_layer(path) for path in options.images])
     if not window.grab().toImage().save(options.picture, "PNG"):
         sys.exit(f"{options.picture}: cannot be written")
-    Image.open(options.picture).convert("RGB").quantize(COLOURS).save(options.picture, optimize=True)
+    drawn = Image.open(options.picture).convert("RGB")
+    drawn.quantize(COLOURS).save(options.picture, optimize=True)
     window.close()
     QgsProject.instance().clear()
     application.exitQgis()
