@@ -11,6 +11,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <charconv>
 #include <cstring>
 #include <memory>
 #include <string>
@@ -100,8 +101,10 @@ bool read_side(const image_format &format, const char *filename, char **options,
 {
     const char *const stated = CSLFetchNameValue(options, key);
     if (stated == nullptr) return true;
-    *side = std::atoi(stated);
-    if (img_vitec_is_tile_size(*side)) return true;
+    const char *const end = stated + std::strlen(stated);
+    if (const auto [next, error] = std::from_chars(stated, end, *side);
+        error == std::errc{} && next == end && img_vitec_is_tile_size(*side))
+        return true;
     fail(format, filename, CPLE_IllegalArg,
          std::string(key) + "=" + stated + ": tiles have powers of two from " +
              std::to_string(IMG_VITEC_MIN_TILE) + " to " + std::to_string(IMG_VITEC_MAX_TILE));
@@ -174,7 +177,7 @@ std::unique_ptr<image_dataset> create_image(const image_format &format, const ch
 {
     if (!create_file(format, filename, nsamps, nlines, nbands, type, options)) return nullptr;
     std::unique_ptr<image_dataset> dataset = open_image(format, filename, GA_Update);
-    if (dataset) dataset->SetDescription(filename);
+    if (dataset) dataset->start_side_files();
     return dataset;
 }
 
@@ -216,22 +219,12 @@ GDALDataType stored_type(const image_format &format, const char *filename, GDALD
     return accept_loss(format, filename, is_strict, what) ? nearest : GDT_Unknown;
 }
 
-bool accept_source(const image_format &format, const char *filename, GDALDataset *source,
-                   bool is_strict)
+// Returns false after an error: the caller cancels.
+bool report_progress(double done, GDALProgressFunc progress, void *progress_data)
 {
-    for (int band = 1; band <= source->GetRasterCount(); ++band) {
-        GDALRasterBand *const each = source->GetRasterBand(band);
-        if (each->GetColorTable() != nullptr &&
-            !accept_loss(format, filename, is_strict, "the colour table is not kept"))
-            return false;
-        if ((each->GetMaskFlags() & ~(GMF_ALL_VALID | GMF_NODATA | GMF_ALPHA | GMF_PER_DATASET)) !=
-                0 ||
-            each->GetMaskFlags() == GMF_PER_DATASET) {
-            if (!accept_loss(format, filename, is_strict, "the mask is not kept")) return false;
-            break;
-        }
-    }
-    return true;
+    if (progress(done, "", progress_data) != FALSE) return true;
+    CPLError(CE_Failure, CPLE_UserInterrupt, "User terminated");
+    return false;
 }
 
 // Copies all samples, one row of blocks at a time. Returns false after an error or a cancel.
@@ -256,13 +249,23 @@ bool copy_samples(GDALDataset *source, image_dataset *copy, GDALDataType type,
                 copy->write(band, first, 0, count, image.nsamps, rows.get(), image.nsamps) !=
                     CE_None)
                 return false;
-        if (progress(static_cast<double>(first + count) / image.nlines, "", progress_data) ==
-            FALSE) {
-            CPLError(CE_Failure, CPLE_UserInterrupt, "User terminated");
+        if (!report_progress(static_cast<double>(first + count) / image.nlines, progress,
+                             progress_data))
             return false;
-        }
     }
     return true;
+}
+
+// Copies the metadata that GDALPamDataset::CloneInfo leaves out, but for what describes the file.
+void copy_domains(GDALMajorObject *source, GDALMajorObject *copy)
+{
+    const CPLStringList domains(source->GetMetadataDomainList());
+    for (int i = 0; i < domains.size(); ++i) {
+        const char *const domain = domains[i];
+        if (!EQUAL(domain, "") && !EQUAL(domain, "IMAGE_STRUCTURE") &&
+            !EQUAL(domain, "SUBDATASETS") && !EQUAL(domain, "DERIVED_SUBDATASETS"))
+            copy->SetMetadata(source->GetMetadata(domain), domain);
+    }
 }
 
 GDALDataset *copy_image(const image_format &format, const char *filename, GDALDataset *source,
@@ -274,9 +277,7 @@ GDALDataset *copy_image(const image_format &format, const char *filename, GDALDa
     if (const std::string reason = refusal(format, nbands, GDT_Byte); !reason.empty())
         return fail(format, filename, CPLE_NotSupported, "the format " + reason);
     const GDALDataType type = stored_type(format, filename, source, is_strict);
-    if (type == GDT_Unknown || !accept_source(format, filename, source, is_strict) ||
-        progress(0.0, "", progress_data) == FALSE)
-        return nullptr;
+    if (type == GDT_Unknown || !report_progress(0.0, progress, progress_data)) return nullptr;
     std::unique_ptr<image_dataset> copy =
         create_image(format, filename, source->GetRasterXSize(), source->GetRasterYSize(), nbands,
                      type, options);
@@ -286,9 +287,14 @@ GDALDataset *copy_image(const image_format &format, const char *filename, GDALDa
         copy.reset();
         return nullptr;
     }
-    copy->CloneInfo(source, GCIF_PAM_DEFAULT);
     file.keep();
-    return copy.release();
+    copy_domains(source, copy.get());
+    for (int band = 1; band <= nbands; ++band)
+        copy_domains(source->GetRasterBand(band), copy->GetRasterBand(band));
+    if (copy->CloneInfo(source, GCIF_PAM_DEFAULT) == CE_None) return copy.release();
+    copy.reset();
+    GDALDriver::QuietDelete(filename);
+    return nullptr;
 }
 
 GDALDataset *copy_to_vitec(const char *filename, GDALDataset *source, int strict, char **options,
@@ -303,6 +309,7 @@ GDALDataset *copy_to_helava(const char *filename, GDALDataset *source, int stric
     return copy_image(helava_format, filename, source, strict, options, progress, progress_data);
 }
 
+constexpr char NO_OPTIONS[] = "<CreationOptionList/>";
 constexpr char VITEC_OPTIONS[] =
     "<CreationOptionList>"
     "  <Option name='TILED' type='boolean' default='NO' description='Store the image in tiles'/>"
@@ -327,7 +334,7 @@ void register_format(const image_format &format)
     driver->SetMetadataItem(GDAL_DMD_CREATIONDATATYPES, is_vitec ? "Byte UInt16" : "Byte");
     // Other formats have files of the name .img: theirs is the ending of an output file.
     if (!is_vitec) driver->SetMetadataItem(GDAL_DMD_EXTENSION, "d");
-    if (is_vitec) driver->SetMetadataItem(GDAL_DMD_CREATIONOPTIONLIST, VITEC_OPTIONS);
+    driver->SetMetadataItem(GDAL_DMD_CREATIONOPTIONLIST, is_vitec ? VITEC_OPTIONS : NO_OPTIONS);
 #ifdef GDAL_DCAP_UPDATE
     driver->SetMetadataItem(GDAL_DCAP_UPDATE, "YES");
 #endif

@@ -61,6 +61,12 @@ image_dataset::image_dataset(const char *driver_name, std::string filename, img_
     if (m_image->nbands > 1) GDALDataset::SetMetadataItem("INTERLEAVE", "BAND", "IMAGE_STRUCTURE");
 }
 
+void image_dataset::start_side_files()
+{
+    SetDescription(m_filename.c_str());
+    oOvManager.Initialize(this, m_filename.c_str());
+}
+
 void image_dataset::load_side_files(GDALOpenInfo *info)
 {
     SetDescription(info->pszFilename);

@@ -25,7 +25,9 @@ public:
                   GDALAccess access);
     ~image_dataset() override;
 
-    // Takes up the side files of a file that is opened: metadata, overviews.
+    // A new file has no side files yet; metadata, overviews and masks may make them.
+    void start_side_files();
+    // Takes up the side files of a file that is opened: metadata, overviews, masks.
     void load_side_files(GDALOpenInfo *info);
     // Writes what waits in GDAL's cache, ends the image, and reports what could not be stored.
     CPLErr close_image();
