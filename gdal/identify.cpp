@@ -9,6 +9,7 @@
 #include <array>
 #include <cstring>
 #include <span>
+#include <string>
 
 namespace {
 
@@ -42,15 +43,36 @@ int identify_vitec(GDALOpenInfo *info)
     return (swapped ? img_swapped_word(version) : version) == IMG_VITEC_VERSION ? TRUE : FALSE;
 }
 
+bool is_helava_name(const char *filename)
+{
+    const std::string extension = CPLGetExtension(filename);
+    return EQUAL(extension.c_str(), "d") || (EQUAL(extension.c_str(), "gz") &&
+                                             EQUAL(CPLGetExtension(CPLGetBasename(filename)), "d"));
+}
+
+// True when the trailer of a Helava file states `count` samples.
+bool states_length(std::span<const std::uint8_t> trailer, std::uint64_t count)
+{
+    const bool swapped = img_get_word(trailer, IMG_HELAVA_AT_MAGIC) == IMG_HELAVA_SWAPPED_MAGIC;
+    const auto field = [&](std::size_t offset) -> std::uint64_t {
+        const std::uint32_t word = img_get_word(trailer, offset);
+        return swapped ? img_swapped_word(word) : word;
+    };
+    const std::uint64_t band = field(IMG_HELAVA_AT_NSAMPS) * field(IMG_HELAVA_AT_NLINES);
+    return band != 0 && count % band == 0 && count / band == field(IMG_HELAVA_AT_NBANDS);
+}
+
 // Files of this format begin with their samples. The end of a file is looked at where that takes no
-// request to a server, and where the name asks for it.
+// request to a server, and where the name asks for it. Files of other names must have the length
+// that the trailer states: any file may end in the magic word by chance.
 int identify_helava(GDALOpenInfo *info)
 {
     constexpr auto trailer_length = static_cast<int>(IMG_HELAVA_TRAILER_LENGTH);
     if (info->fpL == nullptr || info->nHeaderBytes < trailer_length) return FALSE;
     const bool is_near = std::strncmp(info->pszFilename, "/vsi", 4) != 0 ||
                          std::strncmp(info->pszFilename, "/vsimem/", 8) == 0;
-    if (!is_near && !EQUAL(CPLGetExtension(info->pszFilename), "d")) return FALSE;
+    const bool has_name = is_helava_name(info->pszFilename);
+    if (!is_near && !has_name) return FALSE;
     std::array<std::uint8_t, IMG_HELAVA_TRAILER_LENGTH> trailer;
     if (VSIFSeekL(info->fpL, 0, SEEK_END) != 0) return FALSE;
     const vsi_l_offset length = VSIFTellL(info->fpL);
@@ -58,7 +80,8 @@ int identify_helava(GDALOpenInfo *info)
                           VSIFSeekL(info->fpL, length - trailer.size(), SEEK_SET) == 0 &&
                           VSIFReadL(trailer.data(), 1, trailer.size(), info->fpL) == trailer.size();
     VSIRewindL(info->fpL);
-    return was_read && is_helava_magic(img_get_word(trailer, IMG_HELAVA_AT_MAGIC)) ? TRUE : FALSE;
+    if (!was_read || !is_helava_magic(img_get_word(trailer, IMG_HELAVA_AT_MAGIC))) return FALSE;
+    return has_name || states_length(trailer, length - trailer.size()) ? TRUE : FALSE;
 }
 
 }  // namespace

@@ -71,8 +71,43 @@ void image_dataset::load_side_files(GDALOpenInfo *info)
 {
     SetDescription(info->pszFilename);
     char **const siblings = info->GetSiblingFiles();
-    TryLoadXML(siblings);
+    // A server that lists no folder is asked for one side file, and not for each of the old names
+    // that GDAL would try.
+    CPLStringList likely;
+    if (siblings == nullptr && !VSIIsLocal(info->pszFilename))
+        likely.AddString((std::string(CPLGetFilename(info->pszFilename)) + ".aux.xml").c_str());
+    TryLoadXML(likely.empty() ? siblings : likely.List());
     oOvManager.Initialize(this, info->pszFilename, siblings);
+}
+
+// Several bands, or blocks of GDAL's cache, are read one after the other. What is missing is seen
+// before the first of them reaches the caller's buffer.
+CPLErr image_dataset::check_there(const int *bands, int nbands, int line, int samp, int nlines,
+                                  int nsamps)
+{
+    if (m_image->std_file->veof >= whole_length(*m_image)) return CE_None;
+    const library_messages messages;
+    for (int i = 0; i < nbands; ++i) {
+        if (is_there(bands[i] - 1, line, samp, nlines, nsamps) ||
+            GetRasterBand(bands[i])->GetOverviewCount() > 0)
+            continue;
+        report_missing(bands[i] - 1, line, samp, nlines, nsamps);
+        return CE_Failure;
+    }
+    return CE_None;
+}
+
+CPLErr image_dataset::IRasterIO(GDALRWFlag direction, int samp, int line, int nsamps, int nlines,
+                                void *buffer, int buffer_nsamps, int buffer_nlines,
+                                GDALDataType buffer_type, int nbands, int *bands,
+                                GSpacing pixel_space, GSpacing line_space, GSpacing band_space,
+                                GDALRasterIOExtraArg *extra)
+{
+    if (direction == GF_Read && check_there(bands, nbands, line, samp, nlines, nsamps) != CE_None)
+        return CE_Failure;
+    return GDALPamDataset::IRasterIO(direction, samp, line, nsamps, nlines, buffer, buffer_nsamps,
+                                     buffer_nlines, buffer_type, nbands, bands, pixel_space,
+                                     line_space, band_space, extra);
 }
 
 image_dataset::~image_dataset()
@@ -220,10 +255,14 @@ CPLErr image_band::IRasterIO(GDALRWFlag direction, int samp, int line, int nsamp
                              GDALRasterIOExtraArg *extra)
 {
     if (buffer_nsamps != nsamps || buffer_nlines != nlines || buffer_type != eDataType ||
-        !is_exact(extra, samp, line, nsamps, nlines))
+        !is_exact(extra, samp, line, nsamps, nlines)) {
+        if (direction == GF_Read &&
+            images().check_there(&nBand, 1, line, samp, nlines, nsamps) != CE_None)
+            return CE_Failure;
         return GDALPamRasterBand::IRasterIO(direction, samp, line, nsamps, nlines, buffer,
                                             buffer_nsamps, buffer_nlines, buffer_type, pixel_space,
                                             line_space, extra);
+    }
     // Blocks that GDAL keeps are written first, and not kept beside what is written here.
     if (eAccess == GA_Update && FlushCache(false) != CE_None) return CE_Failure;
     const int nbytes = images().desc().nbytes;

@@ -38,7 +38,17 @@ public:
     CPLErr write(int band, int line, int samp, int nlines, int nsamps, const GByte *buffer,
                  int stride);
 
+    // Reports the first line of a region that the file does not hold in one of the bands, counted
+    // from 1.
+    CPLErr check_there(const int *bands, int nbands, int line, int samp, int nlines, int nsamps);
+
     const img_desc &desc() const { return *m_image; }
+
+protected:
+    CPLErr IRasterIO(GDALRWFlag direction, int samp, int line, int nsamps, int nlines, void *buffer,
+                     int buffer_nsamps, int buffer_nlines, GDALDataType buffer_type, int nbands,
+                     int *bands, GSpacing pixel_space, GSpacing line_space, GSpacing band_space,
+                     GDALRasterIOExtraArg *extra) override;
 
 private:
     bool is_there(int band, int line, int samp, int nlines, int nsamps) const;
