@@ -19,6 +19,7 @@
 namespace {
 
 constexpr int DEFAULT_TILE = 256;
+constexpr int MOST_BANDS = 65536;        // that GDAL's own drivers open
 constexpr int ROWS_OF_A_COPY = 1 << 22;  // bytes of untiled lines that are copied at a time
 
 // Ends `filename` on request, so that work that failed leaves no file.
@@ -59,6 +60,9 @@ std::unique_ptr<image_dataset> open_image(const image_format &format, const char
                     "has a header that describes no readable image");
     if (image->nlines == 0 || image->nsamps == 0 || image->nbands == 0)
         return fail(format, filename, CPLE_OpenFailed, "is an image without samples");
+    if (image->nbands > MOST_BANDS)
+        return fail(format, filename, CPLE_OpenFailed,
+                    "states " + std::to_string(image->nbands) + " bands, more than GDAL opens");
     if (updates) {
         if (image->std_file->veof < whole_length(*image))
             return fail(format, filename, CPLE_OpenFailed,

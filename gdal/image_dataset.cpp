@@ -56,7 +56,8 @@ image_dataset::image_dataset(const char *driver_name, std::string filename, img_
     eAccess = access;
     nRasterXSize = m_image->nsamps;
     nRasterYSize = m_image->nlines;
-    for (int band = 1; band <= m_image->nbands; ++band) SetBand(band, new image_band(this, band));
+    // The last one first: GDAL's table then has room for all at once.
+    for (int band = m_image->nbands; band > 0; --band) SetBand(band, new image_band(this, band));
     // Not through GDALPamDataset, which would write it to a side file.
     if (m_image->nbands > 1) GDALDataset::SetMetadataItem("INTERLEAVE", "BAND", "IMAGE_STRUCTURE");
 }
