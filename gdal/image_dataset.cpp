@@ -26,8 +26,11 @@ constexpr std::size_t SMALL_WINDOW = 16384;
 // Working memory of requests whose samples are spaced in the caller's buffer.
 constexpr std::size_t PIECE = std::size_t{1} << 20;
 
-bool is_exact(const GDALRasterIOExtraArg *extra, int samp, int line, int nsamps, int nlines)
+// True for a request that does not resample.
+bool is_exact(const GDALRasterIOExtraArg *extra, int samp, int line, int nsamps, int nlines,
+              int buffer_nsamps, int buffer_nlines)
 {
+    if (buffer_nsamps != nsamps || buffer_nlines != nlines) return false;
     if (extra == nullptr || extra->bFloatingPointWindowValidity == FALSE) return true;
     return extra->dfXOff == samp && extra->dfYOff == line && extra->dfXSize == nsamps &&
            extra->dfYSize == nlines;
@@ -84,8 +87,12 @@ void image_dataset::load_side_files(GDALOpenInfo *info)
 // Several bands, or blocks of GDAL's cache, are read one after the other. What is missing is seen
 // before the first of them reaches the caller's buffer.
 CPLErr image_dataset::check_there(const int *bands, int nbands, int line, int samp, int nlines,
-                                  int nsamps)
+                                  int nsamps, bool is_direct)
 {
+    if (!is_direct && !img_is_tiled(m_image.get())) {  // blocks are whole lines
+        samp = 0;
+        nsamps = nRasterXSize;
+    }
     if (m_image->std_file->veof >= whole_length(*m_image)) return CE_None;
     const library_messages messages;
     for (int i = 0; i < nbands; ++i) {
@@ -104,7 +111,11 @@ CPLErr image_dataset::IRasterIO(GDALRWFlag direction, int samp, int line, int ns
                                 GSpacing pixel_space, GSpacing line_space, GSpacing band_space,
                                 GDALRasterIOExtraArg *extra)
 {
-    if (direction == GF_Read && check_there(bands, nbands, line, samp, nlines, nsamps) != CE_None)
+    const bool is_direct =
+        buffer_type == GetRasterBand(1)->GetRasterDataType() &&
+        is_exact(extra, samp, line, nsamps, nlines, buffer_nsamps, buffer_nlines);
+    if (direction == GF_Read &&
+        check_there(bands, nbands, line, samp, nlines, nsamps, is_direct) != CE_None)
         return CE_Failure;
     return GDALPamDataset::IRasterIO(direction, samp, line, nsamps, nlines, buffer, buffer_nsamps,
                                      buffer_nlines, buffer_type, nbands, bands, pixel_space,
@@ -255,10 +266,10 @@ CPLErr image_band::IRasterIO(GDALRWFlag direction, int samp, int line, int nsamp
                              GDALDataType buffer_type, GSpacing pixel_space, GSpacing line_space,
                              GDALRasterIOExtraArg *extra)
 {
-    if (buffer_nsamps != nsamps || buffer_nlines != nlines || buffer_type != eDataType ||
-        !is_exact(extra, samp, line, nsamps, nlines)) {
+    if (buffer_type != eDataType ||
+        !is_exact(extra, samp, line, nsamps, nlines, buffer_nsamps, buffer_nlines)) {
         if (direction == GF_Read &&
-            images().check_there(&nBand, 1, line, samp, nlines, nsamps) != CE_None)
+            images().check_there(&nBand, 1, line, samp, nlines, nsamps, false) != CE_None)
             return CE_Failure;
         return GDALPamRasterBand::IRasterIO(direction, samp, line, nsamps, nlines, buffer,
                                             buffer_nsamps, buffer_nlines, buffer_type, pixel_space,

@@ -39,8 +39,9 @@ public:
                  int stride);
 
     // Reports the first line of a region that the file does not hold in one of the bands, counted
-    // from 1.
-    CPLErr check_there(const int *bands, int nbands, int line, int samp, int nlines, int nsamps);
+    // from 1. `is_direct` false: the region is read by whole blocks.
+    CPLErr check_there(const int *bands, int nbands, int line, int samp, int nlines, int nsamps,
+                       bool is_direct);
 
     const img_desc &desc() const { return *m_image; }
 
