@@ -25,6 +25,8 @@ namespace {
 constexpr std::size_t SMALL_WINDOW = 16384;
 // Working memory of requests whose samples are spaced in the caller's buffer.
 constexpr std::size_t PIECE = std::size_t{1} << 20;
+// Bytes of lines that are read at a time for a reader of one line after the other.
+constexpr std::size_t READ_AHEAD = std::size_t{1} << 17;
 
 // True for a request that does not resample.
 bool is_exact(const GDALRasterIOExtraArg *extra, int samp, int line, int nsamps, int nlines,
@@ -177,8 +179,9 @@ void image_dataset::report_missing(int band, int line, int samp, int nlines, int
              m_driver_name.c_str(), m_filename.c_str(), first, band + 1);
 }
 
-CPLErr image_dataset::read(int band, int line, int samp, int nlines, int nsamps, GByte *buffer,
-                           int stride)
+// Keeps the library's messages for report_missing.
+bool image_dataset::try_read(int band, int line, int samp, int nlines, int nsamps, GByte *buffer,
+                             int stride)
 {
     const library_messages messages;
     img_desc *const image = m_image.get();
@@ -199,8 +202,14 @@ CPLErr image_dataset::read(int band, int line, int samp, int nlines, int nsamps,
         done = is_there(band, line, samp, nlines, nsamps) &&
                img_read_raw(image, line, samp, nlines, nsamps, band, buffer, stride) == 0;
     }
-    if (done) return CE_None;
-    img_std_update_veof(image);
+    return done;
+}
+
+CPLErr image_dataset::read(int band, int line, int samp, int nlines, int nsamps, GByte *buffer,
+                           int stride)
+{
+    if (try_read(band, line, samp, nlines, nsamps, buffer, stride)) return CE_None;
+    img_std_update_veof(m_image.get());
     report_missing(band, line, samp, nlines, nsamps);
     return CE_Failure;
 }
@@ -240,8 +249,46 @@ GDALColorInterp image_band::GetColorInterpretation()
     return GCI_Undefined;
 }
 
+CPLErr image_band::FlushCache(bool is_closing)
+{
+    m_ahead.samples.reset();
+    return GDALPamRasterBand::FlushCache(is_closing);
+}
+
+// Reads a short line of an image that is not updated, and those behind it where the lines are asked
+// for in turn: one call of the library costs as much as the copy of many short lines. Returns false
+// when the line must be read alone.
+bool image_band::read_ahead(int line, GByte *buffer)
+{
+    const bool follows = line == m_ahead.expected;
+    m_ahead.expected = line + 1;
+    const int nbytes = images().desc().nbytes;
+    const std::size_t row =
+        static_cast<std::size_t>(nBlockXSize) * static_cast<std::size_t>(nbytes);
+    const bool is_read =
+        m_ahead.samples && line >= m_ahead.first && line - m_ahead.first < m_ahead.count;
+    if (!is_read) {
+        m_ahead.samples.reset();
+        if (!follows || line == 0 || row > READ_AHEAD / 4) return false;
+        m_ahead.first = line;
+        m_ahead.count = std::min(static_cast<int>(READ_AHEAD / row), nRasterYSize - line);
+        m_ahead.samples = new_samples(m_ahead.count, nBlockXSize, nbytes);
+        if (m_ahead.samples && !images().try_read(nBand - 1, line, 0, m_ahead.count, nBlockXSize,
+                                                  m_ahead.samples.get(), nBlockXSize))
+            m_ahead.samples.reset();
+        if (!m_ahead.samples) return false;
+    }
+    const int index = line - m_ahead.first;
+    std::memcpy(buffer, m_ahead.samples.get() + static_cast<std::size_t>(index) * row, row);
+    if (line == nRasterYSize - 1) m_ahead.samples.reset();
+    return true;
+}
+
 CPLErr image_band::IReadBlock(int block_x, int block_y, void *buffer)
 {
+    if (!img_is_tiled(&images().desc()) && eAccess == GA_ReadOnly &&
+        read_ahead(block_y, static_cast<GByte *>(buffer)))
+        return CE_None;
     const int samp = block_x * nBlockXSize, line = block_y * nBlockYSize;
     const int nsamps = std::min(nBlockXSize, nRasterXSize - samp);
     const int nlines = std::min(nBlockYSize, nRasterYSize - line);

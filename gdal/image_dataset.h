@@ -35,6 +35,8 @@ public:
     // Reads, or writes, a region inside the image. `buffer` has rows `stride` samples apart. A read
     // that fails leaves `buffer` alone, unless the file was cut during the read.
     CPLErr read(int band, int line, int samp, int nlines, int nsamps, GByte *buffer, int stride);
+    // As read, without a message.
+    bool try_read(int band, int line, int samp, int nlines, int nsamps, GByte *buffer, int stride);
     CPLErr write(int band, int line, int samp, int nlines, int nsamps, const GByte *buffer,
                  int stride);
 
@@ -64,6 +66,7 @@ public:
     image_band(image_dataset *dataset, int band);
 
     GDALColorInterp GetColorInterpretation() override;
+    CPLErr FlushCache(bool is_closing) override;
 
 protected:
     CPLErr IReadBlock(int block_x, int block_y, void *buffer) override;
@@ -77,6 +80,14 @@ private:
     image_dataset &images() const { return *static_cast<image_dataset *>(poDS); }
     CPLErr move_spaced(GDALRWFlag direction, int samp, int line, int nsamps, int nlines,
                        GByte *buffer, GSpacing pixel_space, GSpacing line_space);
+    bool read_ahead(int line, GByte *buffer);
+
+    // Lines that follow the last one that GDAL asked for as a block.
+    struct {
+        sample_buffer samples;  // null: none
+        int first = 0, count = 0;
+        int expected = 0;  // the line that a reader of all lines asks for next
+    } m_ahead;
 };
 
 // Returns the bytes that a file of this geometry has.
