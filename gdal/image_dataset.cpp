@@ -179,9 +179,8 @@ void image_dataset::report_missing(int band, int line, int samp, int nlines, int
              m_driver_name.c_str(), m_filename.c_str(), first, band + 1);
 }
 
-// Keeps the library's messages for report_missing.
-bool image_dataset::try_read(int band, int line, int samp, int nlines, int nsamps, GByte *buffer,
-                             int stride)
+CPLErr image_dataset::read(int band, int line, int samp, int nlines, int nsamps, GByte *buffer,
+                           int stride)
 {
     const library_messages messages;
     img_desc *const image = m_image.get();
@@ -202,16 +201,27 @@ bool image_dataset::try_read(int band, int line, int samp, int nlines, int nsamp
         done = is_there(band, line, samp, nlines, nsamps) &&
                img_read_raw(image, line, samp, nlines, nsamps, band, buffer, stride) == 0;
     }
-    return done;
-}
-
-CPLErr image_dataset::read(int band, int line, int samp, int nlines, int nsamps, GByte *buffer,
-                           int stride)
-{
-    if (try_read(band, line, samp, nlines, nsamps, buffer, stride)) return CE_None;
-    img_std_update_veof(m_image.get());
+    if (done) return CE_None;
+    img_std_update_veof(image);
     report_missing(band, line, samp, nlines, nsamps);
     return CE_Failure;
+}
+
+bool image_dataset::read_lines(int band, int line, int nlines, GByte *buffer)
+{
+    img_desc *const image = m_image.get();
+    // Lines may lie apart in files that other programs have made.
+    return (image->std_file->padded_nsamps == image->nsamps || nlines == 1) &&
+           img_read_raw_run(image, img_std_line_offset(image, line, 0, band),
+                            nlines * image->nsamps, buffer) == 0;
+}
+
+bool image_dataset::read_tile(int band, int tile_down, int tile_across, GByte *buffer)
+{
+    img_desc *const image = m_image.get();
+    const std::int64_t tile = std::int64_t{tile_down} * image->std_file->tiles_across + tile_across;
+    return img_read_raw_run(image, img_std_tile_offset(image, tile, band),
+                            image->tile_nlines * image->tile_nsamps, buffer) == 0;
 }
 
 CPLErr image_dataset::write(int band, int line, int samp, int nlines, int nsamps,
@@ -273,8 +283,8 @@ bool image_band::read_ahead(int line, GByte *buffer)
         m_ahead.first = line;
         m_ahead.count = std::min(static_cast<int>(READ_AHEAD / row), nRasterYSize - line);
         m_ahead.samples = new_samples(m_ahead.count, nBlockXSize, nbytes);
-        if (m_ahead.samples && !images().try_read(nBand - 1, line, 0, m_ahead.count, nBlockXSize,
-                                                  m_ahead.samples.get(), nBlockXSize))
+        if (m_ahead.samples &&
+            !images().read_lines(nBand - 1, line, m_ahead.count, m_ahead.samples.get()))
             m_ahead.samples.reset();
         if (!m_ahead.samples) return false;
     }
@@ -286,18 +296,15 @@ bool image_band::read_ahead(int line, GByte *buffer)
 
 CPLErr image_band::IReadBlock(int block_x, int block_y, void *buffer)
 {
-    if (!img_is_tiled(&images().desc()) && eAccess == GA_ReadOnly &&
-        read_ahead(block_y, static_cast<GByte *>(buffer)))
+    auto *const samples = static_cast<GByte *>(buffer);
+    const bool is_tiled = img_is_tiled(&images().desc());
+    if (is_tiled ? images().read_tile(nBand - 1, block_y, block_x, samples)
+                 : eAccess == GA_ReadOnly && read_ahead(block_y, samples))
         return CE_None;
     const int samp = block_x * nBlockXSize, line = block_y * nBlockYSize;
     const int nsamps = std::min(nBlockXSize, nRasterXSize - samp);
     const int nlines = std::min(nBlockYSize, nRasterYSize - line);
-    if (nsamps < nBlockXSize || nlines < nBlockYSize)
-        std::memset(buffer, 0,
-                    static_cast<std::size_t>(nBlockXSize) * static_cast<std::size_t>(nBlockYSize) *
-                        static_cast<std::size_t>(images().desc().nbytes));
-    return images().read(nBand - 1, line, samp, nlines, nsamps, static_cast<GByte *>(buffer),
-                         nBlockXSize);
+    return images().read(nBand - 1, line, samp, nlines, nsamps, samples, nBlockXSize);
 }
 
 CPLErr image_band::IWriteBlock(int block_x, int block_y, void *buffer)

@@ -35,8 +35,10 @@ public:
     // Reads, or writes, a region inside the image. `buffer` has rows `stride` samples apart. A read
     // that fails leaves `buffer` alone, unless the file was cut during the read.
     CPLErr read(int band, int line, int samp, int nlines, int nsamps, GByte *buffer, int stride);
-    // As read, without a message.
-    bool try_read(int band, int line, int samp, int nlines, int nsamps, GByte *buffer, int stride);
+    // Read whole lines, or a tile with what lies behind the image's edges, at once and without a
+    // message; `buffer` may be partly written after a failure.
+    bool read_lines(int band, int line, int nlines, GByte *buffer);
+    bool read_tile(int band, int tile_down, int tile_across, GByte *buffer);
     CPLErr write(int band, int line, int samp, int nlines, int nsamps, const GByte *buffer,
                  int stride);
 

@@ -15,6 +15,8 @@
 #include "chain/chain_links.h"
 #include "chain/stretch.h"
 #include "io/io_method.h"
+#include "std/std_bytes.h"
+#include "std/std_samples.h"
 
 #include <cerrno>
 #include <new>
@@ -364,4 +366,15 @@ std::int32_t img_write_raw(img_desc *desc, std::int32_t line, std::int32_t samp,
     const img_call call;
     return img_type_of(desc).write(desc, line, samp, nlines, nsamps, band, buffer, stride,
                                    /*fill=*/nullptr);
+}
+
+std::int32_t img_read_raw_run(img_desc *desc, std::int64_t offset, std::int32_t nsamps,
+                              std::uint8_t *buffer)
+{
+    const img_call call;
+    const std::int32_t length = nsamps * desc->nbytes;
+    if (img_std_read_at(desc, offset, buffer, length) != length) return -1;
+    if (img_std_exchanges_bytes(desc))
+        img_std_exchange_bytes(buffer, buffer, static_cast<std::size_t>(nsamps));
+    return 0;
 }
