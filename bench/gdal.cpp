@@ -199,11 +199,12 @@ bool agree(const image_pair &images)
 
 // --- Tasks ---
 
-// What one driver does in a round.
+// What one driver does in a round; only `run` is timed.
 struct candidate {
-    std::function<void()> prepare;  // not timed
-    std::function<void()> run;
+    std::function<void()> prepare, run, finish;
 };
+
+void nothing() {}
 
 struct task {
     const char *name;
@@ -211,46 +212,57 @@ struct task {
     std::function<candidate(const image_pair &, int which)> make;
 };
 
-// Windows of a data set that stays open; all candidates share one buffer, because the speed of a
-// copy depends on its place.
-candidate reads(const image_pair &images, int which, const std::vector<window> &windows)
+// Windows of a data set with an empty block cache. `again`: that has read them all before. All
+// candidates share one buffer, because the speed of a copy depends on its place.
+candidate reads(const image_pair &images, int which, const std::vector<window> &windows, bool again)
 {
     static std::vector<GByte> buffer;
     buffer.resize(std::max(buffer.size(), size_of(images, windows.front().side)));
-    const auto image = std::make_shared<dataset>(open(images.paths[which]));
-    return {.prepare = [] {},
-            .run =
-                [=, &images] {
-                    for (const window &each : windows) read(*image, images, each, buffer.data());
-                }};
+    const auto image = std::make_shared<dataset>();
+    const auto run = [=, &images] {
+        for (const window &each : windows) read(*image, images, each, buffer.data());
+    };
+    const auto prepare = [=, &images] {
+        *image = open(images.paths[which]);
+        if (again) run();
+    };
+    return {prepare, run, [=] { image->reset(); }};
 }
 
-candidate reads_bands(const image_pair &images, int which)
+std::function<candidate(const image_pair &, int)> reads_windows(int side, int count, bool again)
 {
-    return reads(images, which, {{0, 0, images.side}});
+    return [=](const image_pair &images, int which) {
+        return reads(images, which, windows_anywhere(images, side, count), again);
+    };
+}
+
+std::function<candidate(const image_pair &, int)> reads_bands(bool again)
+{
+    return [=](const image_pair &images, int which) {
+        return reads(images, which, {{0, 0, images.side}}, again);
+    };
 }
 
 candidate computes_statistics(const image_pair &images, int which)
 {
     const std::string &path = images.paths[which];
-    return {.prepare = [&path] { VSIUnlink((path + ".aux.xml").c_str()); },
-            .run =
-                [&] {
-                    const dataset image = open(path);
-                    for (int band = 1; band <= images.nbands; ++band) {
-                        double numbers[4];
-                        check(GDALComputeRasterStatistics(
-                            GDALGetRasterBand(image.get(), band), FALSE, &numbers[0], &numbers[1],
-                            &numbers[2], &numbers[3], nullptr, nullptr));
-                    }
-                }};
+    const auto run = [&] {
+        const dataset image = open(path);
+        for (int band = 1; band <= images.nbands; ++band) {
+            double numbers[4];
+            check(GDALComputeRasterStatistics(GDALGetRasterBand(image.get(), band), FALSE,
+                                              &numbers[0], &numbers[1], &numbers[2], &numbers[3],
+                                              nullptr, nullptr));
+        }
+    };
+    return {nothing, run, [&path] { VSIUnlink((path + ".aux.xml").c_str()); }};
 }
 
 candidate copies(const std::string &from, const char *driver, const option_list &options,
                  const std::string &to)
 {
-    return {.prepare = [=] { remove_image(to); },
-            .run = [=, &options] { copy(open(from), driver, to, options); }};
+    return {nothing, [=, &options] { copy(open(from), driver, to, options); },
+            [=] { remove_image(to); }};
 }
 
 candidate copies_to_tiff(const image_pair &images, int which)
@@ -270,11 +282,10 @@ std::function<candidate(const image_pair &, int)> copies_from_tiff(const std::st
 candidate opens(const image_pair &images, int which, int count)
 {
     const std::string &path = images.paths[which];
-    return {.prepare = [] {},
-            .run =
-                [=, &path] {
-                    for (int i = 0; i < count; ++i) open(path);
-                }};
+    const auto run = [=, &path] {
+        for (int i = 0; i < count; ++i) open(path);
+    };
+    return {nothing, run, nothing};
 }
 
 void forget_pages(const std::filesystem::path &path)
@@ -290,25 +301,22 @@ void forget_pages(const std::filesystem::path &path)
 candidate opens_cold(const image_pair &images, int which)
 {
     const std::filesystem::path path = images.paths[which];
-    return {.prepare =
-                [=] {
-                    forget_pages(path);
-                    forget_pages(std::filesystem::path(path).replace_extension(".hdr"));
-                },
-            .run = [=] { open(path); }};
+    const auto prepare = [=] {
+        forget_pages(path);
+        forget_pages(std::filesystem::path(path).replace_extension(".hdr"));
+    };
+    return {prepare, [=] { open(path); }, nothing};
 }
 
 std::vector<task> make_tasks(const std::string &memory_folder, bool small)
 {
-    const auto windows = [](int side, int count) {
-        return [=](const image_pair &images, int which) {
-            return reads(images, which, windows_anywhere(images, side, count));
-        };
-    };
     const int many = small ? 20 : 2000, some = small ? 2 : 100, nopens = small ? 10 : 1000;
-    return {{"windows of 64", many, windows(64, many)},
-            {"windows of 512", some, windows(512, some)},
-            {"whole bands", 1, reads_bands},
+    return {{"windows of 64", many, reads_windows(64, many, false)},
+            {"windows of 64, again", many, reads_windows(64, many, true)},
+            {"windows of 512", some, reads_windows(512, some, false)},
+            {"windows of 512, again", some, reads_windows(512, some, true)},
+            {"whole bands", 1, reads_bands(false)},
+            {"whole bands, again", 1, reads_bands(true)},
             {"statistics", 1, computes_statistics},
             {"to GTiff in /vsimem/", 1, copies_to_tiff},
             {"from GTiff to a file", 1, copies_from_tiff(memory_folder)},
@@ -326,7 +334,9 @@ double microseconds(const candidate &worker, int requests)
     worker.prepare();
     const auto start = clock::now();
     worker.run();
-    return std::chrono::duration<double, std::micro>(clock::now() - start).count() / requests;
+    const std::chrono::duration<double, std::micro> taken = clock::now() - start;
+    worker.finish();
+    return taken.count() / requests;
 }
 
 double median(std::vector<double> numbers)
@@ -351,7 +361,6 @@ void measure(const task &work, const image_pair &images, int rounds)
         times[1].push_back(now[1]);
         ratios.push_back(now[0] / now[1]);
     }
-    for (const candidate &each : workers) each.prepare();  // removes what was written
     const auto [least, most] = std::minmax_element(ratios.begin(), ratios.end());
     std::printf("%-22s %-24s %-6s%12.2f%12.2f%8.2f%8.2f%8.2f\n", images.name, work.name,
                 images.drivers[1], median(times[0]), median(times[1]), median(ratios), *least,

@@ -11,6 +11,7 @@
 #include "std/std.h"
 #include "std/std_bytes.h"
 #include "std/std_offset.h"
+#include "std/std_samples.h"
 
 #include <algorithm>
 #include <array>
@@ -27,6 +28,11 @@ constexpr std::size_t SMALL_WINDOW = 16384;
 constexpr std::size_t PIECE = std::size_t{1} << 20;
 // Bytes of lines that are read at a time for a reader of one line after the other.
 constexpr std::size_t READ_AHEAD = std::size_t{1} << 17;
+
+struct drop_block {
+    void operator()(GDALRasterBlock *block) const { block->DropLock(); }
+};
+using locked_block = std::unique_ptr<GDALRasterBlock, drop_block>;
 
 // True for a request that does not resample.
 bool is_exact(const GDALRasterIOExtraArg *extra, int samp, int line, int nsamps, int nlines,
@@ -315,6 +321,61 @@ CPLErr image_band::IWriteBlock(int block_x, int block_y, void *buffer)
                           static_cast<const GByte *>(buffer), nBlockXSize);
 }
 
+// Counts a small window. True when GDAL's cache should answer it: no copy from a file is as quick
+// as one from a block in memory. A block is worth its reading where the windows have touched each
+// tile about once, so that more will follow, and the cache keeps all tiles.
+bool image_band::has_cached_blocks(int nsamps, int nlines)
+{
+    constexpr std::int64_t smallest_image = 1 << 20;  // bytes
+    const img_desc &image = images().desc();
+    const img_std_file &file = *image.std_file;
+    const std::int64_t size = std::int64_t{file.band_size} * image.nbands;
+    if (!img_is_tiled(&image) || eAccess != GA_ReadOnly || size < smallest_image ||
+        std::int64_t{nsamps} * nlines * image.nbytes > static_cast<std::int64_t>(SMALL_WINDOW) ||
+        file.veof < whole_length(image) || size > GDALGetCacheMax64())
+        return false;
+    constexpr int tiles_per_window = 8;  // of the windows that show that more follow
+    return ++m_small_windows > std::int64_t{file.tiles_across} * file.tiles_down / tiles_per_window;
+}
+
+// Copies a small window from GDAL's blocks. Returns false, with the caller's memory as it was, when
+// the window must be read otherwise.
+bool image_band::read_from_blocks(int samp, int line, int nsamps, int nlines, GByte *buffer,
+                                  GSpacing line_space)
+{
+    const auto size = static_cast<std::size_t>(images().desc().nbytes);
+    const int left = samp / nBlockXSize, right = (samp + nsamps - 1) / nBlockXSize;
+    const int top = line / nBlockYSize, bottom = (line + nlines - 1) / nBlockYSize;
+    if (right - left > 1 || bottom - top > 1 || line_space < 0) return false;
+    std::array<locked_block, 4> blocks;  // all, before the first is copied
+    for (int y = top; y <= bottom; ++y)
+        for (int x = left; x <= right; ++x) {
+            locked_block &block = blocks[static_cast<std::size_t>((y - top) * 2 + x - left)];
+            block.reset(GetLockedBlockRef(x, y));
+            if (!block) return false;
+        }
+    for (int y = top; y <= bottom; ++y)
+        for (int x = left; x <= right; ++x) {
+            const int first_line = std::max(line - y * nBlockYSize, 0);
+            const int first_samp = std::max(samp - x * nBlockXSize, 0);
+            const int end_line = std::min(line + nlines - y * nBlockYSize, nBlockYSize);
+            const int end_samp = std::min(samp + nsamps - x * nBlockXSize, nBlockXSize);
+            const auto *const rows = static_cast<const GByte *>(
+                blocks[static_cast<std::size_t>((y - top) * 2 + x - left)]->GetDataRef());
+            const auto start =
+                static_cast<std::size_t>(first_line) * static_cast<std::size_t>(nBlockXSize) +
+                static_cast<std::size_t>(first_samp);
+            img_std_copy_rows(
+                {rows + start * size, static_cast<std::size_t>(nBlockXSize) * size, size},
+                buffer + (y * nBlockYSize + first_line - line) * line_space +
+                    static_cast<std::size_t>(x * nBlockXSize + first_samp - samp) * size,
+                static_cast<std::size_t>(line_space),
+                static_cast<std::size_t>(end_line - first_line),
+                static_cast<std::size_t>(end_samp - first_samp), images().desc().nbytes, false);
+        }
+    return true;
+}
+
 CPLErr image_band::IRasterIO(GDALRWFlag direction, int samp, int line, int nsamps, int nlines,
                              void *buffer, int buffer_nsamps, int buffer_nlines,
                              GDALDataType buffer_type, GSpacing pixel_space, GSpacing line_space,
@@ -337,7 +398,10 @@ CPLErr image_band::IRasterIO(GDALRWFlag direction, int samp, int line, int nsamp
     const bool is_packed = pixel_space == nbytes && line_space % nbytes == 0 && stride >= nsamps &&
                            stride * nlines <= INT32_MAX / nbytes;
     CPLErr result = CE_None;
-    if (!is_packed)
+    if (direction == GF_Read && pixel_space == nbytes && has_cached_blocks(nsamps, nlines) &&
+        read_from_blocks(samp, line, nsamps, nlines, samples, line_space))
+        result = CE_None;
+    else if (!is_packed)
         result =
             move_spaced(direction, samp, line, nsamps, nlines, samples, pixel_space, line_space);
     else if (direction == GF_Read)

@@ -83,7 +83,11 @@ private:
     CPLErr move_spaced(GDALRWFlag direction, int samp, int line, int nsamps, int nlines,
                        GByte *buffer, GSpacing pixel_space, GSpacing line_space);
     bool read_ahead(int line, GByte *buffer);
+    bool has_cached_blocks(int nsamps, int nlines);
+    bool read_from_blocks(int samp, int line, int nsamps, int nlines, GByte *buffer,
+                          GSpacing line_space);
 
+    std::int64_t m_small_windows = 0;  // that were read
     // Lines that follow the last one that GDAL asked for as a block.
     struct {
         sample_buffer samples;  // null: none
