@@ -326,7 +326,7 @@ CPLErr image_band::IWriteBlock(int block_x, int block_y, void *buffer)
 // tile about once, so that more will follow, and the cache keeps all tiles.
 bool image_band::has_cached_blocks(int nsamps, int nlines)
 {
-    constexpr std::int64_t smallest_image = 1 << 20;  // bytes
+    constexpr std::int64_t smallest_image = 1 << 18;  // bytes
     const img_desc &image = images().desc();
     const img_std_file &file = *image.std_file;
     const std::int64_t size = std::int64_t{file.band_size} * image.nbands;
