@@ -195,17 +195,18 @@ CPLErr image_dataset::read(int band, int line, int samp, int nlines, int nsamps,
     const std::size_t pitch =
         static_cast<std::size_t>(stride) * static_cast<std::size_t>(image->nbytes);
     const bool is_small = row * static_cast<std::size_t>(nlines) <= SMALL_WINDOW;
-    bool done = false;
-    if (is_small) {
+    bool done = is_small && is_there(band, line, samp, nlines, nsamps);
+    if (!done) {
+        img_std_update_veof(image);  // the file may have grown, too
+        done = is_there(band, line, samp, nlines, nsamps);
+    }
+    if (done && is_small) {
         std::array<GByte, SMALL_WINDOW> samples;
-        done = is_there(band, line, samp, nlines, nsamps) &&
-               img_read_raw(image, line, samp, nlines, nsamps, band, samples.data(), nsamps) == 0;
+        done = img_read_raw(image, line, samp, nlines, nsamps, band, samples.data(), nsamps) == 0;
         for (std::size_t i = 0; done && i < static_cast<std::size_t>(nlines); ++i)
             std::memcpy(buffer + i * pitch, samples.data() + i * row, row);
-    } else {
-        img_std_update_veof(image);
-        done = is_there(band, line, samp, nlines, nsamps) &&
-               img_read_raw(image, line, samp, nlines, nsamps, band, buffer, stride) == 0;
+    } else if (done) {
+        done = img_read_raw(image, line, samp, nlines, nsamps, band, buffer, stride) == 0;
     }
     if (done) return CE_None;
     img_std_update_veof(image);
