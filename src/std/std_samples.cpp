@@ -66,7 +66,8 @@ inline void copy_short_row(const std::uint8_t *source, std::uint8_t *target, std
 }
 
 // Calls `copy(source, target)` for each row, and prefetches the rows that follow soon. Rows on
-// pages of their own are out of reach of the processor's own prefetching.
+// pages of their own are out of reach of the processor's own prefetching; rows without gaps are
+// not.
 template <typename Copy>
 inline void copy_each_row(const img_std_rows &rows, std::uint8_t *target, std::size_t target_pitch,
                           std::size_t nrows, std::size_t row_length, Copy copy)
@@ -79,7 +80,7 @@ inline void copy_each_row(const img_std_rows &rows, std::uint8_t *target, std::s
     const std::size_t prefetched = std::min(row_length, bytes_ahead / 2);
     for (std::size_t row = 0; row < nrows; ++row) {
         const std::uint8_t *const source = rows.first + row * rows.pitch;
-        if (row + ahead < nrows)
+        if (rows.pitch > row_length && row + ahead < nrows)
             for (std::size_t i = 0; i < prefetched; i += cache_line)
                 __builtin_prefetch(source + ahead * rows.pitch + i);
         copy(source, target + row * target_pitch);
