@@ -322,6 +322,20 @@ CPLErr image_band::IWriteBlock(int block_x, int block_y, void *buffer)
                           static_cast<const GByte *>(buffer), nBlockXSize);
 }
 
+// True when GDAL keeps a block of the window that was not written yet, or that a write would make
+// old.
+bool image_band::has_block_in_the_way(GDALRWFlag direction, int samp, int line, int nsamps,
+                                      int nlines)
+{
+    const int right = (samp + nsamps - 1) / nBlockXSize, bottom = (line + nlines - 1) / nBlockYSize;
+    for (int y = line / nBlockYSize; y <= bottom; ++y)
+        for (int x = samp / nBlockXSize; x <= right; ++x) {
+            const locked_block block(TryGetLockedBlockRef(x, y));
+            if (block && (direction == GF_Write || block->GetDirty())) return true;
+        }
+    return false;
+}
+
 // Counts a small window. True when GDAL's cache should answer it: no copy from a file is as quick
 // as one from a block in memory. A block is worth its reading where the windows have touched each
 // tile about once, so that more will follow, and the cache keeps all tiles.
@@ -391,8 +405,9 @@ CPLErr image_band::IRasterIO(GDALRWFlag direction, int samp, int line, int nsamp
                                             buffer_nsamps, buffer_nlines, buffer_type, pixel_space,
                                             line_space, extra);
     }
-    // Blocks that GDAL keeps are written first, and not kept beside what is written here.
-    if (eAccess == GA_Update && FlushCache(false) != CE_None) return CE_Failure;
+    if (eAccess == GA_Update && has_block_in_the_way(direction, samp, line, nsamps, nlines) &&
+        FlushCache(false) != CE_None)
+        return CE_Failure;
     const int nbytes = images().desc().nbytes;
     const GSpacing stride = line_space / nbytes;
     auto *const samples = static_cast<GByte *>(buffer);

@@ -83,6 +83,7 @@ private:
     CPLErr move_spaced(GDALRWFlag direction, int samp, int line, int nsamps, int nlines,
                        GByte *buffer, GSpacing pixel_space, GSpacing line_space);
     bool read_ahead(int line, GByte *buffer);
+    bool has_block_in_the_way(GDALRWFlag direction, int samp, int line, int nsamps, int nlines);
     bool has_cached_blocks(int nsamps, int nlines);
     bool read_from_blocks(int samp, int line, int nsamps, int nlines, GByte *buffer,
                           GSpacing line_space);
