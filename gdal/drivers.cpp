@@ -6,6 +6,7 @@
 #include "storage.h"
 
 #include "base/img_desc.h"
+#include "formats/helava.h"
 #include "formats/vitec.h"
 #include "std/std.h"
 
@@ -15,6 +16,7 @@
 #include <cstring>
 #include <memory>
 #include <string>
+#include <system_error>
 
 namespace {
 
@@ -55,6 +57,9 @@ std::unique_ptr<image_dataset> open_image(const image_format &format, const char
     const bool updates = access == GA_Update;
     // A file opened for writing is completed when it is closed: look at it before.
     img_raw_image image = img_open_raw(filename, storage_of(filename), IMG_OPEN_READ_ONLY);
+    if (!image && errno != EINVAL)
+        return fail(format, filename, CPLE_OpenFailed,
+                    "cannot be opened: " + std::generic_category().message(errno));
     if (!image || image->type != format.type)
         return fail(format, filename, CPLE_OpenFailed,
                     "has a header that describes no readable image");
@@ -116,12 +121,14 @@ bool read_side(const image_format &format, const char *filename, char **options,
 }
 
 // Reads the creation options. Returns false after an error.
-bool read_options(const image_format &format, const char *filename, char **options, tiling *tiles)
+bool read_options(const image_format &format, const char *filename, char **options, int nsamps,
+                  tiling *tiles)
 {
     if (!format.has_tiles) return true;
-    const bool has_side = CSLFetchNameValue(options, "BLOCKXSIZE") != nullptr ||
-                          CSLFetchNameValue(options, "BLOCKYSIZE") != nullptr;
-    if (!CPLFetchBool(options, "TILED", has_side)) return true;
+    // Programs hand on the blocks of an untiled image: lines of its whole width.
+    const char *const width = CSLFetchNameValue(options, "BLOCKXSIZE");
+    const bool has_width = width != nullptr && width != std::to_string(nsamps);
+    if (!CPLFetchBool(options, "TILED", has_width)) return true;
     *tiles = {DEFAULT_TILE, DEFAULT_TILE};
     return read_side(format, filename, options, "BLOCKXSIZE", &tiles->width) &&
            read_side(format, filename, options, "BLOCKYSIZE", &tiles->height);
@@ -147,13 +154,15 @@ bool create_file(const image_format &format, const char *filename, int nsamps, i
     if (const std::string reason = refusal(format, nbands, type); !reason.empty())
         return fail(format, filename, CPLE_NotSupported, "the format " + reason) != nullptr;
     tiling tiles;
-    if (!read_options(format, filename, options, &tiles)) return false;
+    if (!read_options(format, filename, options, nsamps, &tiles)) return false;
     const int nbytes = GDALGetDataTypeSizeBytes(type);
     const auto padded = [](std::int64_t extent, int side) {
         return side == 0 ? extent : (extent + side - 1) / side * side;
     };
+    const int header =
+        format.type == IMG_TYPE_VITEC ? int{IMG_VITEC_DATA_OFFSET} : int{IMG_HELAVA_TRAILER_LENGTH};
     if (padded(nlines, tiles.height) * padded(nsamps, tiles.width) >
-        INT32_MAX / nbytes / nbands - IMG_VITEC_DATA_OFFSET)
+        (INT32_MAX - header) / nbytes / nbands)
         return fail(format, filename, CPLE_NotSupported, "the file would have 2 GiB or more") !=
                nullptr;
 
@@ -162,9 +171,13 @@ bool create_file(const image_format &format, const char *filename, int nsamps, i
     errno = 0;
     img_raw_image image = img_create_raw(filename, storage_of(filename), nlines, nsamps, nbands,
                                          format.type, tiles.width, tiles.height, nbytes);
-    if (!image)
+    if (!image) {
+        const int error = errno;
+        // The file was there before, and stays.
+        if (error == EACCES || error == EPERM || error == EROFS || error == EISDIR) file.keep();
         return fail(format, filename, CPLE_OpenFailed,
-                    "cannot be created: " + std::string(std::strerror(errno))) != nullptr;
+                    "cannot be created: " + std::generic_category().message(error)) != nullptr;
+    }
     const std::int64_t expected = whole_length(*image);
     take_close_error();
     image.reset();  // completes the file
@@ -199,28 +212,24 @@ GDALDataset *create_helava(const char *filename, int nsamps, int nlines, int nba
 
 // --- Copying ---
 
-// Something of the source that the copy will not have: an error where the caller is strict, else a
-// warning. Returns false when the copy must not be made.
-bool accept_loss(const image_format &format, const char *filename, bool is_strict,
-                 const std::string &what)
-{
-    CPLError(is_strict ? CE_Failure : CE_Warning, CPLE_NotSupported, "%s: %s: %s", format.name,
-             filename, what.c_str());
-    return !is_strict;
-}
-
-// Returns the type in which the source is stored, GDT_Unknown after an error.
+// Returns the type in which the source is stored: another than its own is an error where the caller
+// is strict, else a warning. GDT_Unknown after an error.
 GDALDataType stored_type(const image_format &format, const char *filename, GDALDataset *source,
                          bool is_strict)
 {
     GDALDataType type = source->GetRasterBand(1)->GetRasterDataType();
     for (int band = 2; band <= source->GetRasterCount(); ++band)
         type = GDALDataTypeUnion(type, source->GetRasterBand(band)->GetRasterDataType());
-    if (refusal(format, 1, type).empty()) return type;
+    const std::string reason = refusal(format, 1, type);
+    if (reason.empty()) return type;
+    if (is_strict) {
+        fail(format, filename, CPLE_NotSupported, "the format " + reason);
+        return GDT_Unknown;
+    }
     const GDALDataType nearest = format.has_two_bytes ? GDT_UInt16 : GDT_Byte;
-    const std::string what = std::string("samples of type ") + GDALGetDataTypeName(type) +
-                             " are stored as " + GDALGetDataTypeName(nearest);
-    return accept_loss(format, filename, is_strict, what) ? nearest : GDT_Unknown;
+    CPLError(CE_Warning, CPLE_NotSupported, "%s: %s: samples of type %s are stored as %s",
+             format.name, filename, GDALGetDataTypeName(type), GDALGetDataTypeName(nearest));
+    return nearest;
 }
 
 // Returns false after an error: the caller cancels.

@@ -17,6 +17,7 @@
 #include <array>
 #include <cerrno>
 #include <cstring>
+#include <system_error>
 #include <utility>
 
 namespace {
@@ -70,6 +71,7 @@ image_dataset::image_dataset(const char *driver_name, std::string filename, img_
     // The last one first: GDAL's table then has room for all at once.
     for (int band = m_image->nbands; band > 0; --band) SetBand(band, new image_band(this, band));
     // Not through GDALPamDataset, which would write it to a side file.
+    // NOLINTNEXTLINE(bugprone-parent-virtual-call)
     if (m_image->nbands > 1) GDALDataset::SetMetadataItem("INTERLEAVE", "BAND", "IMAGE_STRUCTURE");
 }
 
@@ -144,9 +146,19 @@ CPLErr image_dataset::close_image()
     const int error = take_close_error();
     if (error == 0 || eAccess == GA_ReadOnly) return CE_None;
     CPLError(CE_Failure, CPLE_FileIO, "%s: %s: not all samples could be stored: %s",
-             m_driver_name.c_str(), m_filename.c_str(), std::strerror(error));
+             m_driver_name.c_str(), m_filename.c_str(),
+             std::generic_category().message(error).c_str());
     return CE_Failure;
 }
+
+#if GDAL_VERSION_NUM >= GDAL_COMPUTE_VERSION(3, 7, 0)
+CPLErr image_dataset::Close()
+{
+    const CPLErr flushed = FlushCache(true), ended = close_image();
+    const CPLErr closed = GDALPamDataset::Close();
+    return std::max({flushed, ended, closed});
+}
+#endif
 
 // True when the file holds all that a read of the region needs, by its length as last seen.
 bool image_dataset::is_there(int band, int line, int samp, int nlines, int nsamps) const
@@ -396,7 +408,7 @@ CPLErr image_band::IRasterIO(GDALRWFlag direction, int samp, int line, int nsamp
                              GDALDataType buffer_type, GSpacing pixel_space, GSpacing line_space,
                              GDALRasterIOExtraArg *extra)
 {
-    if (buffer_type != eDataType ||
+    if (buffer_type != eDataType || pixel_space != static_cast<int>(pixel_space) ||
         !is_exact(extra, samp, line, nsamps, nlines, buffer_nsamps, buffer_nlines)) {
         if (direction == GF_Read &&
             images().check_there(&nBand, 1, line, samp, nlines, nsamps, false) != CE_None)
@@ -412,7 +424,7 @@ CPLErr image_band::IRasterIO(GDALRWFlag direction, int samp, int line, int nsamp
     const GSpacing stride = line_space / nbytes;
     auto *const samples = static_cast<GByte *>(buffer);
     const bool is_packed = pixel_space == nbytes && line_space % nbytes == 0 && stride >= nsamps &&
-                           stride * nlines <= INT32_MAX / nbytes;
+                           stride <= INT32_MAX / nbytes / nlines;
     CPLErr result = CE_None;
     if (direction == GF_Read && pixel_space == nbytes && has_cached_blocks(nsamps, nlines) &&
         read_from_blocks(samp, line, nsamps, nlines, samples, line_space))
@@ -427,8 +439,10 @@ CPLErr image_band::IRasterIO(GDALRWFlag direction, int samp, int line, int nsamp
         result = images().write(nBand - 1, line, samp, nlines, nsamps, samples,
                                 static_cast<int>(stride));
     if (result == CE_None && extra != nullptr && extra->pfnProgress != nullptr &&
-        extra->pfnProgress(1.0, "", extra->pProgressData) == FALSE)
+        extra->pfnProgress(1.0, "", extra->pProgressData) == FALSE) {
+        CPLError(CE_Failure, CPLE_UserInterrupt, "User terminated");
         return CE_Failure;
+    }
     return result;
 }
 

@@ -31,6 +31,9 @@ public:
     void load_side_files(GDALOpenInfo *info);
     // Writes what waits in GDAL's cache, ends the image, and reports what could not be stored.
     CPLErr close_image();
+#if GDAL_VERSION_NUM >= GDAL_COMPUTE_VERSION(3, 7, 0)
+    CPLErr Close() override;
+#endif
 
     // Reads, or writes, a region inside the image. `buffer` has rows `stride` samples apart. A read
     // that fails leaves `buffer` alone, unless the file was cut during the read.
@@ -47,7 +50,10 @@ public:
     CPLErr check_there(const int *bands, int nbands, int line, int samp, int nlines, int nsamps,
                        bool is_direct);
 
-    const img_desc &desc() const { return *m_image; }
+    const img_desc &desc() const
+    {
+        return *m_image;
+    }
 
 protected:
     CPLErr IRasterIO(GDALRWFlag direction, int samp, int line, int nsamps, int nlines, void *buffer,

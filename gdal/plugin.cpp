@@ -5,8 +5,10 @@
 
 extern "C" {
 
+// NOLINTBEGIN(readability-identifier-naming): GDAL gives the names
 [[gnu::visibility("default")]] void GDALRegister_IMGFILE();
 [[gnu::visibility("default")]] void GDALRegisterMe();
+// NOLINTEND(readability-identifier-naming)
 
 void GDALRegister_IMGFILE()
 {

@@ -19,7 +19,9 @@ namespace {
 constexpr char METHOD_NAME[] = "vsi";
 
 std::mutex table_mutex;
-std::vector<VSILFILE *> open_files;  // by descriptor; null: free. Guarded by table_mutex
+// By descriptor; null: free. Guarded by table_mutex. Never destroyed: GDAL may close data sets
+// after the plugin's destructors have run.
+std::vector<VSILFILE *> &open_files = *new std::vector<VSILFILE *>;
 
 thread_local int close_error = 0;
 

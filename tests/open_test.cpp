@@ -148,6 +148,20 @@ TEST_F(Open, RawImagesShowStoredSamplesAndNeedNoHandle)
                            reinterpret_cast<std::uint8_t *>(stored.data()), 2),
               0);
     EXPECT_EQ(stored, (std::array<std::uint16_t, 2>{0, sample}));
+    stored = {};
+    const auto read_run = [&](std::int64_t samples_before, std::int32_t nsamps) {
+        return img_read_raw_run(images[0].get(), VITEC_HEADER + samples_before * 2, nsamps,
+                                reinterpret_cast<std::uint8_t *>(stored.data()));
+    };
+    EXPECT_EQ(read_run(13, 2), 0);
+    EXPECT_EQ(stored, (std::array<std::uint16_t, 2>{0, sample}));
+    EXPECT_EQ(read_run(14, 2), -1);
+    std::uint8_t byte = 1;
+    images.push_back(img_create_raw(m_file.c_str(), nullptr, 2, 2, 1, IMG_TYPE_HELAVA, 0, 0, 1));
+    EXPECT_EQ(img_write_raw(images[1].get(), 1, 1, 1, 1, 0, &byte, 1), 0);
+    byte = 9;
+    EXPECT_EQ(img_read_raw_run(images[1].get(), 3, 1, &byte), 0);
+    EXPECT_EQ(byte, 1);
 
     const auto fails = [](const img_raw_image &image, int error) {
         EXPECT_TRUE(!image && errno == error) << errno;
@@ -156,6 +170,13 @@ TEST_F(Open, RawImagesShowStoredSamplesAndNeedNoHandle)
     fails(img_create_raw(m_file.c_str(), nullptr, 3, 5, 1, IMG_TYPE_HELAVA, 0, 0, 2), EINVAL);
     fails(img_create_raw(m_file.c_str(), nullptr, 3, 5, 1, IMG_NO_TYPE, 0, 0, 1), EINVAL);
     fails(img_create_raw((m_folder / "no/scene").c_str(), nullptr, 3, 5, 1, 0, 0, 0, 1), ENOENT);
+    const auto all_taken = [](const char *, std::int32_t, std::int32_t) {
+        errno = EMFILE;
+        return -1;
+    };
+    img_register_io_method("all_taken", nullptr, all_taken, nullptr, nullptr, nullptr, nullptr,
+                           nullptr, nullptr);
+    fails(img_open_raw("x", img_lookup_io_method("all_taken"), IMG_OPEN_READ_ONLY), EMFILE);
     for (const int nth : {1, 2}) {
         memory_arm(nth);
         fails(img_open_raw(name.c_str(), nullptr, IMG_OPEN_READ_ONLY), ENOMEM);

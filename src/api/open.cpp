@@ -327,9 +327,12 @@ img_raw_image img_open_raw(const char *filename, const img_io_method *method, st
 {
     const img_call call;
     img_raw_image image = new_raw_record(filename, method, flags);
-    if (!image || open_as_some_type(image.get())) return image;
+    if (!image) return nullptr;
+    errno = 0;
+    if (open_as_some_type(image.get())) return image;
+    const int error = errno == EMFILE ? EMFILE : INVALID_ARGUMENT;
     image.reset();
-    errno = INVALID_ARGUMENT;
+    errno = error;
     return nullptr;
 }
 

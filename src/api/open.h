@@ -41,7 +41,7 @@ struct img_raw_close {
 using img_raw_image = std::unique_ptr<img_desc, img_raw_close>;
 
 // As img_open_plain_file and img_create_plain_file, without a message of their own. Null: failed,
-// with errno set.
+// with errno set; EINVAL where no type takes the file, EMFILE where too many are open.
 img_raw_image img_open_raw(const char *filename, const img_io_method *method, std::int32_t flags);
 img_raw_image img_create_raw(const char *filename, const img_io_method *method, std::int32_t nlines,
                              std::int32_t nsamps, std::int32_t nbands, std::int32_t type,

@@ -109,7 +109,8 @@ class Options(images.ImageTest):
         vitec = gdal.GetDriverByName('VITec')
         for options, block in (([], [600, 1]), (['TILED=NO'], [600, 1]),
                                (['TILED=YES'], [256, 256]), (['BLOCKXSIZE=64'], [64, 256]),
-                               (['BLOCKYSIZE=8'], [256, 8]),
+                               (['BLOCKYSIZE=1'], [600, 1]),  # as rasterio hands on a profile
+                               (['BLOCKXSIZE=600', 'BLOCKYSIZE=1'], [600, 1]),
                                (['TILED=NO', 'BLOCKXSIZE=64'], [600, 1]),
                                (['TILED=TRUE', 'BLOCKXSIZE=16', 'BLOCKYSIZE=1024'], [16, 1024]),
                                (['BLOCKXSIZE=32768', 'BLOCKYSIZE=8'], [32768, 8])):
