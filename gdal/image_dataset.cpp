@@ -343,7 +343,7 @@ bool image_band::has_block_in_the_way(GDALRWFlag direction, int samp, int line, 
     for (int y = line / nBlockYSize; y <= bottom; ++y)
         for (int x = samp / nBlockXSize; x <= right; ++x) {
             const locked_block block(TryGetLockedBlockRef(x, y));
-            if (block && (direction == GF_Write || block->GetDirty())) return true;
+            if (block && (direction == GF_Write || block->GetDirty() != 0)) return true;
         }
     return false;
 }

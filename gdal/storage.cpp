@@ -19,27 +19,33 @@ namespace {
 constexpr char METHOD_NAME[] = "vsi";
 
 std::mutex table_mutex;
-// By descriptor; null: free. Guarded by table_mutex. Never destroyed: GDAL may close data sets
-// after the plugin's destructors have run.
-std::vector<VSILFILE *> &open_files = *new std::vector<VSILFILE *>;
 
 thread_local int close_error = 0;
+
+// Returns the open files by descriptor; null: free. The caller holds table_mutex. The table is
+// never destroyed: GDAL may close data sets after the plugin's destructors have run.
+std::vector<VSILFILE *> &open_files()
+{
+    static std::vector<VSILFILE *> &table = *new std::vector<VSILFILE *>;
+    return table;
+}
 
 VSILFILE *file_of(std::int32_t fd)
 {
     const std::lock_guard lock(table_mutex);
-    return open_files[static_cast<std::size_t>(fd)];
+    return open_files()[static_cast<std::size_t>(fd)];
 }
 
 std::int32_t enter(VSILFILE *file)
 {
     const std::lock_guard lock(table_mutex);
-    const auto free = std::find(open_files.begin(), open_files.end(), nullptr);
-    const auto fd = static_cast<std::int32_t>(free - open_files.begin());
-    if (free != open_files.end())
+    std::vector<VSILFILE *> &files = open_files();
+    const auto free = std::find(files.begin(), files.end(), nullptr);
+    const auto fd = static_cast<std::int32_t>(free - files.begin());
+    if (free != files.end())
         *free = file;
     else
-        open_files.push_back(file);
+        files.push_back(file);
     return fd;
 }
 
@@ -76,7 +82,7 @@ std::int32_t close_virtual(std::int32_t fd)
     VSILFILE *file = nullptr;
     {
         const std::lock_guard lock(table_mutex);
-        file = std::exchange(open_files[static_cast<std::size_t>(fd)], nullptr);
+        file = std::exchange(open_files()[static_cast<std::size_t>(fd)], nullptr);
     }
     errno = 0;
     if (VSIFCloseL(file) == 0) return 0;
