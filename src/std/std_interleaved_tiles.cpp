@@ -19,7 +19,7 @@ void img_std_split_bytes(const std::uint8_t *tile, std::size_t length, std::int3
         if (plane == nullptr) continue;
         const std::size_t first = position * width;
         img_std_copy_samples(tile + first, pixel, plane, width, pixels, nbytes, false);
-        // Of the pixel in which the bytes end, what is there of this band's sample.
+        // The bytes may end inside this band's sample of the last pixel.
         const std::uint8_t *const last = tile + std::min(pixels * pixel + first, length);
         std::copy_n(last, std::min(img_count(tile + length - last), width), plane + pixels * width);
     }
