@@ -21,3 +21,13 @@ TEST(Samples, OfARowAndNoOthersAreCopied)
             EXPECT_EQ(target, expected) << nsamps << " samples, " << step;
         }
 }
+
+TEST(Samples, OfALargeRunAreAllCopied)
+{
+    constexpr std::size_t count = 200'000;
+    bytes source(count), target(count + 1, 255);
+    for (std::size_t i = 0; i < count; ++i) source[i] = static_cast<std::uint8_t>(i % 251);
+    img_std_copy_rows({source.data(), 1000, 1}, target.data(), 1000, count / 1000, 1000, 1, false);
+    source.push_back(255);
+    EXPECT_EQ(target, source);
+}
