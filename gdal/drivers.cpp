@@ -2,10 +2,10 @@
 #include "drivers.h"
 
 #include "image_dataset.h"
-#include "library_messages.h"
 #include "storage.h"
 
 #include "base/img_desc.h"
+#include "base/report.h"
 #include "formats/helava.h"
 #include "formats/vitec.h"
 #include "std/std.h"
@@ -53,7 +53,7 @@ std::nullptr_t fail(const image_format &format, const char *filename, CPLErrorNu
 std::unique_ptr<image_dataset> open_image(const image_format &format, const char *filename,
                                           GDALAccess access)
 {
-    const library_messages messages;
+    const img_message_keeper messages;
     const bool updates = access == GA_Update;
     // A file opened for writing is completed when it is closed: look at it before.
     img_raw_image image = img_open_raw(filename, storage_of(filename), IMG_OPEN_READ_ONLY);
@@ -166,7 +166,7 @@ bool create_file(const image_format &format, const char *filename, int nsamps, i
         return fail(format, filename, CPLE_NotSupported, "the file would have 2 GiB or more") !=
                nullptr;
 
-    const library_messages messages;
+    const img_message_keeper messages;
     unfinished_file file(filename);
     errno = 0;
     img_raw_image image = img_create_raw(filename, storage_of(filename), nlines, nsamps, nbands,

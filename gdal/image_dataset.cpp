@@ -3,10 +3,10 @@
 // blocks. Read image_dataset.h and api/open.h first.
 #include "image_dataset.h"
 
-#include "library_messages.h"
 #include "storage.h"
 
 #include "base/img_desc.h"
+#include "base/report.h"
 #include "formats/helava.h"
 #include "std/std.h"
 #include "std/std_bytes.h"
@@ -34,6 +34,13 @@ struct drop_block {
     void operator()(GDALRasterBlock *block) const { block->DropLock(); }
 };
 using locked_block = std::unique_ptr<GDALRasterBlock, drop_block>;
+
+// Returns the system's text for the error that the library reported last; empty without one.
+std::string last_reason()
+{
+    const int error = img_message_keeper::last_error();
+    return error != 0 ? std::generic_category().message(error) : "";
+}
 
 // True for a request that does not resample.
 bool is_exact(const GDALRasterIOExtraArg *extra, int samp, int line, int nsamps, int nlines,
@@ -104,7 +111,7 @@ CPLErr image_dataset::check_there(const int *bands, int nbands, int line, int sa
         nsamps = nRasterXSize;
     }
     if (m_image->std_file->veof >= whole_length(*m_image)) return CE_None;
-    const library_messages messages;
+    const img_message_keeper messages;
     for (int i = 0; i < nbands; ++i) {
         if (is_there(bands[i] - 1, line, samp, nlines, nsamps) ||
             GetRasterBand(bands[i])->GetOverviewCount() > 0)
@@ -178,7 +185,7 @@ bool image_dataset::is_there(int band, int line, int samp, int nlines, int nsamp
 // Reports the first line of a region that the file does not hold, or why it cannot be read.
 void image_dataset::report_missing(int band, int line, int samp, int nlines, int nsamps)
 {
-    const std::string reason = library_messages::last();
+    const std::string reason = last_reason();
     int first = line, last = line + nlines - 1;
     if (is_there(band, line, samp, nlines, nsamps)) {
         CPLError(CE_Failure, CPLE_FileIO, "%s: %s: lines %d to %d of band %d cannot be read%s%s",
@@ -200,7 +207,7 @@ void image_dataset::report_missing(int band, int line, int samp, int nlines, int
 CPLErr image_dataset::read(int band, int line, int samp, int nlines, int nsamps, GByte *buffer,
                            int stride)
 {
-    const library_messages messages;
+    const img_message_keeper messages;
     img_desc *const image = m_image.get();
     const std::size_t row =
         static_cast<std::size_t>(nsamps) * static_cast<std::size_t>(image->nbytes);
@@ -246,10 +253,10 @@ bool image_dataset::read_tile(int band, int tile_down, int tile_across, GByte *b
 CPLErr image_dataset::write(int band, int line, int samp, int nlines, int nsamps,
                             const GByte *buffer, int stride)
 {
-    const library_messages messages;
+    const img_message_keeper messages;
     if (img_write_raw(m_image.get(), line, samp, nlines, nsamps, band, buffer, stride) == 0)
         return CE_None;
-    const std::string reason = library_messages::last();
+    const std::string reason = last_reason();
     CPLError(CE_Failure, CPLE_FileIO, "%s: %s: lines %d to %d of band %d cannot be written%s%s",
              m_driver_name.c_str(), m_filename.c_str(), line, line + nlines - 1, band + 1,
              reason.empty() ? "" : ": ", reason.c_str());

@@ -1,4 +1,4 @@
-// Printing messages, or handing them to the sink that the tool installs. Read report.h first.
+// Printing messages, or handing them to a sink. Read report.h first.
 #include "base/report.h"
 
 #include <array>
@@ -6,8 +6,35 @@
 #include <cstdarg>
 #include <cstdio>
 #include <cstring>
+#include <utility>
 
 constinit thread_local img_message_fn img_message_sink = nullptr;
+
+namespace {
+
+constinit thread_local int last_error_kept = 0;
+
+void keep_error(const char * /*text*/, int error)
+{
+    if (error != 0) last_error_kept = error;
+}
+
+}  // namespace
+
+img_message_keeper::img_message_keeper() : m_outer{std::exchange(img_message_sink, keep_error)}
+{
+    last_error_kept = 0;
+}
+
+img_message_keeper::~img_message_keeper()
+{
+    img_message_sink = m_outer;
+}
+
+int img_message_keeper::last_error()
+{
+    return last_error_kept;
+}
 
 std::int32_t img_fail(const char *format, ...)
 {

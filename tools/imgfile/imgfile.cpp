@@ -2,10 +2,11 @@
 // line; commands/commands.h lists what it calls.
 //
 // Exit status: 0 done; 1 the work failed, or a check or comparison found something; 2 wrong usage.
-#include "codecs/library_message.h"
 #include "commands/commands.h"
 #include "failure.h"
 #include "notes.h"
+
+#include "base/report.h"
 
 #include <CLI/CLI.hpp>
 #include <array>
@@ -247,7 +248,7 @@ int run_and_report(int argc, char **argv) noexcept
 int main(int argc, char **argv)
 {
     take_standard_descriptors();
-    library_message::collect();
+    const img_message_keeper messages;
     std::signal(SIGPIPE, SIG_IGN);  // a closed pipe is an error like others
     std::signal(SIGXFSZ, SIG_IGN);
     const int status = run_and_report(argc, argv);

@@ -1,11 +1,11 @@
 // Reading VITec and Helava images: raw samples of two bytes included, which the exported functions
 // do not pass on. Read native_image.h first.
 #include "codecs/codecs.h"
-#include "codecs/library_message.h"
 #include "codecs/native_header.h"
 #include "codecs/native_image.h"
 #include "failure.h"
 
+#include "base/report.h"
 #include "base/types.h"
 #include "formats/words.h"
 #include "std/std.h"
@@ -56,7 +56,7 @@ private:
 
     bool read_band(const window &part, std::int32_t band, std::uint8_t *samples)
     {
-        library_message::forget();
+        const img_message_keeper messages;
         img_desc &desc = m_image.desc();
         return img_type_of(&desc).read(&desc, part.line, part.samp, part.nlines, part.nsamps, band,
                                        samples, part.nsamps) == 0;
@@ -87,7 +87,7 @@ private:
     // files hold their bands side by side, others one after the other.
     [[noreturn]] void fail(const window &part, std::int32_t failed_band)
     {
-        const std::string reason = library_message::reason("");
+        const int error = img_message_keeper::last_error();
         std::int32_t line = part.line, band = failed_band;
         bool found = false;
         for (std::int32_t each = 0; each < form.nbands && (!found || tiles.nlines != 0); ++each) {
@@ -99,8 +99,8 @@ private:
             found = true;
         }
         const std::string missing = text("line ", line, " of band ", band);
-        throw failure(name, reason.empty() ? "truncated: " + missing + " is missing"
-                                           : missing + " cannot be read: " + reason);
+        throw failure(name, error == 0 ? "truncated: " + missing + " is missing"
+                                       : missing + " cannot be read: " + system_text(error));
     }
 
     input_file m_file;

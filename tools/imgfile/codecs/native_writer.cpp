@@ -1,11 +1,11 @@
 // Writing VITec and Helava images through the library, after checking that the format can hold
 // them. Read native_image.h first.
 #include "codecs/codecs.h"
-#include "codecs/library_message.h"
 #include "codecs/native_image.h"
 #include "failure.h"
 #include "output_file.h"
 
+#include "base/report.h"
 #include "formats/vitec.h"
 
 namespace {
@@ -23,18 +23,24 @@ public:
 
     void write(const window &part, const block &samples) override
     {
+        const img_message_keeper messages;
         for (std::int32_t band = 0; band < samples.nbands; ++band) {
-            library_message::forget();
             if (samples.nlines > 0 && samples.nsamps > 0 &&
                 img_dump_buffer(m_image.handle(), part.line, part.samp, part.nlines, part.nsamps,
                                 band, samples.row(band, 0), part.nsamps, nullptr) != 0)
-                throw failure(m_name, "cannot be written: " +
-                                          library_message::reason("not all bytes were accepted"));
+                fail();
         }
     }
     std::int64_t finish() override { return m_length; }
 
 private:
+    [[noreturn]] void fail() const
+    {
+        const int error = img_message_keeper::last_error();
+        throw failure(m_name, "cannot be written: " + (error != 0 ? system_text(error)
+                                                                  : "not all bytes were accepted"));
+    }
+
     std::string m_name;
     native_image m_image;
     std::int64_t m_length;
