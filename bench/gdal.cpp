@@ -51,9 +51,9 @@ dataset owned(GDALDatasetH made)
     return dataset(made);
 }
 
-dataset open(const std::string &path)
+dataset open(const std::string &path, GDALAccess access = GA_ReadOnly)
 {
-    return owned(GDALOpen(path.c_str(), GA_ReadOnly));
+    return owned(GDALOpen(path.c_str(), access));
 }
 
 using option_list = std::vector<const char *>;  // KEY=VALUE
@@ -182,11 +182,17 @@ std::size_t size_of(const image_pair &images, int side)
            static_cast<std::size_t>(GDALGetDataTypeSizeBytes(images.type));
 }
 
-void read(const dataset &image, const image_pair &images, const window &part, GByte *buffer)
+void move(GDALRWFlag direction, const dataset &image, const image_pair &images, const window &part,
+          GByte *buffer)
 {
-    check(GDALDatasetRasterIO(image.get(), GF_Read, part.samp, part.line, part.side, part.side,
+    check(GDALDatasetRasterIO(image.get(), direction, part.samp, part.line, part.side, part.side,
                               buffer, part.side, part.side, images.type, images.nbands, nullptr, 0,
                               0, 0));
+}
+
+void read(const dataset &image, const image_pair &images, const window &part, GByte *buffer)
+{
+    move(GF_Read, image, images, part, buffer);
 }
 
 bool agree(const image_pair &images)
@@ -240,6 +246,32 @@ std::function<candidate(const image_pair &, int)> reads_bands(bool again)
 {
     return [=](const image_pair &images, int which) {
         return reads(images, which, {{0, 0, images.side}}, again);
+    };
+}
+
+// Writes windows and stores them. `reads_first`: each is read, changed and written back. The writes
+// of one round are the same for both drivers, so that their files stay equal.
+std::function<candidate(const image_pair &, int)> updates_windows(int side, int count,
+                                                                  bool reads_first)
+{
+    return [=](const image_pair &images, int which) -> candidate {
+        static std::vector<GByte> buffer;
+        const std::vector<window> windows = windows_anywhere(images, side, count);
+        buffer.resize(std::max(buffer.size(), size_of(images, windows.front().side)));
+        const auto image = std::make_shared<dataset>();
+        const auto prepare = [=, &images] {
+            *image = open(images.paths[which], GA_Update);
+            std::ranges::fill(buffer, GByte{1});
+        };
+        const auto run = [=, &images] {
+            for (const window &each : windows) {
+                if (reads_first) read(*image, images, each, buffer.data());
+                ++buffer.front();
+                move(GF_Write, *image, images, each, buffer.data());
+            }
+            image->reset();
+        };
+        return {prepare, run, nothing};
     };
 }
 
@@ -317,6 +349,10 @@ std::vector<task> make_tasks(const std::string &memory_folder, bool small)
             {"windows of 512, again", some, reads_windows(512, some, true)},
             {"whole bands", 1, reads_bands(false)},
             {"whole bands, again", 1, reads_bands(true)},
+            {"updates of 64", many, updates_windows(64, many, true)},
+            {"writes of 64", many, updates_windows(64, many, false)},
+            {"updates of 512", some, updates_windows(512, some, true)},
+            {"writes of 512", some, updates_windows(512, some, false)},
             {"statistics", 1, computes_statistics},
             {"to GTiff in /vsimem/", 1, copies_to_tiff},
             {"from GTiff to a file", 1, copies_from_tiff(memory_folder)},
@@ -441,6 +477,8 @@ void run(const arguments &asked)
         std::this_thread::sleep_for(std::chrono::milliseconds(50));
         for (const task &work : make_tasks(outputs.path(), asked.small))
             if (asked.asks_for(work, images)) measure(work, images, asked.rounds);
+        if (!agree(images))
+            throw std::runtime_error(std::string(images.name) + ": samples differ after updates");
         for (const std::string &path : images.paths) remove_image(path);
     }
 }

@@ -27,6 +27,13 @@ namespace {
 constexpr std::size_t SMALL_WINDOW = 16384;
 // Working memory of requests whose samples are spaced in the caller's buffer.
 constexpr std::size_t PIECE = std::size_t{1} << 20;
+// An update of a window of so many bytes is left to GDAL's blocks.
+constexpr std::int64_t LARGEST_UPDATE = std::int64_t{1} << 20;
+// Longer blocks are not read for a window that touches a part of them.
+constexpr std::int64_t LARGEST_BLOCK = std::int64_t{1} << 20;
+// Lines that wait are written together up to so many, of so many bytes.
+constexpr int MOST_LINES = 64;
+constexpr std::size_t WRITTEN_TOGETHER = std::size_t{1} << 17;
 // Bytes of lines that are read at a time for a reader of one line after the other.
 constexpr std::size_t READ_AHEAD = std::size_t{1} << 17;
 
@@ -291,9 +298,9 @@ CPLErr image_band::FlushCache(bool is_closing)
     return GDALPamRasterBand::FlushCache(is_closing);
 }
 
-// Reads a short line of an image that is not updated, and those behind it where the lines are asked
-// for in turn: one call of the library costs as much as the copy of many short lines. Returns false
-// when the line must be read alone.
+// Reads a short line, and those behind it where the lines are asked for in turn: one call of the
+// library costs as much as the copy of many short lines. Returns false when the line must be read
+// alone.
 bool image_band::read_ahead(int line, GByte *buffer)
 {
     const bool follows = line == m_ahead.expected;
@@ -324,8 +331,10 @@ CPLErr image_band::IReadBlock(int block_x, int block_y, void *buffer)
 {
     auto *const samples = static_cast<GByte *>(buffer);
     const bool is_tiled = img_is_tiled(&images().desc());
-    if (is_tiled ? images().read_tile(nBand - 1, block_y, block_x, samples)
-                 : eAccess == GA_ReadOnly && read_ahead(block_y, samples))
+    if (is_tiled
+            ? images().read_tile(nBand - 1, block_y, block_x, samples)
+            : read_ahead(block_y, samples) ||
+                  (eAccess == GA_Update && images().read_lines(nBand - 1, block_y, 1, samples)))
         return CE_None;
     const int samp = block_x * nBlockXSize, line = block_y * nBlockYSize;
     const int nsamps = std::min(nBlockXSize, nRasterXSize - samp);
@@ -333,26 +342,79 @@ CPLErr image_band::IReadBlock(int block_x, int block_y, void *buffer)
     return images().read(nBand - 1, line, samp, nlines, nsamps, samples, nBlockXSize);
 }
 
-CPLErr image_band::IWriteBlock(int block_x, int block_y, void *buffer)
+CPLErr image_band::write(int line, int samp, int nlines, int nsamps, const GByte *buffer,
+                         int stride)
 {
-    const int samp = block_x * nBlockXSize, line = block_y * nBlockYSize;
-    return images().write(nBand - 1, line, samp, std::min(nBlockYSize, nRasterYSize - line),
-                          std::min(nBlockXSize, nRasterXSize - samp),
-                          static_cast<const GByte *>(buffer), nBlockXSize);
+    if (line < m_ahead.first + m_ahead.count && line + nlines > m_ahead.first)
+        m_ahead.samples.reset();
+    return images().write(nBand - 1, line, samp, nlines, nsamps, buffer, stride);
 }
 
-// True when GDAL keeps a block of the window that was not written yet, or that a write would make
-// old.
-bool image_band::has_block_in_the_way(GDALRWFlag direction, int samp, int line, int nsamps,
-                                      int nlines)
+// Writes a line, and with it the lines behind it that wait in GDAL's cache: one long write takes
+// less time than several short ones.
+CPLErr image_band::write_waiting_lines(int line, const GByte *samples)
+{
+    const int nbytes = images().desc().nbytes;
+    const std::size_t row =
+        static_cast<std::size_t>(nBlockXSize) * static_cast<std::size_t>(nbytes);
+    const int most = static_cast<int>(std::min<std::size_t>(
+        WRITTEN_TOGETHER / row, static_cast<std::size_t>(nRasterYSize - line)));
+    std::array<locked_block, MOST_LINES> waiting;
+    int count = 1;
+    for (; count < std::min(most, MOST_LINES); ++count) {
+        locked_block &block = waiting[static_cast<std::size_t>(count)];
+        block.reset(TryGetLockedBlockRef(0, line + count));
+        if (!block || block->GetDirty() == 0) break;
+    }
+    if (count > 1 && !m_together)
+        m_together.reset(static_cast<GByte *>(VSI_MALLOC_VERBOSE(WRITTEN_TOGETHER)));
+    if (count == 1 || !m_together) return write(line, 0, 1, nBlockXSize, samples, nBlockXSize);
+    for (int i = 0; i < count; ++i)
+        std::memcpy(m_together.get() + static_cast<std::size_t>(i) * row,
+                    i == 0 ? samples : waiting[static_cast<std::size_t>(i)]->GetDataRef(), row);
+    const CPLErr result = write(line, 0, count, nBlockXSize, m_together.get(), nBlockXSize);
+    if (result == CE_None)
+        for (int i = 1; i < count; ++i) waiting[static_cast<std::size_t>(i)]->MarkClean();
+    return result;
+}
+
+CPLErr image_band::IWriteBlock(int block_x, int block_y, void *buffer)
+{
+    if (!img_is_tiled(&images().desc()))
+        return write_waiting_lines(block_y, static_cast<const GByte *>(buffer));
+    const int samp = block_x * nBlockXSize, line = block_y * nBlockYSize;
+    return write(line, samp, std::min(nBlockYSize, nRasterYSize - line),
+                 std::min(nBlockXSize, nRasterXSize - samp), static_cast<const GByte *>(buffer),
+                 nBlockXSize);
+}
+
+// True for an update that GDAL's blocks take: parts of blocks, which are often changed again before
+// they are written. Whole blocks go to the file at once.
+bool image_band::updates_blocks(int samp, int line, int nsamps, int nlines) const
+{
+    const int nbytes = images().desc().nbytes;
+    const auto covers = [](int first, int count, int block, int end) {
+        return first % block == 0 && (count % block == 0 || first + count == end);
+    };
+    return eAccess == GA_Update && std::int64_t{nsamps} * nlines * nbytes <= LARGEST_UPDATE &&
+           std::int64_t{nBlockXSize} * nBlockYSize * nbytes <= LARGEST_BLOCK &&
+           !(covers(samp, nsamps, nBlockXSize, nRasterXSize) &&
+             covers(line, nlines, nBlockYSize, nRasterYSize));
+}
+
+// Ends the blocks of a window that GDAL keeps, so that it can be moved past them: those that were
+// not written yet, and all that a write would make old.
+CPLErr image_band::flush_blocks(GDALRWFlag direction, int samp, int line, int nsamps, int nlines)
 {
     const int right = (samp + nsamps - 1) / nBlockXSize, bottom = (line + nlines - 1) / nBlockYSize;
     for (int y = line / nBlockYSize; y <= bottom; ++y)
         for (int x = samp / nBlockXSize; x <= right; ++x) {
-            const locked_block block(TryGetLockedBlockRef(x, y));
-            if (block && (direction == GF_Write || block->GetDirty() != 0)) return true;
+            locked_block block(TryGetLockedBlockRef(x, y));
+            if (!block || (direction == GF_Read && block->GetDirty() == 0)) continue;
+            block.reset();
+            if (FlushBlock(x, y) != CE_None) return CE_Failure;
         }
-    return false;
+    return CE_None;
 }
 
 // Counts a small window. True when GDAL's cache should answer it: no copy from a file is as quick
@@ -415,7 +477,8 @@ CPLErr image_band::IRasterIO(GDALRWFlag direction, int samp, int line, int nsamp
                              GDALDataType buffer_type, GSpacing pixel_space, GSpacing line_space,
                              GDALRasterIOExtraArg *extra)
 {
-    if (buffer_type != eDataType || pixel_space != static_cast<int>(pixel_space) ||
+    if (updates_blocks(samp, line, nsamps, nlines) || buffer_type != eDataType ||
+        pixel_space != static_cast<int>(pixel_space) ||
         !is_exact(extra, samp, line, nsamps, nlines, buffer_nsamps, buffer_nlines)) {
         if (direction == GF_Read &&
             images().check_there(&nBand, 1, line, samp, nlines, nsamps, false) != CE_None)
@@ -424,8 +487,7 @@ CPLErr image_band::IRasterIO(GDALRWFlag direction, int samp, int line, int nsamp
                                             buffer_nsamps, buffer_nlines, buffer_type, pixel_space,
                                             line_space, extra);
     }
-    if (eAccess == GA_Update && has_block_in_the_way(direction, samp, line, nsamps, nlines) &&
-        FlushCache(false) != CE_None)
+    if (eAccess == GA_Update && flush_blocks(direction, samp, line, nsamps, nlines) != CE_None)
         return CE_Failure;
     const int nbytes = images().desc().nbytes;
     const GSpacing stride = line_space / nbytes;
@@ -443,8 +505,7 @@ CPLErr image_band::IRasterIO(GDALRWFlag direction, int samp, int line, int nsamp
         result =
             images().read(nBand - 1, line, samp, nlines, nsamps, samples, static_cast<int>(stride));
     else
-        result = images().write(nBand - 1, line, samp, nlines, nsamps, samples,
-                                static_cast<int>(stride));
+        result = write(line, samp, nlines, nsamps, samples, static_cast<int>(stride));
     if (result == CE_None && extra != nullptr && extra->pfnProgress != nullptr &&
         extra->pfnProgress(1.0, "", extra->pProgressData) == FALSE) {
         CPLError(CE_Failure, CPLE_UserInterrupt, "User terminated");
@@ -478,8 +539,8 @@ CPLErr image_band::move_spaced(GDALRWFlag direction, int samp, int line, int nsa
                 GDALCopyWords64(spaced, eDataType, static_cast<int>(pixel_space), packed, eDataType,
                                 nbytes, nsamps);
         }
-        if (direction == GF_Write && images().write(nBand - 1, line + first, samp, count, nsamps,
-                                                    rows.get(), nsamps) != CE_None)
+        if (direction == GF_Write &&
+            write(line + first, samp, count, nsamps, rows.get(), nsamps) != CE_None)
             return CE_Failure;
     }
     return CE_None;

@@ -89,12 +89,16 @@ private:
     CPLErr move_spaced(GDALRWFlag direction, int samp, int line, int nsamps, int nlines,
                        GByte *buffer, GSpacing pixel_space, GSpacing line_space);
     bool read_ahead(int line, GByte *buffer);
-    bool has_block_in_the_way(GDALRWFlag direction, int samp, int line, int nsamps, int nlines);
+    CPLErr write(int line, int samp, int nlines, int nsamps, const GByte *buffer, int stride);
+    CPLErr write_waiting_lines(int line, const GByte *samples);
+    bool updates_blocks(int samp, int line, int nsamps, int nlines) const;
+    CPLErr flush_blocks(GDALRWFlag direction, int samp, int line, int nsamps, int nlines);
     bool has_cached_blocks(int nsamps, int nlines);
     bool read_from_blocks(int samp, int line, int nsamps, int nlines, GByte *buffer,
                           GSpacing line_space);
 
     std::int64_t m_small_windows = 0;  // that were read
+    sample_buffer m_together;          // room for lines that are written together; null: not yet
     // Lines that follow the last one that GDAL asked for as a block.
     struct {
         sample_buffer samples;  // null: none
