@@ -11,10 +11,13 @@
 #include "std/std.h"
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
 #include <charconv>
+#include <cstdio>
 #include <cstring>
 #include <memory>
+#include <span>
 #include <string>
 #include <system_error>
 
@@ -46,6 +49,70 @@ std::nullptr_t fail(const image_format &format, const char *filename, CPLErrorNu
 {
     CPLError(CE_Failure, number, "%s: %s: %s", format.name, filename, text.c_str());
     return nullptr;
+}
+
+// --- Text of VITec headers: the items DESCRIPTION and CREATION_DATE of the domain VITEC ---
+
+constexpr char HEADER_DOMAIN[] = "VITEC";
+constexpr char DATE_FORMAT[] = "%d-%d-%dT%d:%d:%d";
+constexpr std::size_t DESCRIPTION_SIZE = IMG_VITEC_AT_VERSION - IMG_VITEC_AT_DESCRIPTION;
+
+// Reads the text where GDAL has read the header: in the files of nearly all writers.
+void load_header_text(GDALOpenInfo *info, image_dataset *image)
+{
+    const std::span header(info->pabyHeader, static_cast<std::size_t>(info->nHeaderBytes));
+    const std::uint32_t link = img_get_word(header, IMG_VITEC_AT_IMAGE_BLOCK_LINK);
+    const std::size_t image_block =
+        std::size_t{image->desc().swap != 0 ? img_swapped_word(link) : link} + IMG_VITEC_LINK_BASE;
+    if (image_block + IMG_VITEC_IMAGE_BLOCK_SIZE > header.size()) return;
+    std::string text(
+        reinterpret_cast<const char *>(&header[image_block + IMG_VITEC_AT_DESCRIPTION]),
+        DESCRIPTION_SIZE);
+    text.resize(std::strlen(text.c_str()));
+    if (!text.empty() && CPLIsUTF8(text.c_str(), -1) != FALSE)
+        image->load_item("DESCRIPTION", text.c_str(), HEADER_DOMAIN);
+    const std::uint8_t *const date = &header[IMG_VITEC_AT_CREATE_DATE];
+    if (date[1] > 11 || date[2] < 1 || date[2] > 31) return;  // not stated
+    image->load_item("CREATION_DATE",
+                     CPLSPrintf("%04d-%02d-%02dT%02d:%02d:%02d", date[0] + 1900, date[1] + 1,
+                                date[2], date[3], date[4], date[5]),
+                     HEADER_DOMAIN);
+}
+
+// Writes the text of the source into the header of a copy. Returns false after an error.
+bool copy_header_text(GDALDataset *source, const char *filename)
+{
+    const char *const text = source->GetMetadataItem("DESCRIPTION", HEADER_DOMAIN);
+    const char *const stated = source->GetMetadataItem("CREATION_DATE", HEADER_DOMAIN);
+    std::array<int, IMG_VITEC_CREATE_DATE_SIZE> date{};
+    const bool has_date = stated != nullptr &&
+                          std::sscanf(stated, DATE_FORMAT, &date[0], &date[1], &date[2], &date[3],
+                                      &date[4], &date[5]) == int{IMG_VITEC_CREATE_DATE_SIZE};
+    if (text == nullptr && !has_date) return true;
+    VSILFILE *const file = VSIFOpenL(filename, "rb+");
+    bool done = file != nullptr;
+    const auto put = [&](std::size_t offset, const void *bytes, std::size_t size) {
+        done = done && VSIFSeekL(file, offset, SEEK_SET) == 0 &&
+               VSIFWriteL(bytes, 1, size, file) == size;
+    };
+    if (text != nullptr) {
+        std::array<char, DESCRIPTION_SIZE> padded{};
+        std::memcpy(padded.data(), text, std::min(std::strlen(text), padded.size()));
+        put(IMG_VITEC_IMAGE_BLOCK_OFFSET + IMG_VITEC_AT_DESCRIPTION, padded.data(), padded.size());
+    }
+    if (has_date) {
+        date[0] -= 1900;
+        date[1] -= 1;
+        std::array<std::uint8_t, IMG_VITEC_CREATE_DATE_SIZE> bytes;
+        std::ranges::transform(date, bytes.begin(), [](int part) {
+            return static_cast<std::uint8_t>(std::clamp(part, 0, 255));
+        });
+        put(IMG_VITEC_AT_CREATE_DATE, bytes.data(), bytes.size());
+    }
+    if (file != nullptr && VSIFCloseL(file) != 0) done = false;
+    if (!done)
+        fail(vitec_format, filename, CPLE_FileIO, "the text of the header cannot be written");
+    return done;
 }
 
 // --- Opening ---
@@ -84,6 +151,7 @@ GDALDataset *open_format(const image_format &format, GDALOpenInfo *info)
     if (info->fpL == nullptr || format.identify(info) == FALSE) return nullptr;
     std::unique_ptr<image_dataset> dataset = open_image(format, info->pszFilename, info->eAccess);
     if (!dataset) return nullptr;
+    if (format.type == IMG_TYPE_VITEC) load_header_text(info, dataset.get());
     dataset->load_side_files(info);
     return dataset.release();
 }
@@ -166,6 +234,10 @@ bool create_file(const image_format &format, const char *filename, int nsamps, i
         return fail(format, filename, CPLE_NotSupported, "the file would have 2 GiB or more") !=
                nullptr;
 
+    // An archive would be left with nothing in it.
+    if (!VSISupportsRandomWrite(filename, true))
+        return fail(format, filename, CPLE_NotSupported,
+                    "cannot be created: its storage takes no changes") != nullptr;
     const img_message_keeper messages;
     unfinished_file file(filename);
     errno = 0;
@@ -270,13 +342,14 @@ bool copy_samples(GDALDataset *source, image_dataset *copy, GDALDataType type,
 }
 
 // Copies the metadata that GDALPamDataset::CloneInfo leaves out, but for what describes the file.
-void copy_domains(GDALMajorObject *source, GDALMajorObject *copy)
+void copy_domains(GDALMajorObject *source, GDALMajorObject *copy, bool to_vitec)
 {
     const CPLStringList domains(source->GetMetadataDomainList());
     for (int i = 0; i < domains.size(); ++i) {
         const char *const domain = domains[i];
         if (!EQUAL(domain, "") && !EQUAL(domain, "IMAGE_STRUCTURE") &&
-            !EQUAL(domain, "SUBDATASETS") && !EQUAL(domain, "DERIVED_SUBDATASETS"))
+            !(to_vitec && EQUAL(domain, HEADER_DOMAIN)) && !EQUAL(domain, "SUBDATASETS") &&
+            !EQUAL(domain, "DERIVED_SUBDATASETS"))
             copy->SetMetadata(source->GetMetadata(domain), domain);
     }
 }
@@ -296,14 +369,16 @@ GDALDataset *copy_image(const image_format &format, const char *filename, GDALDa
                      type, options);
     if (!copy) return nullptr;
     unfinished_file file(filename);
-    if (!copy_samples(source, copy.get(), type, progress, progress_data)) {
+    const bool to_vitec = format.type == IMG_TYPE_VITEC;
+    if (!copy_samples(source, copy.get(), type, progress, progress_data) ||
+        (to_vitec && !copy_header_text(source, filename))) {
         copy.reset();
         return nullptr;
     }
     file.keep();
-    copy_domains(source, copy.get());
+    copy_domains(source, copy.get(), to_vitec);
     for (int band = 1; band <= nbands; ++band)
-        copy_domains(source->GetRasterBand(band), copy->GetRasterBand(band));
+        copy_domains(source->GetRasterBand(band), copy->GetRasterBand(band), to_vitec);
     if (copy->CloneInfo(source, GCIF_PAM_DEFAULT) == CE_None) return copy.release();
     copy.reset();
     GDALDriver::QuietDelete(filename);

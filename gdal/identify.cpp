@@ -23,7 +23,21 @@ bool is_helava_magic(std::uint32_t word)
     return word == IMG_HELAVA_MAGIC || word == IMG_HELAVA_SWAPPED_MAGIC;
 }
 
-// The version is looked at, too, if it lies in the bytes that GDAL has read already.
+// Reads bytes of a header; those that GDAL has read already take no request.
+bool read_header(GDALOpenInfo *info, std::int64_t offset, std::span<std::uint8_t> bytes)
+{
+    if (offset < 0) return false;
+    const auto begin = static_cast<std::size_t>(offset);
+    if (begin + bytes.size() <= static_cast<std::size_t>(info->nHeaderBytes)) {
+        std::memcpy(bytes.data(), info->pabyHeader + begin, bytes.size());
+        return true;
+    }
+    const bool was_read = info->fpL != nullptr && VSIFSeekL(info->fpL, begin, SEEK_SET) == 0 &&
+                          VSIFReadL(bytes.data(), 1, bytes.size(), info->fpL) == bytes.size();
+    if (info->fpL != nullptr) VSIRewindL(info->fpL);
+    return was_read;
+}
+
 int identify_vitec(GDALOpenInfo *info)
 {
     if (info->nHeaderBytes < static_cast<int>(IMG_VITEC_FILE_BLOCK_SIZE)) return FALSE;
@@ -36,10 +50,9 @@ int identify_vitec(GDALOpenInfo *info)
     const std::int64_t version_offset =
         std::int64_t{img_get_int(block, IMG_VITEC_AT_IMAGE_BLOCK_LINK)} + IMG_VITEC_LINK_BASE +
         static_cast<std::int64_t>(IMG_VITEC_AT_VERSION);
-    if (version_offset < 0) return FALSE;
-    if (version_offset > info->nHeaderBytes - static_cast<int>(sizeof(std::uint32_t))) return TRUE;
-    std::uint32_t version;
-    std::memcpy(&version, info->pabyHeader + version_offset, sizeof version);
+    std::array<std::uint8_t, sizeof(std::uint32_t)> bytes;
+    if (!read_header(info, version_offset, bytes)) return FALSE;
+    const std::uint32_t version = img_get_word(bytes, 0);
     return (swapped ? img_swapped_word(version) : version) == IMG_VITEC_VERSION ? TRUE : FALSE;
 }
 

@@ -77,16 +77,21 @@ std::int64_t whole_length(const img_desc &desc)
 
 image_dataset::image_dataset(const char *driver_name, std::string filename, img_raw_image image,
                              GDALAccess access)
-    : m_driver_name(driver_name), m_filename(std::move(filename)), m_image(std::move(image))
+    : m_driver_name(driver_name), m_filename(std::move(filename)), m_image(std::move(image)),
+      m_is_remote(!VSIIsLocal(m_filename.c_str()))
 {
     eAccess = access;
     nRasterXSize = m_image->nsamps;
     nRasterYSize = m_image->nlines;
     // The last one first: GDAL's table then has room for all at once.
     for (int band = m_image->nbands; band > 0; --band) SetBand(band, new image_band(this, band));
-    // Not through GDALPamDataset, which would write it to a side file.
-    // NOLINTNEXTLINE(bugprone-parent-virtual-call)
-    if (m_image->nbands > 1) GDALDataset::SetMetadataItem("INTERLEAVE", "BAND", "IMAGE_STRUCTURE");
+    if (m_image->nbands > 1) load_item("INTERLEAVE", "BAND", "IMAGE_STRUCTURE");
+}
+
+void image_dataset::load_item(const char *name, const char *value, const char *domain)
+{
+    // NOLINTNEXTLINE(bugprone-parent-virtual-call): not through GDALPamDataset, which would save it
+    GDALDataset::SetMetadataItem(name, value, domain);
 }
 
 void image_dataset::start_side_files()
@@ -117,8 +122,10 @@ CPLErr image_dataset::check_there(const int *bands, int nbands, int line, int sa
         samp = 0;
         nsamps = nRasterXSize;
     }
-    if (m_image->std_file->veof >= whole_length(*m_image)) return CE_None;
     const img_message_keeper messages;
+    // A local file may have been truncated since; the length of others may take a request.
+    if (m_image->io_method->lend != nullptr) img_std_update_veof(m_image.get());
+    if (m_image->std_file->veof >= whole_length(*m_image)) return CE_None;
     for (int i = 0; i < nbands; ++i) {
         if (is_there(bands[i] - 1, line, samp, nlines, nsamps) ||
             GetRasterBand(bands[i])->GetOverviewCount() > 0)
@@ -226,6 +233,7 @@ CPLErr image_dataset::read(int band, int line, int samp, int nlines, int nsamps,
         img_std_update_veof(image);  // the file may have grown, too
         done = is_there(band, line, samp, nlines, nsamps);
     }
+    if (done && read_by_runs(band, line, samp, nlines, nsamps, buffer, pitch)) return CE_None;
     if (done && is_small) {
         std::array<GByte, SMALL_WINDOW> samples;
         done = img_read_raw(image, line, samp, nlines, nsamps, band, samples.data(), nsamps) == 0;
@@ -238,6 +246,34 @@ CPLErr image_dataset::read(int band, int line, int samp, int nlines, int nsamps,
     img_std_update_veof(image);
     report_missing(band, line, samp, nlines, nsamps);
     return CE_Failure;
+}
+
+// Reads lines from a server with the bytes between them, where these are few: that takes fewer
+// requests. Returns false, with `buffer` partly written, when the lines must be read one by one.
+bool image_dataset::read_by_runs(int band, int line, int samp, int nlines, int nsamps,
+                                 GByte *buffer, std::size_t pitch)
+{
+    constexpr int most_between = 1 << 14, most_at_once = 1 << 22;  // bytes
+    img_desc *const image = m_image.get();
+    const int padded = image->std_file->padded_nsamps;
+    if (!m_is_remote || img_is_tiled(image) || nlines < 2 ||
+        (padded - nsamps) * image->nbytes > most_between)
+        return false;
+    const int height = std::clamp(most_at_once / (padded * image->nbytes), 1, nlines);
+    const sample_buffer run = new_samples(height, padded, image->nbytes);
+    if (!run) return false;
+    const auto size = static_cast<std::size_t>(image->nbytes);
+    for (int first = 0; first < nlines; first += height) {
+        const int count = std::min(height, nlines - first);
+        if (img_read_raw_run(image, img_std_line_offset(image, line + first, samp, band),
+                             (count - 1) * padded + nsamps, run.get()) != 0)
+            return false;
+        img_std_copy_rows({run.get(), static_cast<std::size_t>(padded) * size, size},
+                          buffer + static_cast<std::size_t>(first) * pitch, pitch,
+                          static_cast<std::size_t>(count), static_cast<std::size_t>(nsamps),
+                          image->nbytes, false);
+    }
+    return true;
 }
 
 bool image_dataset::read_lines(int band, int line, int nlines, GByte *buffer)
@@ -275,6 +311,7 @@ image_band::image_band(image_dataset *dataset, int band)
     const img_desc &image = dataset->desc();
     poDS = dataset;
     nBand = band;
+    m_ahead.end = image.nlines;
     eAccess = dataset->GetAccess();
     eDataType = image.nbytes == 2 ? GDT_UInt16 : GDT_Byte;
     nBlockXSize = img_is_tiled(&image) ? image.tile_nsamps : image.nsamps;
@@ -312,9 +349,9 @@ bool image_band::read_ahead(int line, GByte *buffer)
         m_ahead.samples && line >= m_ahead.first && line - m_ahead.first < m_ahead.count;
     if (!is_read) {
         m_ahead.samples.reset();
-        if (!follows || line == 0 || row > READ_AHEAD / 4) return false;
+        if (!follows || line >= m_ahead.end - 1 || row > READ_AHEAD / 4) return false;
         m_ahead.first = line;
-        m_ahead.count = std::min(static_cast<int>(READ_AHEAD / row), nRasterYSize - line);
+        m_ahead.count = std::min(static_cast<int>(READ_AHEAD / row), m_ahead.end - line);
         m_ahead.samples = new_samples(m_ahead.count, nBlockXSize, nbytes);
         if (m_ahead.samples &&
             !images().read_lines(nBand - 1, line, m_ahead.count, m_ahead.samples.get()))
@@ -323,7 +360,7 @@ bool image_band::read_ahead(int line, GByte *buffer)
     }
     const int index = line - m_ahead.first;
     std::memcpy(buffer, m_ahead.samples.get() + static_cast<std::size_t>(index) * row, row);
-    if (line == nRasterYSize - 1) m_ahead.samples.reset();
+    if (line == m_ahead.end - 1) m_ahead.samples.reset();
     return true;
 }
 
@@ -477,12 +514,14 @@ CPLErr image_band::IRasterIO(GDALRWFlag direction, int samp, int line, int nsamp
                              GDALDataType buffer_type, GSpacing pixel_space, GSpacing line_space,
                              GDALRasterIOExtraArg *extra)
 {
-    if (updates_blocks(samp, line, nsamps, nlines) || buffer_type != eDataType ||
-        pixel_space != static_cast<int>(pixel_space) ||
+    const bool updates = updates_blocks(samp, line, nsamps, nlines);
+    if (updates || buffer_type != eDataType || pixel_space != static_cast<int>(pixel_space) ||
         !is_exact(extra, samp, line, nsamps, nlines, buffer_nsamps, buffer_nlines)) {
         if (direction == GF_Read &&
             images().check_there(&nBand, 1, line, samp, nlines, nsamps, false) != CE_None)
             return CE_Failure;
+        if (eAccess == GA_Update) m_ahead.end = line + nlines;
+        if (updates) m_ahead.expected = line;
         return GDALPamRasterBand::IRasterIO(direction, samp, line, nsamps, nlines, buffer,
                                             buffer_nsamps, buffer_nlines, buffer_type, pixel_space,
                                             line_space, extra);

@@ -27,6 +27,8 @@ public:
 
     // A new file has no side files yet; metadata, overviews and masks may make them.
     void start_side_files();
+    // Takes up an item of metadata that the file holds; GDAL does not write it to a side file.
+    void load_item(const char *name, const char *value, const char *domain);
     // Takes up the side files of a file that is opened: metadata, overviews, masks.
     void load_side_files(GDALOpenInfo *info);
     // Writes what waits in GDAL's cache, ends the image, and reports what could not be stored.
@@ -63,10 +65,13 @@ protected:
 
 private:
     bool is_there(int band, int line, int samp, int nlines, int nsamps) const;
+    bool read_by_runs(int band, int line, int samp, int nlines, int nsamps, GByte *buffer,
+                      std::size_t pitch);
     void report_missing(int band, int line, int samp, int nlines, int nsamps);
 
     std::string m_driver_name, m_filename;
     img_raw_image m_image;
+    bool m_is_remote;  // each read is a request
 };
 
 class image_band final : public GDALPamRasterBand {
@@ -103,7 +108,8 @@ private:
     struct {
         sample_buffer samples;  // null: none
         int first = 0, count = 0;
-        int expected = 0;  // the line that a reader of all lines asks for next
+        int expected = -1;  // the line that a reader of all lines asks for next
+        int end = 0;        // of the lines that are worth reading: of the image, or of an update
     } m_ahead;
 };
 

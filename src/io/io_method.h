@@ -100,8 +100,7 @@ struct img_io_method {
     // Null: nothing is lent.
     img_io_lend_fn lend;
     // 1: the library may merge the transfers of several lines or tiles into one call and split one
-    // into several, and leaves out writes to a file opened read-only and the seek to the end after
-    // a write that leaves the length alone. 0: it makes one call per
+    // into several, and leaves out writes to a file opened read-only. 0: it makes one call per
     // line, per contiguous run of tiles, or per sample of an interleaved write, each after a seek;
     // a write is followed by a seek to the end.
     std::int32_t may_merge_transfers;

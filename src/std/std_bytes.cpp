@@ -97,9 +97,6 @@ std::int32_t img_std_write_at(img_desc *desc, std::int64_t offset, const void *b
     if (img_std_seek_to_write(desc, offset) == -1) return -1;
     const std::int32_t written =
         desc->io_method->write(desc->std_file->data_fd, buffer, static_cast<std::uint32_t>(count));
-    // A whole write inside the file leaves its length alone.
-    if (written == count && offset + count <= desc->std_file->veof && img_std_may_merge(desc))
-        return written;
     const int error = errno;
     const std::int32_t updated = img_std_update_veof(desc);  // a write that stops may grow it, too
     if (written == count) return updated == 0 ? written : -1;

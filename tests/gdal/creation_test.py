@@ -180,6 +180,21 @@ def description(image):
 
 
 class SideFiles(images.ImageTest):
+    def test_text_of_the_header(self):
+        """A copy keeps it in its own header, and needs no side file for it."""
+        for order in '><':
+            kind = Kind('VITec', 1, order=order)
+            content = bytearray(kind.content(kind.samples()))
+            content[16:22], content[120:125] = bytes((126, 10, 9, 8, 7, 6)), b'north'
+            images.write_file(self.path('x.img'), bytes(content))
+            for source, copy in (('x.img', 'y.img'), ('y.img', 'z.img')):
+                gdal.GetDriverByName('VITec').CreateCopy(self.path(copy),
+                                                         gdal.Open(self.path(source)))
+                self.assertEqual({'DESCRIPTION': 'north', 'CREATION_DATE': '2026-11-09T08:07:06'},
+                                 gdal.Open(self.path(copy)).GetMetadata('VITEC'))
+                self.assertEqual({}, gdal.Open(self.path(copy)).GetMetadata())
+            self.assertEqual(['x.img', 'y.img', 'z.img'], sorted(os.listdir(self.folder)))
+
     def test_metadata_comes_back(self):
         for kind in FEW:
             path = self.path('x' + kind.extension)

@@ -83,12 +83,19 @@ class Damage(images.ImageTest):
                 self.assertSamples(samples.astype(dtype), found)
 
     def test_truncated_while_open(self):
+        """Whatever is asked for: an error that names the line, and the destination left alone."""
         for kind in FEW:
-            path = kind.write(self.path('x' + kind.extension), kind.samples())
-            file = gdal.Open(path)
-            os.truncate(path, 1000)
-            with self.subTest(kind.name), self.refused(kind.driver, path):
-                self.assertIsNone(file.GetRasterBand(kind.nbands).ReadAsArray())
+            for access in (gdal.GA_ReadOnly, gdal.GA_Update):
+                for dtype in (kind.dtype, numpy.dtype('f8')):
+                    path = kind.write(self.path('x' + kind.extension), kind.samples())
+                    file = gdal.Open(path, access)
+                    os.truncate(path, 1000)
+                    before = numpy.full((kind.nbands,) + kind.shape, 77, dtype)
+                    found = before.copy()
+                    with self.subTest(kind.name, access=access, dtype=dtype), \
+                            self.refused(kind.driver, path, 'line'):
+                        self.assertIsNone(file.ReadAsArray(buf_obj=found))
+                        self.assertTrue((before == found).all())
 
     def test_hostile_headers(self):
         """Random words: a data set that can be asked for samples, or an error."""
