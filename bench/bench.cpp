@@ -14,6 +14,7 @@
 // Options of Google Benchmark are accepted, too. Exit status: 1 if candidates read or write
 // different bytes, or if anything fails; 2 for an unknown argument. Read task.h first, then
 // measure.h.
+#include "bench_folder.h"
 #include "measure.h"
 
 #include "base/count.h"
@@ -23,8 +24,6 @@
 #include <cstdio>
 #include <cstdlib>
 #include <stdexcept>
-
-#include <unistd.h>
 
 namespace {
 
@@ -58,29 +57,6 @@ std::vector<task> make_tasks(const image_set &images)
     };
 }
 
-// A folder that is removed with its content.
-class bench_folder {
-public:
-    explicit bench_folder(const std::filesystem::path &parent)
-    {
-        std::string name = parent / "imgfile_bench_XXXXXX";
-        if (::mkdtemp(name.data()) == nullptr)
-            throw std::runtime_error("no folder in " + parent.string());
-        m_path = name;
-    }
-    ~bench_folder()
-    {
-        std::error_code ignored;
-        std::filesystem::remove_all(m_path, ignored);
-    }
-    bench_folder(const bench_folder &) = delete;
-    bench_folder &operator=(const bench_folder &) = delete;
-    const std::filesystem::path &path() const { return m_path; }
-
-private:
-    std::filesystem::path m_path;
-};
-
 struct options {
     bool list = false, small = false, scaling = false, threads = false;
     std::filesystem::path folder = std::filesystem::temp_directory_path();
@@ -99,14 +75,12 @@ bool take_argument(const std::string &argument, options &asked)
         asked.scaling = true;
     else if (argument == "--threads")
         asked.threads = true;
-    else if (argument.starts_with("--dir="))
-        asked.folder = argument.substr(6);
     else if (argument.starts_with("--json="))
         asked.json = argument.substr(7);
     else if (argument.starts_with("T"))
         asked.tasks.push_back(argument);
     else
-        return false;
+        return take_folder(argument, &asked.folder);
     return true;
 }
 

@@ -10,6 +10,8 @@
 // GDAL finds the plugin by GDAL_DRIVER_PATH. The drivers of a pair take turns, and the ratio is the
 // median of the ratios of all rounds. Exit status: 1 if samples differ or if anything fails; 2 for
 // an unknown argument.
+#include "bench_folder.h"
+
 #include <algorithm>
 #include <chrono>
 #include <cpl_vsi.h>
@@ -404,29 +406,6 @@ void measure(const task &work, const image_pair &images, int rounds)
     std::fflush(stdout);
 }
 
-// A folder that is removed with its content.
-class bench_folder {
-public:
-    explicit bench_folder(const std::filesystem::path &parent)
-    {
-        std::string name = parent / "imgfile_gdal_bench_XXXXXX";
-        if (::mkdtemp(name.data()) == nullptr)
-            throw std::runtime_error("no folder in " + parent.string());
-        m_path = name;
-    }
-    ~bench_folder()
-    {
-        std::error_code ignored;
-        std::filesystem::remove_all(m_path, ignored);
-    }
-    bench_folder(const bench_folder &) = delete;
-    bench_folder &operator=(const bench_folder &) = delete;
-    const std::filesystem::path &path() const { return m_path; }
-
-private:
-    std::filesystem::path m_path;
-};
-
 struct arguments {
     bool small = false;
     int rounds = 31;
@@ -448,8 +427,8 @@ bool take_argument(const std::string &argument, arguments *asked)
     if (argument == "--small") {
         asked->small = true;
         asked->rounds = 2;
-    } else if (argument.starts_with("--dir=")) {
-        asked->folder = argument.substr(6);
+    } else if (take_folder(argument, &asked->folder)) {
+        return true;
     } else if (argument.starts_with("--rounds=")) {
         asked->rounds = std::max(std::atoi(argument.c_str() + 9), 1);
     } else if (argument.starts_with("-")) {
