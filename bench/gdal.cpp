@@ -62,7 +62,7 @@ using option_list = std::vector<const char *>;  // KEY=VALUE
 
 void copy(const dataset &source, const char *driver, const std::string &path, option_list options)
 {
-    GDALDriverH const found = GDALGetDriverByName(driver);
+    auto *const found = GDALGetDriverByName(driver);
     if (found == nullptr) throw std::runtime_error(std::string("no driver ") + driver);
     options.push_back(nullptr);
     owned(GDALCreateCopy(found, path.c_str(), source.get(), TRUE,
@@ -430,7 +430,8 @@ bool take_argument(const std::string &argument, arguments *asked)
     } else if (take_folder(argument, &asked->folder)) {
         return true;
     } else if (argument.starts_with("--rounds=")) {
-        asked->rounds = std::max(std::atoi(argument.c_str() + 9), 1);
+        asked->rounds = static_cast<int>(
+            std::clamp(std::strtol(argument.c_str() + 9, nullptr, 10), 1L, 10000L));
     } else if (argument.starts_with("-")) {
         return false;
     } else {

@@ -11,7 +11,7 @@
 #include <cstdio>
 #include <cstdlib>
 
-extern "C" void GDALRegister_IMGFILE();
+extern "C" void GDALRegister_IMGFILE();  // NOLINT(readability-identifier-naming): GDAL's name
 
 namespace {
 

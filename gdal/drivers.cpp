@@ -85,9 +85,10 @@ bool copy_header_text(GDALDataset *source, const char *filename)
     const char *const text = source->GetMetadataItem("DESCRIPTION", HEADER_DOMAIN);
     const char *const stated = source->GetMetadataItem("CREATION_DATE", HEADER_DOMAIN);
     std::array<int, IMG_VITEC_CREATE_DATE_SIZE> date{};
-    const bool has_date = stated != nullptr &&
-                          std::sscanf(stated, DATE_FORMAT, &date[0], &date[1], &date[2], &date[3],
-                                      &date[4], &date[5]) == int{IMG_VITEC_CREATE_DATE_SIZE};
+    const bool has_date =
+        stated != nullptr &&
+        std::sscanf(stated, DATE_FORMAT, date.data(), &date[1], &date[2], &date[3], &date[4],
+                    &date[5]) == int{IMG_VITEC_CREATE_DATE_SIZE};
     if (text == nullptr && !has_date) return true;
     VSILFILE *const file = VSIFOpenL(filename, "rb+");
     bool done = file != nullptr;
